@@ -1,0 +1,87 @@
+#include "component/err_propagator.h"
+
+#include <cmath>
+#include <limits>
+#include <new>
+#include <stdexcept>
+
+namespace varnel::detail {
+
+IError& ErrPropagator::getError(std::int32_t errorNo, const std::string& errorDesc,
+                                std::int32_t line) {
+    error_.ErrorNo = errorNo;
+    error_.ErrorDesc = errorDesc;
+    error_.ErrLine = line;
+    error_.FunctionName = FunctionName;
+    error_.ErrorTrace = FunctionName + " --> " + error_.ErrorTrace;
+    return error_;
+}
+
+void ErrPropagator::reset() {
+    ClassName.clear();
+    FunctionName.clear();
+    error_ = IError{};
+}
+
+ErrPropagator& errPropagator() {
+    thread_local ErrPropagator propagator;
+    return propagator;
+}
+
+CaughtError currentError() {
+    try {
+        throw;
+    } catch (const ComponentError& e) {
+        return {e.number(), e.description(), e.line()};
+    } catch (const std::out_of_range& e) {
+        return {errc::subscript_out_of_range, std::string("Subscript out of range: ") + e.what(), 0};
+    } catch (const std::overflow_error& e) {
+        return {errc::overflow, std::string("Overflow: ") + e.what(), 0};
+    } catch (const std::bad_alloc&) {
+        return {errc::internal, "Out of memory", 0};
+    } catch (const std::exception& e) {
+        return {errc::internal, e.what(), 0};
+    } catch (...) {
+        return {errc::internal, "Unknown failure", 0};
+    }
+}
+
+void propagateCurrent(const char* className, const char* routine,
+                      void (*cleanup)(void*, const IError&), void* cleanupContext) {
+    CaughtError caught = currentError();
+    ErrPropagator& p = errPropagator();
+    p.ClassName = className;
+    p.FunctionName = routine;
+    const IError& e = p.getError(caught.number, caught.description, caught.line);
+    if (cleanup) cleanup(cleanupContext, e);
+    throw ComponentError(e.ErrorNo, e.ErrorTrace, e.ErrLine);
+}
+
+void raise(std::int32_t number, const std::string& description) {
+    throw ComponentError(number, description);
+}
+
+std::int16_t toInt16(long long value) {
+    if (value < std::numeric_limits<std::int16_t>::min() ||
+        value > std::numeric_limits<std::int16_t>::max())
+        raise(errc::overflow, "Overflow");
+    return static_cast<std::int16_t>(value);
+}
+
+std::int16_t roundToInt16(double value) {
+    if (!std::isfinite(value)) raise(errc::overflow, "Overflow");
+    double r = std::nearbyint(value);
+    if (r < std::numeric_limits<std::int16_t>::min() || r > std::numeric_limits<std::int16_t>::max())
+        raise(errc::overflow, "Overflow");
+    return static_cast<std::int16_t>(r);
+}
+
+std::int32_t roundToInt32(double value) {
+    if (!std::isfinite(value)) raise(errc::overflow, "Overflow");
+    double r = std::nearbyint(value);
+    if (r < std::numeric_limits<std::int32_t>::min() || r > std::numeric_limits<std::int32_t>::max())
+        raise(errc::overflow, "Overflow");
+    return static_cast<std::int32_t>(r);
+}
+
+}  // namespace varnel::detail

@@ -1,0 +1,17 @@
+// A tagged value: empty, integer, real, date or text, for properties and
+// document values that may take several types.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <variant>
+
+#include "util/date_time.h"
+
+namespace varnel::detail {
+
+using Variant = std::variant<std::monostate, std::int32_t, double, DateTime, std::string>;
+
+inline bool isEmpty(const Variant& v) { return std::holds_alternative<std::monostate>(v); }
+
+}  // namespace varnel::detail
