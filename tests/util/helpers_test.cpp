@@ -1,0 +1,125 @@
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <cstdint>
+#include <thread>
+
+#include "util/helpers.h"
+
+using namespace varnel::detail;
+
+TEST(ToNumber, AcceptsCDecimalSyntaxWithBlanksAround) {
+    EXPECT_EQ(ToNumber("  12 "), 12);
+    EXPECT_EQ(ToNumber("\t-3"), -3);
+    EXPECT_EQ(ToNumber("+4.5"), 4.5);
+    EXPECT_EQ(ToNumber(".5"), 0.5);
+    EXPECT_EQ(ToNumber("7."), 7);
+    EXPECT_EQ(ToNumber("1.5e3"), 1500);
+    EXPECT_EQ(ToNumber("25E-1"), 2.5);
+    EXPECT_TRUE(IsNumeric(" 0 "));
+}
+
+TEST(ToNumber, AnythingElseIsZeroAndNotNumeric) {
+    for (const char* text : {"", "   ", "12a", "1.2.3", "0x10", "inf", "nan", "-", ".", "1e",
+                             "e5", "+-1", "1 2", "1,5", "- 3", "1e400", "-1e400"}) {
+        EXPECT_FALSE(IsNumeric(text)) << text;
+        EXPECT_EQ(ToNumber(text), 0) << text;
+    }
+}
+
+TEST(BytesToText, StopsAtZeroOrCountAndNeverPastTheArray) {
+    const std::uint8_t abc[] = {'A', 'B', 0, 'C'};
+    EXPECT_EQ(BytesToText(abc, 4), "AB");
+    const std::uint8_t full[20] = {'0', '1', '2', '3', '4', '5', '6', '7', '8', '9',
+                                   'a', 'b', 'c', 'd', 'e', 'f', 'g', 'h', 'i', 'j'};
+    EXPECT_EQ(BytesToText(full, 20), "0123456789abcdefghij");
+    EXPECT_EQ(BytesToText(full, 3), "012");
+    EXPECT_EQ(BytesToText(std::span(full).first(5), 20), "01234");  // count beyond the array
+    EXPECT_EQ(BytesToText(full, -1), "");
+}
+
+TEST(TextToBytes, StopsTwoShortOfTheEndAndLeavesLaterBytes) {
+    std::uint8_t name[10];
+    std::fill(std::begin(name), std::end(name), std::uint8_t(0xEE));
+    TextToBytes(name, "ABCDEFGHIJKL");
+    EXPECT_EQ(BytesToText(name, 10), "ABCDEFGH");
+    EXPECT_EQ(name[8], 0);
+    EXPECT_EQ(name[9], 0xEE);
+
+    TextToBytes(name, "Hi");
+    EXPECT_EQ(BytesToText(name, 10), "Hi");
+    EXPECT_EQ(name[2], 0);
+    EXPECT_EQ(name[3], 'D');
+
+    std::uint8_t one[1] = {'x'};
+    TextToBytes(one, "abc");
+    EXPECT_EQ(one[0], 0);
+    TextToBytes(std::span<std::uint8_t>(), "x");  // no room at all: nothing written
+}
+
+TEST(ToDateTime, JoinsDateAndTimeOfDay) {
+    auto date = *DateTime::fromParts(2004, 2, 29, 23, 59, 59);
+    auto time = *DateTime::fromParts(1999, 7, 1, 8, 5, 30);
+    EXPECT_EQ(ToDateTime(date, time), *DateTime::fromParts(2004, 2, 29, 8, 5, 30));
+    // Before day 0 the time of day still counts forward from midnight.
+    auto early = *DateTime::fromParts(1899, 12, 27, 18);
+    EXPECT_EQ(ToDateTime(early, time), *DateTime::fromParts(1899, 12, 27, 8, 5, 30));
+    EXPECT_EQ(ToDateTime(time, early), *DateTime::fromParts(1999, 7, 1, 18));
+}
+
+TEST(IsValidDate, NumericPattern) {
+    const char* p = "dd/MM/yyyy";
+    for (const char* ok : {"29/02/2004", "29/02/2000", "1/2/1601", "31/12/9998", "", "   "})
+        EXPECT_TRUE(IsValidDate(ok, "/", p)) << ok;
+    for (const char* bad : {"29/02/2003", "29/02/1900", "1/13/2004", "01/02/1600", "01/02/9999",
+                            "31/04/2004", "0/01/2004", "01-02-2004", "1a/02/2004", "01/02/2004/",
+                            "01//2004", "01/02/20o4", " 01/02/2004"})
+        EXPECT_FALSE(IsValidDate(bad, "/", p)) << bad;
+    EXPECT_TRUE(IsValidDate("2004-02-29", "-", "yyyy-MM-dd"));
+    EXPECT_TRUE(IsValidDate("29.02.2004", " . ", "dd.MM.yyyy"));
+    EXPECT_FALSE(IsValidDate("29:02:2004", ":", "dd:MM:yyyy"));  // not a date separator
+}
+
+TEST(IsValidDate, MonthNamesAndParts) {
+    const char* p = "dd/MMM/yyyy";
+    for (const char* ok : {"29/Feb/2004", "01/jan/2010", "31/DEC/1999", "15/ Sep /2001"})
+        EXPECT_TRUE(IsValidDate(ok, "/", p)) << ok;
+    for (const char* bad : {"29/Feb/2003", "01/02/2004", "01/Sept/2004", "30/feb/2004"})
+        EXPECT_FALSE(IsValidDate(bad, "/", p)) << bad;
+    EXPECT_TRUE(IsValidMonth("xx/07/yyyy", "/", "dd/dd/yyyy"));  // no month part
+    EXPECT_FALSE(IsValidDay("31/02/zz", "/", "dd/MM/xx"));       // no year to judge the day by
+    EXPECT_FALSE(IsValidYear("01/02", "/", "dd/MM/yyyy"));
+    EXPECT_EQ(CountOccurrences("a//b//c", "//"), 2u);
+    EXPECT_EQ(CountOccurrences("aaaa", "aa"), 2u);
+    EXPECT_EQ(CountOccurrences("abc", ""), 0u);
+    EXPECT_EQ(DigitsOnly("1a2 b3"), "123");
+    EXPECT_EQ(DateSeparator("x"), '/');
+}
+
+TEST(ContinueFlag, IsPerThreadAndStartsTrue) {
+    SetContinueFlag(false);
+    bool other = false;
+    std::thread([&] { other = GetContinueFlag(); }).join();
+    EXPECT_TRUE(other);
+    EXPECT_FALSE(GetContinueFlag());
+    SetContinueFlag(true);
+    EXPECT_TRUE(GetContinueFlag());
+}
+
+TEST(MinMaxDates, RangesByMeterType) {
+    struct Range { int type, y0, y1; };
+    for (auto [type, y0, y1] : {Range{1, 1990, 2014}, Range{2, 1992, 2022}, Range{3, 1992, 2022},
+                                Range{4, 1997, 2015}, Range{5, 1996, 2026}, Range{6, 2000, 2020},
+                                Range{7, 2000, 2020}, Range{8, 2000, 2020}}) {
+        std::int32_t lo = 0, hi = 0;
+        getMinMaxDates(type, lo, hi);
+        EXPECT_EQ(lo, DateTime::fromParts(y0, 1, 1)->dayNumber()) << type;
+        EXPECT_EQ(hi, DateTime::fromParts(y1, 12, 31)->dayNumber()) << type;
+    }
+    for (int type : {0, 9, -1}) {
+        std::int32_t lo = 7, hi = 8;
+        getMinMaxDates(type, lo, hi);
+        EXPECT_EQ(lo, 7);
+        EXPECT_EQ(hi, 8);
+    }
+}
