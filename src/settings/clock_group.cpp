@@ -1,0 +1,69 @@
+#include "settings/clock_group.h"
+
+#include "component/err_propagator.h"
+#include "util/helpers.h"
+
+namespace varnel::detail {
+
+namespace {
+
+constexpr const char* kClass = "Group_Clock";
+
+int windowedYear(int year) {
+    int yy = ((year % 100) + 100) % 100;
+    return yy < 30 ? 2000 + yy : 1900 + yy;
+}
+
+}  // namespace
+
+bool Group_Clock::initialise(clsMeterFns& meterFns) {
+    return guarded(kClass, "initialise", [&] {
+        takeSession(meterFns);
+        return false;
+    });
+}
+
+std::int16_t Group_Clock::readFromMeter() {
+    return guarded(kClass, "readFromMeter", [&]() -> std::int16_t {
+        std::int32_t seconds = 0;
+        std::int16_t code = outcome(transport().vb_Read_Meter_Clock(rec_, seconds));
+        if (code == 0) ClockInSeconds = seconds;
+        return code;
+    });
+}
+
+std::int16_t Group_Clock::saveToMeter() {
+    return guarded(kClass, "saveToMeter",
+                   [&] { return outcome(transport().vb_Set_Meter_Clock(rec_, ClockInSeconds)); });
+}
+
+DateTime Group_Clock::ClockTime() { return getTimeForSec(ClockInSeconds); }
+
+void Group_Clock::setClockTime(const DateTime& clock) { ClockInSeconds = getSecondsFor(clock); }
+
+std::int32_t Group_Clock::getSecondsFor(const DateTime& clock) {
+    return guarded(kClass, "getSecondsFor", [&] {
+        TIME_REC t{};
+        t.sec = toInt16(clock.second());
+        t.min = toInt16(clock.minute());
+        t.hour = toInt16(clock.hour());
+        t.mday = toInt16(clock.day());
+        t.mon = toInt16(clock.month());
+        t.year = toInt16(clock.year());
+        return transport().convert_to_seconds(t);
+    });
+}
+
+DateTime Group_Clock::getTimeForSec(std::int32_t seconds) {
+    return guarded(kClass, "getTimeForSec", [&] {
+        TIME_REC t{};
+        transport().convert_from_seconds(seconds, t);
+        auto date = DateTime::fromParts(windowedYear(t.year), t.mon, t.mday);
+        auto time = DateTime::fromParts(1899, 12, 30, t.hour, t.min, t.sec);
+        if (!date || !time)
+            raise(errc::internal, "The meter clock is not a valid date and time");
+        return ToDateTime(*date, *time);
+    });
+}
+
+}  // namespace varnel::detail

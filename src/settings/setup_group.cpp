@@ -1,0 +1,35 @@
+#include "settings/setup_group.h"
+
+#include "component/err_propagator.h"
+#include "readings/meter_fns.h"
+
+namespace varnel::detail {
+
+bool ISetupGroup::ISetupGroup_initialise(clsMeterFns& meterFns) {
+    return guarded(className(), "ISetupGroup_initialise", [&] { return initialise(meterFns); });
+}
+
+bool ISetupGroup::ISetupGroup_readFromMeter() {
+    return guarded(className(), "ISetupGroup_readFromMeter", [&] { return readFromMeter() != 0; });
+}
+
+bool ISetupGroup::ISetupGroup_saveToMeter() {
+    return guarded(className(), "ISetupGroup_saveToMeter", [&] { return saveToMeter() != 0; });
+}
+
+void ISetupGroup::takeSession(clsMeterFns& meterFns) {
+    rec_ = meterFns.MeterRec;
+    transport_ = meterFns.transport;
+}
+
+Transport& ISetupGroup::transport() {
+    if (!transport_) raise(errc::missing_object, "The settings group has not been initialised");
+    return *transport_;
+}
+
+std::int16_t ISetupGroup::outcome(std::int16_t returned) const {
+    if (returned == 0) return 0;
+    return rec_.Error_code != 0 ? rec_.Error_code : returned;
+}
+
+}  // namespace varnel::detail
