@@ -1,0 +1,164 @@
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <stdexcept>
+#include <thread>
+#include <vector>
+
+#include "platform/message_pump.h"
+#include "platform/wait.h"
+#include "varnel/clock.h"
+#include "varnel/component_error.h"
+
+using namespace varnel;
+using namespace varnel::detail;
+
+namespace {
+
+struct WaitTimerTest : ::testing::Test {
+    std::shared_ptr<ManualClock> clock = std::make_shared<ManualClock>(1000);
+    std::vector<std::uint32_t> ticks;  // virtual times the handler ran at
+    TimerConnection connection;
+
+    void SetUp() override {
+        setThreadClock(clock);
+        frmTimer().disableTimer();
+    }
+    void TearDown() override {
+        connection.disconnect();
+        frmTimer().disableTimer();
+        setThreadClock(nullptr);
+    }
+    void recordTicks(std::function<void()> also = {}) {
+        connection = frmTimer().tmrStatus().onTick([this, also] {
+            ticks.push_back(clock->tickCount());
+            if (also) also();
+        });
+    }
+};
+
+TEST_F(WaitTimerTest, SleepRunsItsFullTimeWithTicksDeliveredOnTheWay) {
+    recordTicks();
+    clsWait wait;
+    wait.SleepForSeconds(0.1);
+    EXPECT_EQ(clock->tickCount(), 1100u);
+    EXPECT_TRUE(ticks.empty());
+
+    frmTimer().enableTimer();  // due at 1500, 1900
+    clock->advance(350);
+    wait.SleepForSeconds(0.1);
+    EXPECT_EQ(clock->tickCount(), 1550u);
+    wait.SleepForSeconds(1.0);  // a tick only restarts the wait with the time remaining
+    EXPECT_EQ(clock->tickCount(), 2550u);
+    EXPECT_EQ(ticks, (std::vector<std::uint32_t>{1500, 1900, 2300}));
+}
+
+TEST_F(WaitTimerTest, TickCountNearItsWrapStillGivesTheFullInterval) {
+    clock = std::make_shared<ManualClock>(0xFFFFFFFFu - 50);
+    setThreadClock(clock);
+    recordTicks();
+    frmTimer().enableTimer();
+    clsWait wait;
+    EXPECT_EQ(wait.MsgWaitObj(1000), waitTimeout);
+    EXPECT_EQ(clock->tickCount(), 949u);
+    EXPECT_EQ(ticks, (std::vector<std::uint32_t>{349, 749}));
+}
+
+TEST_F(WaitTimerTest, PulseFromATickEndsTheWaitAtOnceAndDoesNotLinger) {
+    clsWait wait;
+    WaitEvent other, mine;
+    recordTicks([&] {
+        other.pulse();  // not waited on: must not end the wait
+        if (ticks.size() == 2) mine.pulse();
+    });
+    frmTimer().enableTimer();
+    WaitEvent* objects[] = {&other, &mine};
+    EXPECT_EQ(wait.MsgWaitObj(5000, std::span<WaitEvent* const>(objects + 1, 1)), 0);
+    EXPECT_EQ(clock->tickCount(), 1800u);
+
+    WaitEvent* reversed[] = {&mine, &other};
+    EXPECT_EQ(wait.MsgWaitObj(5000, reversed), 1);  // the index of the pulsed object
+    EXPECT_EQ(clock->tickCount(), 2200u);
+
+    frmTimer().disableTimer();
+    mine.pulse();  // nobody waits: a later wait is not released by it
+    EXPECT_EQ(wait.MsgWaitObj(100, objects), waitTimeout);
+    EXPECT_EQ(clock->tickCount(), 2300u);
+}
+
+TEST_F(WaitTimerTest, SuspendEndsOnResumeFromATickOrAtOnceWhenNothingCouldResume) {
+    clsWait wait;
+    wait.SuspendProcessing();  // no enabled timer: would block for good
+    EXPECT_EQ(clock->tickCount(), 1000u);
+    frmTimer().enableTimer();
+    wait.SuspendProcessing();  // enabled, but no handler to resume it
+    EXPECT_EQ(clock->tickCount(), 1000u);
+
+    recordTicks([&] {
+        if (ticks.size() == 3) wait.ResumeProcessing();
+    });
+    wait.SuspendProcessing();
+    EXPECT_EQ(clock->tickCount(), 2200u);
+}
+
+TEST_F(WaitTimerTest, TicksOnlyInsideAPumpOnePerPumpAndNextOneIntervalLater) {
+    recordTicks();
+    frmTimer().enableTimer();
+    clock->advance(2000);
+    std::thread([] { doEvents(); }).join();  // another thread's pump never sees our timer
+    EXPECT_TRUE(ticks.empty());
+    doEvents();
+    doEvents();
+    EXPECT_EQ(ticks.size(), 1u);
+    clock->advance(399);
+    doEvents();
+    EXPECT_EQ(ticks.size(), 1u);
+    clock->advance(1);
+    doEvents();
+    EXPECT_EQ(ticks.size(), 2u);
+    EXPECT_EQ(*msUntilNextTick(), 400u);
+}
+
+TEST_F(WaitTimerTest, DisablingOrDisconnectingStopsTicksAndHoldersShareThem) {
+    int second = 0;
+    auto other = frmTimer().tmrStatus().onTick([&] { ++second; });
+    recordTicks([&] {
+        if (ticks.size() == 2) connection.disconnect();
+    });
+    frmTimer().enableTimer();
+    clsWait wait;
+    wait.SleepForSeconds(1.2);
+    EXPECT_EQ(ticks.size(), 2u);
+    EXPECT_EQ(second, 3);
+
+    frmTimer().disableTimer();
+    wait.SleepForSeconds(2);
+    EXPECT_EQ(second, 3);
+    EXPECT_FALSE(msUntilNextTick());
+}
+
+TEST_F(WaitTimerTest, ATickDoesNotReenterItsOwnHandlerDuringANestedWait) {
+    clsWait wait;
+    recordTicks([&] { wait.SleepForSeconds(1.0); });
+    frmTimer().enableTimer();
+    wait.SleepForSeconds(0.5);
+    EXPECT_EQ(ticks.size(), 1u);
+    EXPECT_EQ(clock->tickCount(), 2400u);
+}
+
+TEST_F(WaitTimerTest, OddIntervalsAndHandlerErrors) {
+    clsWait wait;
+    wait.SleepForSeconds(-0.001);  // would otherwise mean "no limit"
+    EXPECT_EQ(wait.MsgWaitObj(-500), waitTimeout);
+    WaitSeconds(1e10f);
+    WaitSeconds(NAN);
+    EXPECT_EQ(clock->tickCount(), 1000u);
+    EXPECT_THROW(wait.SleepForSeconds(NAN), ComponentError);
+
+    recordTicks([] { throw std::runtime_error("handler failed"); });
+    frmTimer().enableTimer();
+    EXPECT_THROW(WaitSeconds(1.0f), std::runtime_error);
+    EXPECT_EQ(clock->tickCount(), 1400u);
+}
+
+}  // namespace
