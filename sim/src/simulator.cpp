@@ -1,0 +1,165 @@
+// The simulator's state and its C++ controls.
+#include <algorithm>
+#include <cstring>
+
+#include "meter_state.h"
+
+namespace varnel::sim {
+namespace detail {
+
+namespace {
+constexpr const char* kFaultable[] = {
+    "initialize_meter_structure", "find_meter", "initialize_meter_type_structure",
+    "vb_Chk4Meter", "vb_Get_Meter_Firmware", "vb_Tickle_Meter", "close_meter",
+    "vb_Clear_Meter_Datalog", "vb_Read_Meter_Options", "vb_Read_Meter_Option",
+    "vb_Set_Meter_Option", "vb_Set_Meter_Options", "vb_Read_Meter_Clock", "vb_Set_Meter_Clock",
+    "convert_from_seconds", "GetInitializedFlag", "SetInitializedFlag", "GetInsulinName",
+    "SetInsulinName", "GetOralMedicationName", "SetOralMedicationName", "GetPredefinedInsulins",
+    "SetPredefinedInsulins", "GetPredefinedOralMeds", "SetPredefinedOralMeds", "GetMealSegments",
+    "SetMealSegments", "GetScheduleSelection", "SetScheduleSelection", "GetTargetRange",
+    "SetTargetRange", "GetMeterDatalog", "GetMeterDatalogRecordData", "vb_Upload_Meter_Datalog",
+};
+}  // namespace
+
+std::span<const char* const> faultableFunctions() { return kFaultable; }
+
+State& state() {
+    static State s;
+    return s;
+}
+
+void State::load(MeterProfile profile) {
+    meter_ = std::move(profile);
+    portOpen = false;
+    faults_.clear();
+    calls_.clear();
+    setClock(meter_.clock);
+}
+
+std::int32_t State::clock() {
+    Clock& c = threadClock();
+    const std::uint32_t now = c.tickCount();
+    const auto elapsed = static_cast<std::int32_t>(now - anchorTick_);
+    // Another clock (a test's virtual one, another thread's) starts from where the meter stood.
+    if (&c != anchorClock_ || elapsed < 0) {
+        anchorClock_ = &c;
+        anchorTick_ = now;
+        return clockAtAnchor_;
+    }
+    return clockAtAnchor_ + elapsed / 1000;
+}
+
+void State::setClock(std::int32_t seconds) {
+    Clock& c = threadClock();
+    clockAtAnchor_ = seconds;
+    anchorClock_ = &c;
+    anchorTick_ = c.tickCount();
+    meter_.clock = seconds;
+}
+
+std::optional<std::int16_t> State::dueFault(const char* function) {
+    for (auto it = faults_.begin(); it != faults_.end(); ++it) {
+        if (it->function != function) continue;
+        if (it->countdown > 1) {
+            --it->countdown;
+            continue;
+        }
+        const std::int16_t code = it->code;
+        if (!it->persistent) faults_.erase(it);
+        return code;
+    }
+    return std::nullopt;
+}
+
+int State::calls(const std::string& function) const {
+    auto it = calls_.find(function);
+    return it == calls_.end() ? 0 : it->second;
+}
+
+}  // namespace detail
+
+using detail::state;
+
+namespace {
+std::unique_lock<std::recursive_mutex> locked() { return std::unique_lock(state().mutex); }
+}  // namespace
+
+void loadProfile(const MeterProfile& profile) {
+    validateProfile(profile);
+    auto lock = locked();
+    state().load(profile);
+}
+
+void loadProfileFile(const std::string& path) {
+    MeterProfile p = readProfileFile(path);
+    try {
+        validateProfile(p);
+    } catch (const std::invalid_argument& e) {
+        throw std::runtime_error(path + ": " + e.what());
+    }
+    auto lock = locked();
+    state().load(std::move(p));
+}
+
+void reset() { loadProfile(defaultProfile(eMorvex)); }
+
+void selectType(int type) { loadProfile(defaultProfile(type)); }
+
+void attach() {
+    auto lock = locked();
+    state().meter().attached = true;
+}
+
+void detach() {
+    auto lock = locked();
+    state().meter().attached = false;
+    state().portOpen = false;
+}
+
+void setSerial(const std::string& serial) {
+    if (serial.empty() || serial.size() > 20 || serial.find('\0') != std::string::npos)
+        throw std::invalid_argument("a serial number has 1 to 20 characters");
+    auto lock = locked();
+    state().meter().serial = serial;
+}
+
+void setIdentitySerial(const std::string& serial) {
+    if (serial.size() > 20 || serial.find('\0') != std::string::npos)
+        throw std::invalid_argument("a serial number has at most 20 characters");
+    auto lock = locked();
+    state().meter().identitySerial = serial;
+}
+
+void injectFault(const std::string& function, int nth, std::int16_t code, bool persistent) {
+    const auto names = detail::faultableFunctions();
+    if (std::find_if(names.begin(), names.end(), [&](const char* n) { return function == n; }) == names.end())
+        throw std::invalid_argument("no transport function " + function + " reports a status");
+    if (nth < 1) throw std::invalid_argument("the failing call is counted from 1");
+    if (code >= 0) throw std::invalid_argument("a failure code is negative");
+    auto lock = locked();
+    state().addFault({function, nth, code, persistent});
+}
+
+void clearFaults() {
+    auto lock = locked();
+    state().clearFaults();
+}
+
+MeterProfile meter() {
+    auto lock = locked();
+    MeterProfile p = state().meter();
+    p.clock = state().clock();
+    return p;
+}
+
+bool portOpen() {
+    auto lock = locked();
+    return state().portOpen;
+}
+
+int callCount(const std::string& function) {
+    auto lock = locked();
+    return state().calls(function);
+}
+
+}  // namespace varnel::sim
