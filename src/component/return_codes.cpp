@@ -1,0 +1,9 @@
+#include "varnel/return_codes.h"
+
+#include "component/error_description.h"
+
+namespace varnel {
+
+std::string returnCodeText(long long code) { return detail::ErrorDescription(code); }
+
+}  // namespace varnel
