@@ -5,6 +5,7 @@
 //               payload[length] crc:u16 (CRC-16/CCITT over index..payload)
 // Each record is found through its own offset and checked on its own, so one
 // damaged record never hides or garbles another.
+#include <algorithm>
 #include <cmath>
 #include <cstring>
 #include <string>
@@ -43,6 +44,17 @@ const Field kVisit[] = {I8(visit)};
 const Field kExercise[] = {I8(ExerciseLevel), I16(exerciseDuration)};
 const Field kCalCode[] = {I16(oldCalCode), I16(newCalCode)};
 
+const Field kAll[] = {
+    I16(reading), I16(controlFlag), I16(alternateSiteFlag), I16(dietLabel), I16(exerciseLabel),
+    I16(stressFlag), I16(feelHypoFlag), I16(illnessFlag), I16(mensesFlag), I16(vacationFlag),
+    I16(otherFlag), I16(mealSegment), I16(carbs), I16(fats), I16(calories), I16(protein), I16(ketones),
+    H(hbA1C), I16(microalbumin), I16(cholesterolLDL), I16(cholesterolHDL), I16(cholesterolTotal),
+    I16(cholesterolTriglyceride), I16(bloodPressureSystole), I16(bloodPressureDiastole), H(weight),
+    H(height), I16(visit), I16(oralMedType), H(oralMedDosage), I16(InsulinType), H(insulinDosage),
+    H(bolusSetting), H(dailyTotalSetting), I16(ExerciseLevel), I16(exerciseDuration), I16(oldCalCode),
+    I16(newCalCode),
+};
+
 #undef I8
 #undef I16
 #undef H
@@ -72,6 +84,15 @@ std::span<const Field> fieldsOf(std::int16_t recType) {
 }
 
 std::span<const std::int16_t> knownRecordTypes() { return kTypes; }
+
+std::span<const Field> allValueFields() { return kAll; }
+
+bool sameRecord(const RECORD_DATA& a, const RECORD_DATA& b) {
+    if (a.recType != b.recType || a.timeStamp != b.timeStamp || a.Ordinal != b.Ordinal) return false;
+    return std::all_of(std::begin(kAll), std::end(kAll), [&](const Field& f) {
+        return f.real ? a.*f.real == b.*f.real : a.*f.integer == b.*f.integer;
+    });
+}
 
 }  // namespace detail
 
@@ -117,8 +138,8 @@ std::int64_t get(const std::uint8_t*& p, std::size_t bytes) {
 [[noreturn]] void refuse(std::size_t index, const RECORD_DATA& r, const char* field,
                          const std::string& value, const char* why) {
     throw std::invalid_argument("binary record " + std::to_string(index) + " (type " +
-                                std::to_string(r.recType) + "): " + field + " " + value + " " +
-                                why);
+                                std::to_string(r.recType) + "): " + field +
+                                (value.empty() ? "" : " " + value) + " " + why);
 }
 
 // The stored form of one field, refusing what the width cannot hold exactly.
@@ -169,6 +190,13 @@ void encodeBinaryDatalog(const std::vector<RECORD_DATA>& records, METER_BIN_DATA
         const RECORD_DATA& r = records[i];
         if (r.recType < 0 || r.recType > 255)
             refuse(i, r, "recType", std::to_string(r.recType), "does not fit one byte");
+        for (const Field& f : detail::allValueFields()) {
+            const auto carried = detail::fieldsOf(r.recType);
+            const bool set = f.real ? r.*f.real != 0.0 : r.*f.integer != 0;
+            if (set && std::none_of(carried.begin(), carried.end(),
+                                    [&](const Field& c) { return std::string_view(c.name) == f.name; }))
+                refuse(i, r, f.name, "", "is not carried by this record type");
+        }
         put(table, p - buf, 2);
         std::uint8_t* start = p;
         put(p, std::int64_t(i), 2);

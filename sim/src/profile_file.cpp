@@ -118,7 +118,8 @@ public:
 
     std::vector<std::int16_t> list(const char* name, std::size_t count = 0) {
         std::vector<std::int16_t> out;
-        for (std::string_view w : words(text(name))) {
+        const std::string all = text(name);
+        for (std::string_view w : words(all)) {
             std::int16_t v = 0;
             if (!parseNumber(w, v)) fail(std::string(name) + ": \"" + std::string(w) + "\" is not a whole number");
             out.push_back(v);
@@ -368,6 +369,12 @@ MeterProfile readProfileFile(const std::string& path) {
         if (n.type() != pugi::node_element) continue;
         const std::string name = n.name();
         if (!seen.insert(name).second) src.fail(n, "<" + name + "> appears twice");
+        static const std::set<std::string> typeSevenOnly = {"insulins", "oralMeds", "schedule", "targets",
+                                                            "binaryDatalog"};
+        if (typeSevenOnly.count(name) && !p.usesBinaryDatalog())
+            src.fail(n, "only a type-7 meter keeps <" + name + ">");
+        if (name == "datalog" && p.usesBinaryDatalog())
+            src.fail(n, "a type-7 meter keeps <binaryDatalog>, not <datalog>");
         if (name == "ranges") {
             Element e(src, n);
             p.checkStripLow = e.number<std::int16_t>("checkStripLow");
@@ -404,7 +411,8 @@ MeterProfile readProfileFile(const std::string& path) {
         } else if (name == "schedule") {
             Element e(src, n);
             p.scheduleSelection = e.number<std::int16_t>("selection", std::nullopt, 0, 1);
-            const auto times = words(e.text("segments", true));
+            const std::string segments = e.text("segments", true);
+            const auto times = words(segments);
             if (times.size() != 7) e.fail("segments needs seven start times hh:mm");
             for (std::size_t i = 0; i < 7; ++i) {
                 const std::string t(times[i]);

@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <set>
 #include <string>
+#include <tuple>
 
 #include "meter_state.h"
 #include "record_fields.h"
@@ -366,7 +367,31 @@ void checkNames(const char* what, const std::vector<NameSlot>& slots, std::size_
     }
 }
 
+bool sameEntry(const data_rec& a, const data_rec& b) {
+    const TEST_REC &x = a.Test, &y = b.Test;
+    return a.D_Type == b.D_Type && a.Valid == b.Valid && a.ResultApproximated == b.ResultApproximated &&
+           a.D_Time == b.D_Time && x.Result == y.Result && x.Sample_detected == y.Sample_detected &&
+           x.Medication == y.Medication && x.Event_code == y.Event_code && x.Flags == y.Flags &&
+           x.T_Type == y.T_Type;
+}
+
+
 }  // namespace
+
+bool MeterProfile::operator==(const MeterProfile& o) const {
+    auto key = [](const MeterProfile& p) {
+        return std::tie(p.type, p.port, p.serial, p.identitySerial, p.firmware, p.name, p.wireBaud, p.options,
+                        p.languages, p.events, p.insulinKinds, p.checkStripLow, p.checkStripHigh,
+                        p.checkStripApprox, p.glucoseLow, p.glucoseHigh, p.glucoseErrorLow, p.glucoseErrorHigh,
+                        p.plasmaCalibrated, p.clock, p.initializedFlag, p.maxRecords, p.corruptedRecords,
+                        p.insulinNames, p.oralMedNames, p.favoriteInsulins, p.favoriteOralMeds,
+                        p.scheduleSelection, p.mealSegments, p.targets, p.attached);
+    };
+    return key(*this) == key(o) &&
+           std::equal(datalog.begin(), datalog.end(), o.datalog.begin(), o.datalog.end(), sameEntry) &&
+           std::equal(binaryDatalog.begin(), binaryDatalog.end(), o.binaryDatalog.begin(),
+                      o.binaryDatalog.end(), detail::sameRecord);
+}
 
 MeterProfile defaultProfile(int type) {
     if (type < 1 || type > 8) invalid("no meter type " + std::to_string(type) + "; types are 1 to 8");

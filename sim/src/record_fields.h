@@ -24,5 +24,8 @@ struct Field {
 std::span<const Field> fieldsOf(std::int16_t recType);
 // The record types of the table, in ascending order.
 std::span<const std::int16_t> knownRecordTypes();
+// Every value field of RECORD_DATA (all but recType, timeStamp and Ordinal).
+std::span<const Field> allValueFields();
+bool sameRecord(const RECORD_DATA& a, const RECORD_DATA& b);
 
 }  // namespace varnel::sim::detail

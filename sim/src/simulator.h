@@ -77,7 +77,8 @@ struct MeterProfile {
     bool attached = true;
 
     bool usesBinaryDatalog() const { return type == eMorvex; }
-    bool operator==(const MeterProfile&) const = default;
+    // Field by field, datalog records included.
+    bool operator==(const MeterProfile&) const;
 };
 
 // The believable default meter of a type 1-8; throws std::invalid_argument otherwise.

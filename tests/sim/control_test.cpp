@@ -1,0 +1,232 @@
+// Injected faults, profile files and the C controls, in-process and in the
+// shared library.
+#include <dlfcn.h>
+
+#include <cstdio>
+#include <cstring>
+#include <fstream>
+#include <functional>
+
+#include "fixture.h"
+#include "vxsim.h"
+
+using namespace varnel::sim;
+using simtest::SimTest;
+
+namespace {
+
+// The meter's data without its running clock.
+MeterProfile held() {
+    MeterProfile p = meter();
+    p.clock = 0;
+    return p;
+}
+
+std::string profilePath(int type) {
+    return std::string(VARNEL_SOURCE_DIR) + "/sim/profiles/type" + std::to_string(type) + ".xml";
+}
+
+struct TempFile {
+    std::string path = ::testing::TempDir() + "vxsim_" +
+                       ::testing::UnitTest::GetInstance()->current_test_info()->name() + ".xml";
+    explicit TempFile(const std::string& content = "") {
+        if (!content.empty()) std::ofstream(path) << content;
+    }
+    ~TempFile() { std::remove(path.c_str()); }
+};
+
+}  // namespace
+
+using Faults = SimTest;
+
+TEST_F(Faults, EveryInjectedFaultSurfacesWithErrorCodeAndChangesNothing) {
+    INSULIN_OR_ORAL_MED_NAME_TYPE name{12, 0, {'X'}};
+    PREDEFINED_INSULINS_TYPE ins{{1, 2, 3}};
+    PREDEFINED_ORAL_MEDS_TYPE meds{{1, 2, 3, 4, 5}};
+    MEAL_SEGMENTS_TYPE seg{{1, 2, 3, 4, 5, 6, 7}};
+    SETTINGS_REC settings{};
+    settings.Availability[eBeepStatus] = 2, settings.nValue[eBeepStatus] = 1;
+    auto bin = std::make_unique<METER_BIN_DATALOG>();
+    const std::vector<std::pair<const char*, std::function<std::int16_t()>>> calls = {
+        {"vb_Set_Meter_Option", [&] { return vb_Set_Meter_Option(&rec, eUnits, 1); }},
+        {"vb_Set_Meter_Options", [&] { return vb_Set_Meter_Options(&rec, &settings); }},
+        {"vb_Set_Meter_Clock", [&] { return vb_Set_Meter_Clock(&rec, secondsOf(2012, 1, 1)); }},
+        {"SetInitializedFlag", [&] { return SetInitializedFlag(&rec, 0); }},
+        {"SetInsulinName", [&] { return SetInsulinName(&rec, &name); }},
+        {"SetOralMedicationName", [&] { return SetOralMedicationName(&rec, &name); }},
+        {"SetPredefinedInsulins", [&] { return SetPredefinedInsulins(&rec, &ins); }},
+        {"SetPredefinedOralMeds", [&] { return SetPredefinedOralMeds(&rec, &meds); }},
+        {"SetMealSegments", [&] { return SetMealSegments(&rec, &seg); }},
+        {"SetScheduleSelection", [&] { return SetScheduleSelection(&rec, 0); }},
+        {"SetTargetRange", [&] { return SetTargetRange(&rec, 60, 200, 60, 200, 50); }},
+        {"vb_Clear_Meter_Datalog", [&] { return vb_Clear_Meter_Datalog(&rec); }},
+        {"GetMeterDatalog", [&] { return GetMeterDatalog(&rec, bin.get(), 0); }},
+    };
+    connect(7);
+    const MeterProfile before = held();
+    for (const auto& [function, run] : calls) {
+        SCOPED_TRACE(function);
+        injectFault(function, 1, ME_TIME_OUT, false);
+        rec.Error_code = 0;
+        bin->recordCount = 77;
+        EXPECT_EQ(run(), ME_TIME_OUT);
+        EXPECT_EQ(rec.Error_code, ME_TIME_OUT);
+        EXPECT_EQ(held(), before);
+        EXPECT_EQ(bin->recordCount, 77);
+    }
+    // Without faults the same calls do change the meter.
+    for (const auto& [function, run] : calls) EXPECT_EQ(run(), ME_SUCCESS) << function;
+    EXPECT_NE(held(), before);
+}
+
+TEST_F(Faults, NthCallFailsOnceOrFromThenOn) {
+    connect(1);
+    injectFault("vb_Chk4Meter", 2, ME_COM_ERROR, false);
+    EXPECT_EQ(vb_Chk4Meter(&rec), ME_SUCCESS);
+    EXPECT_EQ(vb_Chk4Meter(&rec), ME_COM_ERROR);
+    EXPECT_EQ(vb_Chk4Meter(&rec), ME_SUCCESS);
+
+    injectFault("vb_Read_Meter_Options", 2, ME_CHKSUM_ERROR, true);
+    EXPECT_EQ(vb_Read_Meter_Options(&rec), ME_SUCCESS);
+    EXPECT_EQ(vb_Read_Meter_Options(&rec), ME_CHKSUM_ERROR);
+    EXPECT_EQ(vb_Read_Meter_Options(&rec), ME_CHKSUM_ERROR);
+    EXPECT_EQ(callCount("vb_Read_Meter_Options"), 3);
+    clearFaults();
+    EXPECT_EQ(vb_Read_Meter_Options(&rec), ME_SUCCESS);
+
+    // A failed find leaves the record and the port as they were.
+    injectFault("find_meter", 1, ME_NO_DEVICE, false);
+    close_meter(&rec);
+    METER_REC empty{};
+    std::int32_t found[11] = {};
+    std::int16_t ports[11] = {1};
+    EXPECT_EQ(find_meter(&empty, found, ports), ME_NO_DEVICE);
+    EXPECT_EQ(empty.M_Type, 0);
+    EXPECT_FALSE(portOpen());
+
+    injectFault("convert_from_seconds", 1, ME_FAIL, false);
+    injectFault("GetMeterDatalogRecordData", 1, ME_COMP_FAIL, false);
+    TIME_REC t{};
+    RECORD_DATA r{};
+    EXPECT_EQ(convert_from_seconds(0, &t), ME_FAIL);
+    EXPECT_EQ(GetMeterDatalogRecordData(nullptr, 0, &r), ME_COMP_FAIL);
+    EXPECT_THROW(injectFault("convert_to_seconds", 1, ME_FAIL, false), std::invalid_argument);
+    EXPECT_THROW(injectFault("vb_Chk4Meter", 0, ME_FAIL, false), std::invalid_argument);
+    EXPECT_THROW(injectFault("vb_Chk4Meter", 1, 0, false), std::invalid_argument);
+}
+
+using Profiles = SimTest;
+
+TEST_F(Profiles, ShippedFilesAreTheDefaultMeters) {
+    for (int type = 1; type <= 8; ++type) EXPECT_EQ(readProfileFile(profilePath(type)), defaultProfile(type)) << type;
+}
+
+TEST_F(Profiles, WrittenProfileReadsBackEqual) {
+    MeterProfile p = defaultProfile(7);
+    p.port = 3;
+    p.identitySerial = "00";
+    p.attached = false;
+    p.corruptedRecords = {0, 9};
+    p.insulinNames[11].bytes = std::string("\x01\xE9\x7F", 3);  // unprintable bytes survive too
+    p.oralMedNames[7].bytes = "K\xF6ln";
+    p.binaryDatalog[3] = RECORD_DATA{};
+    p.binaryDatalog[3].recType = 77;  // a type the conversion does not know
+    p.binaryDatalog[3].timeStamp = p.binaryDatalog[2].timeStamp;
+    TempFile file;
+    writeProfileFile(p, file.path);
+    EXPECT_EQ(readProfileFile(file.path), p);
+    MeterProfile records = defaultProfile(2);
+    records.datalog[0].Test.Medication = 0.1;
+    writeProfileFile(records, file.path);
+    EXPECT_EQ(readProfileFile(file.path), records);
+}
+
+TEST_F(Profiles, BadFilesNameTheFileTheLineAndTheProblemAndLeaveTheMeter) {
+    const std::string head = R"(<meter type="1" serial="ABC1234567" firmware="X1 01/02/03" clock="2005-01-01 00:00:00")";
+    const std::pair<std::string, std::string> cases[] = {
+        {head + R"( colour="red"/>)", ":1: unknown attribute colour"},
+        {head + R"( port="1x"/>)", ":1: port \"1x\" is not a whole number"},
+        {head + R"( port="300"/>)", ":1: port 300 is outside 1..255"},
+        {head + ">\n<ranges glucoseLow='20'/>\n</meter>", ":2: attribute glucoseHigh is missing"},
+        {head + ">\n<datalog>\n<entry dType='1' time='2005-02-30 00:00:00'/></datalog></meter>",
+         ":3: time \"2005-02-30 00:00:00\" is not a time"},
+        {head + "><options><option code='6' availability='2' value='3' min='0' max='9'/></options></meter>",
+         ": language 3 is not in the language map"},
+        {head + "><binaryDatalog/></meter>", ":1: only a type-7 meter keeps <binaryDatalog>"},
+        {head + "><unknown/></meter>", "unknown element <unknown>"},
+        {head + "><ranges", ": "},
+    };
+    for (const auto& [content, expected] : cases) {
+        SCOPED_TRACE(content);
+        TempFile file(content);
+        EXPECT_EQ(vxsim_load_profile(file.path.c_str()), ME_FAIL);
+        const std::string error = vxsim_last_error();
+        EXPECT_EQ(error.rfind(file.path, 0), 0u) << error;
+        EXPECT_NE(error.find(expected), std::string::npos) << error;
+        EXPECT_EQ(meter().type, eMorvex);
+    }
+    EXPECT_EQ(vxsim_load_profile("/nonexistent/meter.xml"), ME_FAIL);
+    EXPECT_NE(std::string(vxsim_last_error()).find("/nonexistent/meter.xml"), std::string::npos);
+
+    TempFile good(head + "><ranges glucoseLow='20' glucoseHigh='600'/></meter>");
+    ASSERT_EQ(vxsim_load_profile(good.path.c_str()), ME_SUCCESS) << vxsim_last_error();
+    EXPECT_STREQ(vxsim_last_error(), "");
+    EXPECT_EQ(meter().serial, "ABC1234567");
+}
+
+using Controls = SimTest;
+
+TEST_F(Controls, CControlsSelectAttachAndRenameTheMeter) {
+    EXPECT_EQ(vxsim_select_type(9), ME_BAD_PARAMETER);
+    EXPECT_NE(std::string(vxsim_last_error()).find("9"), std::string::npos);
+    ASSERT_EQ(vxsim_select_type(4), ME_SUCCESS);
+    EXPECT_EQ(meter().type, eQuillaandBremo);
+    EXPECT_EQ(vxsim_set_serial("QLB40088300"), ME_SUCCESS);
+    EXPECT_EQ(vxsim_set_serial(""), ME_BAD_PARAMETER);
+    EXPECT_EQ(vxsim_set_serial("ABCDEFGHIJKLMNOPQRSTU"), ME_BAD_PARAMETER);
+
+    std::int32_t found[11] = {};
+    std::int16_t ports[11] = {1};
+    ASSERT_EQ(vxsim_detach(), ME_SUCCESS);
+    EXPECT_EQ(find_meter(&rec, found, ports), ME_NO_DEVICE);
+    ASSERT_EQ(vxsim_attach(), ME_SUCCESS);
+    ASSERT_EQ(find_meter(&rec, found, ports), ME_SUCCESS);
+    EXPECT_STREQ(reinterpret_cast<const char*>(rec.Serial_number), "QLB40088300");
+
+    EXPECT_EQ(vxsim_fail_call("vb_Nothing", 1, -3, 0), ME_BAD_PARAMETER);
+    EXPECT_NE(std::string(vxsim_last_error()).find("vb_Nothing"), std::string::npos);
+    ASSERT_EQ(vxsim_fail_call("vb_Tickle_Meter", 1, -3, 1), ME_SUCCESS);
+    EXPECT_EQ(vb_Tickle_Meter(&rec), ME_COM_ERROR);
+    ASSERT_EQ(vxsim_clear_faults(), ME_SUCCESS);
+    EXPECT_EQ(vb_Tickle_Meter(&rec), ME_SUCCESS);
+
+    TempFile saved;
+    ASSERT_EQ(vxsim_save_profile(saved.path.c_str()), ME_SUCCESS);
+    ASSERT_EQ(vxsim_reset(), ME_SUCCESS);
+    EXPECT_EQ(meter().type, eMorvex);
+    EXPECT_EQ(meter().port, 1);
+    ASSERT_EQ(vxsim_load_profile(saved.path.c_str()), ME_SUCCESS);
+    EXPECT_EQ(meter().serial, "QLB40088300");
+}
+
+TEST(SharedLibrary, ExportsTheTransportAndItsOwnSimulator) {
+    void* lib = dlopen(VARNEL_TEST_TRANSPORT_PATH, RTLD_NOW | RTLD_LOCAL);
+    ASSERT_NE(lib, nullptr) << dlerror();
+    auto select = reinterpret_cast<int (*)(int)>(dlsym(lib, "vxsim_select_type"));
+    auto find = reinterpret_cast<decltype(&find_meter)>(dlsym(lib, "find_meter"));
+    auto hook = dlsym(lib, "vx_set_yield_hook");
+    ASSERT_TRUE(select && find && hook);
+    for (const char* f : {"initialize_meter_structure", "GetMeterDatalogRecordData", "SetTargetRange",
+                          "vb_Upload_Meter_Datalog", "convert_to_seconds", "vxsim_last_error"})
+        EXPECT_NE(dlsym(lib, f), nullptr) << f;
+
+    ASSERT_EQ(select(3), 0);
+    METER_REC r{};
+    std::int32_t found[11] = {};
+    std::int16_t ports[11] = {1};
+    ASSERT_EQ(find(&r, found, ports), ME_SUCCESS);
+    EXPECT_EQ(r.M_Type, eDunmark);
+    EXPECT_EQ(meter().type, eMorvex);  // the library's meter is not this program's
+    select(7);
+    dlclose(lib);
+}
