@@ -1,0 +1,158 @@
+#include "documents/discovery.h"
+
+#include <charconv>
+#include <cmath>
+#include <cstdio>
+#include <string_view>
+
+#include "component/err_propagator.h"
+#include "component/request_frame.h"
+#include "util/helpers.h"
+
+namespace varnel::detail {
+
+namespace {
+
+constexpr const char* kDisplayNames[] = {
+    "Old Meter",
+    "Corvia(R) Tarn",
+    "Corvia(R) Pellis(R)",
+    "Corvia(R) Dunmark(R), Corvia(R) Harvel(R), Corvia(R) Dunmark(R) Plus",
+    "Corvia(R) Quilla(R), Ostrel(TM), Bremo(R), Vimmet(R)",
+    "Corvia(R) TOLVO(TM), Corvia(R) TOLVO(TM) Plus",
+    "Corvia(R) Zenta(TM)",
+    "Corvia(R) Morvex(TM)",
+    "Parvix(R)",
+};
+
+constexpr int kFirmwareBytes = 20;
+constexpr double kPortLimit = 256;
+
+std::string trimmed(std::string_view s) {
+    const auto first = s.find_first_not_of(' ');
+    if (first == std::string_view::npos) return {};
+    return std::string(s.substr(first, s.find_last_not_of(' ') - first + 1));
+}
+
+// Text up to the next "/" of rest, which then starts after it.
+std::string takeDatePart(std::string_view& rest, const std::string& firmware) {
+    const auto slash = rest.find('/');
+    if (slash == std::string_view::npos)
+        raise(errc::internal, "The firmware text \"" + firmware + "\" has no month/day/year date");
+    std::string part = trimmed(rest.substr(0, slash));
+    rest.remove_prefix(slash + 1);
+    return part;
+}
+
+// A month number with at least two digits.
+std::string twoDigits(double value) {
+    char buf[32];
+    const int n = std::snprintf(buf, sizeof buf, "%02lld", std::llround(value));
+    return std::string(buf, static_cast<std::size_t>(n));
+}
+
+// The shortest decimal text of a number: 3, 3.5.
+std::string numberText(double value) {
+    char buf[32];
+    const auto end = std::to_chars(buf, buf + sizeof buf, value).ptr;
+    return std::string(buf, end);
+}
+
+// Meters that are switched off while they talk to the computer.
+bool talksWhileOff(std::int16_t meterType) { return meterType == 4 || meterType == 6 || meterType == 8; }
+
+}  // namespace
+
+FirmwareText splitFirmware(const std::string& firmware) {
+    FirmwareText out;
+    const auto blank = firmware.find(' ');
+    out.version = firmware.substr(0, blank);
+    std::string_view rest(firmware);
+    if (blank != std::string::npos) rest.remove_prefix(blank + 1);
+    const std::string month = takeDatePart(rest, firmware);
+    out.day = takeDatePart(rest, firmware);
+    const std::string year = trimmed(rest);
+    if (!year.empty()) {
+        const double y = ToNumber(year);
+        if (y >= 90 && y <= 99)
+            out.year = "19" + year;
+        else if (y >= 0 && y < 90)
+            out.year = "20" + year;
+    }
+    if (!month.empty()) out.month = twoDigits(ToNumber(month));
+    return out;
+}
+
+const char* meterDisplayName(std::int32_t meterType) {
+    if (meterType < 1 || meterType > 8) return kDisplayNames[0];
+    return kDisplayNames[meterType];
+}
+
+void writeDeviceDescription(XMLWrapper& doc, MeterDll& session) {
+    const METER_REC stored = session.storedRecord();
+    doc.SelectElement("DeviceInfo");
+    doc.AddElement("SN", session.LastMeterSerialNo());
+    const FirmwareText fw = splitFirmware(BytesToText(stored.Firmware_number, kFirmwareBytes));
+    doc.AddElement("MasterSWVer", fw.version);
+    if (!fw.day.empty() && !fw.month.empty() && !fw.year.empty()) {
+        doc.SetAttribute("D", fw.day);
+        doc.SetAttribute("MM", fw.month);
+        doc.SetAttribute("Y", fw.year);
+    }
+    doc.AddElement("Name", meterDisplayName(session.LastMeterType()));
+    doc.AddElement("TypeID", std::to_string(session.LastMeterType()));
+    doc.AddElement("Class", "0");
+    doc.SetAttribute("Txt", "Glucose Meter");
+    const bool off = talksWhileOff(stored.M_Type);
+    doc.AddElement("CommState", off ? "0" : "1");
+    doc.SetAttribute("Txt", off ? "Off" : "On");
+}
+
+std::int32_t discoverDevice(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
+                            XMLWrapper& connInfo, XMLWrapper& status) {
+    Request req(owner, "discoverDevice", udtMeterRec, &status);
+    return req.run([&]() -> std::int32_t {
+        req.ensureSession();
+
+        connInfo.SelectElement("Ports");
+        const std::string kind = connInfo.GetChildName(connInfo.GetChildCount() - 1);
+        std::string upper = kind;
+        for (char& c : upper)
+            if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 'a' + 'A');
+        if (upper != "COM") {
+            req.report(ME_NOT_SUPPORTED, ME_UNSUPPORTED_PORTS, kind + " is Unsupported");
+            return ME_UNSUPPORTED_PORTS;
+        }
+        connInfo.MoveToChild(kind);
+        const std::string ports = connInfo.GetChildValue("PortsToSearch");
+
+        // Only the first port of a list is searched.
+        const auto comma = ports.find(',');
+        const double port = ToNumber(comma == std::string::npos ? ports : ports.substr(0, comma));
+        if (!(port >= 0 && port < kPortLimit)) {
+            req.report(ME_FAIL, ME_INVALID_XMLWRAPPOBJ, ports + " is not a valid port");
+            return ME_INVALID_XMLWRAPPOBJ;
+        }
+        req.session.setCOMPort_Pref(roundToInt16(port));
+
+        const std::int16_t found = req.session.findmeter(udtMeterRec);
+        if (found != 0) {
+            const std::string searched = comma == std::string::npos ? ports : numberText(port);
+            req.fail(req.session.LastError(), " ; No meter detected on port " + searched);
+            SetContinueFlag(false);
+            req.session.transport().initialize_meter_structure(udtMeterRec);
+            return found;
+        }
+
+        SetContinueFlag(true);
+        writeDeviceDescription(deviceInfo, req.session);
+        deviceInfo.SelectElement("PortInfo");
+        deviceInfo.AddElement("PortID", std::to_string(req.session.COMPort_Detected()));
+        deviceInfo.AddElement("PortType", "0");
+        deviceInfo.SetAttribute("Txt", "Serial");
+        deviceInfo.MoveToRoot();
+        return ME_SUCCESS;
+    });
+}
+
+}  // namespace varnel::detail

@@ -1,0 +1,125 @@
+#include "documents/readings_document.h"
+
+#include <string>
+
+#include "component/request_frame.h"
+#include "documents/discovery.h"
+#include "documents/readings_entries.h"
+#include "readings/results.h"
+#include "util/helpers.h"
+#include "varnel/unique_checker.h"
+
+namespace varnel::detail {
+
+namespace {
+
+// Units of the transfer summary's ExtraInfo beyond the glucose calibration.
+struct ExtraUnit {
+    const char* element;
+    const char* txt;
+    bool (*writtenFor)(std::int16_t meterType);
+};
+
+constexpr ExtraUnit kExtraUnits[] = {
+    {"GlucUnit", "mg/dL", [](std::int16_t) { return true; }},
+    {"OMedUnit", "Each", [](std::int16_t t) { return t == eMorvex; }},
+    {"InsUnit", "Units", [](std::int16_t t) { return t == eMorvex || t == eCVPellis; }},
+    {"CholesUnit", "mg/dL", [](std::int16_t t) { return t == eMorvex; }},
+};
+
+// Record counts, calibration and units of the upload.
+void writeTransferSummary(XMLWrapper& datalog, MeterDll& session) {
+    const METER_REC stored = session.storedRecord();
+    const clsMeterFns& fns = session.meterFns();
+    // The binary datalog counts its corrupted records apart; the record datalog counts them in.
+    const bool binary = stored.M_Type == eMorvex;
+    const std::int32_t total = binary ? fns.recordCount() + fns.corruptedCount() : fns.recordCount();
+    const std::int32_t valid = binary ? fns.recordCount() : fns.recordCount() - fns.corruptedCount();
+
+    datalog.SelectElement("TransferDetail");
+    datalog.AddElement("Records");
+    datalog.AddChildElement("Total", "", std::to_string(total));
+    datalog.AddChildElement("Valid", "", std::to_string(valid));
+    datalog.AddChildElement("Corrupted", "", std::to_string(fns.corruptedCount()));
+    datalog.AddChildElement("Capacity", "", std::to_string(fns.maxRecordsForMeter()));
+
+    datalog.AddElement("ExtraInfo");
+    const bool plasma = session.Calibration() != 0;
+    datalog.AddChildElement("GlucCalib", "", plasma ? "1" : "0");
+    datalog.SetChildAttribute("Txt", plasma ? "Plasma" : "Whole Blood");
+    for (const ExtraUnit& unit : kExtraUnits) {
+        if (!unit.writtenFor(stored.M_Type)) continue;
+        datalog.SelectElement("TransferDetail");
+        datalog.MoveToChild("ExtraInfo");
+        datalog.AddElement(unit.element, "0");
+        datalog.SetAttribute("Txt", unit.txt);
+    }
+}
+
+}  // namespace
+
+std::int32_t getReadings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
+                         XMLWrapper& datalog, XMLWrapper&, XMLWrapper& status, bool& blnCheckMeter) {
+    Request req(owner, "getReadings", udtMeterRec, &status);
+    return req.run([&]() -> std::int32_t {
+        MeterDll& session = req.session;
+        if (!req.readPort(deviceInfo)) return req.complete(ME_BAD_PARAMETER);
+        blnCheckMeter = true;
+        session.initMeter(udtMeterRec);
+        SetContinueFlag(true);
+        if (!req.readIdentity(deviceInfo)) {
+            req.close();
+            return req.complete(ME_BAD_PARAMETER);
+        }
+
+        std::shared_ptr<MeterModel> meter = session.Meter();
+        if (!meter) {
+            req.fail(ME_FAIL);
+            req.close();
+            return req.complete(ME_FAIL);
+        }
+
+        // The upload reports 0-50, the conversion 50-100.
+        owner.resetPercentage();
+        owner.PercentLimit(50);
+        std::int16_t uploaded;
+        {
+            ProgressTimer timer;
+            uploaded = meter->GetReadingFromMeter();
+        }
+        if (uploaded != 0) {
+            req.fail(uploaded, " ; GetReadingFromMeter failed");
+            // The session's code, unless the failure left none behind.
+            const std::int16_t e = session.LastError();
+            req.close();
+            return req.complete(e != 0 ? e : uploaded);
+        }
+
+        owner.PercentLimit(100);
+        ResultCollection results;
+        std::string serial = session.LastMeterSerialNo();
+        std::int16_t type = session.LastMeterType();
+        meter->MeterUpload(serial, type, results);
+        owner.resetPercentage();
+        UniqueChecker checker;
+
+        writeDeviceDescription(datalog, session);
+        writeTransferSummary(datalog, session);
+        datalog.SelectElement("Records");
+        const METER_REC stored = session.storedRecord();
+        EntryContext context{.storedMeterType = stored.M_Type,
+                             .lastMeterType = session.LastMeterType(),
+                             .checkStripLow = session.CheckStripLow(),
+                             .checkStripHigh = session.CheckStripHigh(),
+                             .cholesUnitWritten = stored.M_Type == eMorvex};
+        writeReadingsEntries(datalog, results, context, checker);
+
+        if (std::int32_t c = req.checkMeter()) return req.complete(c);
+        SetContinueFlag(true);
+        if (std::int32_t r = req.compareIdentity()) return req.complete(r);
+        datalog.MoveToRoot();
+        return req.complete(ME_SUCCESS);
+    });
+}
+
+}  // namespace varnel::detail
