@@ -1,0 +1,230 @@
+#include <gtest/gtest.h>
+
+#include "component/err_propagator.h"
+#include "readings/meter_fns.h"
+#include "simulator.h"
+#include "support/fake_transport.h"
+
+using namespace varnel;
+using namespace varnel::detail;
+
+namespace {
+
+// Meter time and binary records as the simulated meter encodes them.
+struct SimDecoding : test::FakeTransport {
+    std::int16_t convert_from_seconds(std::int32_t seconds, TIME_REC& time) override {
+        sim::fromSeconds(seconds, time);
+        return 0;
+    }
+    std::int16_t GetMeterDatalogRecordData(METER_BIN_DATALOG& log, std::int16_t i, RECORD_DATA& r) override {
+        return sim::decodeBinaryRecord(log, i, r);
+    }
+};
+
+struct Conversion : ::testing::Test {
+    std::shared_ptr<SimDecoding> transport = std::make_shared<SimDecoding>();
+    clsMeterFns fns{transport};
+    ResultCollection results;
+    std::string serial;
+    std::int16_t type = 7;
+    std::vector<std::string> oralMeds{"Metformin", "Glipizide"}, insulins{"Humalog"};
+    std::vector<RECORD_DATA> records;
+
+    void SetUp() override { errPropagator().reset(); }
+
+    void add(std::int16_t recType, int day, auto fill) {
+        RECORD_DATA& r = records.emplace_back();
+        r.recType = recType;
+        r.timeStamp = sim::secondsOf(2004, 3, day, 8, 30, 15);
+        r.Ordinal = static_cast<std::int16_t>(records.size());
+        fill(r);
+    }
+    bool convertBinary() {
+        sim::encodeBinaryDatalog(records, fns.binaryDatalog());
+        return fns.Fastmeterupload(serial, type, results, oralMeds, insulins);
+    }
+    template <class R>
+    R& at(int i) {
+        return dynamic_cast<R&>(*results.Item(i));
+    }
+    std::vector<std::int32_t> types() {
+        std::vector<std::int32_t> out;
+        for (const auto& r : results) out.push_back(dynamic_cast<Result&>(*r).ResultType());
+        return out;
+    }
+    std::vector<std::int32_t> groups() {
+        std::vector<std::int32_t> out;
+        for (const auto& r : results) out.push_back(r->GroupId());
+        return out;
+    }
+};
+
+}  // namespace
+
+TEST_F(Conversion, BinaryRecordTypes) {
+    add(0, 1, [](auto& r) { r.reading = 123, r.alternateSiteFlag = 1, r.dietLabel = 3, r.exerciseLabel = 2,
+                            r.stressFlag = 1, r.otherFlag = 1; });
+    add(0, 1, [](auto& r) { r.reading = 90, r.controlFlag = 1; });
+    add(10, 1, [](auto& r) { r.oralMedType = 2, r.oralMedDosage = 2.5; });
+    add(11, 1, [](auto& r) { r.InsulinType = 1, r.insulinDosage = 4.25; });
+    add(12, 1, [](auto& r) { r.bolusSetting = 1.5; });
+    add(30, 1, [](auto& r) { r.ketones = 5; });
+    add(32, 1, [](auto& r) { r.microalbumin = -2; });
+    add(45, 1, [](auto& r) { r.ExerciseLevel = 1, r.exerciseDuration = 135; });
+    add(52, 1, [](auto& r) { r.oldCalCode = 12, r.newCalCode = 7; });
+    ASSERT_TRUE(convertBinary());
+    EXPECT_EQ(types(), (std::vector<std::int32_t>{11, 21, 70, 30, 41, 0, 122, 61, 2}));
+
+    auto& site = at<Glucose>(1);
+    EXPECT_EQ(site.Calibration(), 2);
+    EXPECT_EQ(site.Slot(), 3);
+    EXPECT_EQ(site.Value(), 123);
+    EXPECT_EQ(site.DateTime(), *DateTime::fromParts(2004, 3, 1, 8, 30, 15));
+    std::vector<std::int32_t> codes;
+    for (const auto& c : *site.Comments()) codes.push_back(c->Id());
+    EXPECT_EQ(codes, (std::vector<std::int32_t>{10, 17, 15}));
+    EXPECT_EQ(at<Glucose>(2).Calibration(), 1);
+    EXPECT_EQ(at<OralMeds>(3).OralMedsName(), "Glipizide");
+    EXPECT_EQ(at<OralMeds>(3).Value(), 2.5);
+    EXPECT_EQ(at<InsulinInjection>(4).InsulinName(), "Humalog");
+    EXPECT_EQ(at<Exercise>(8).Hours(), 2);
+    EXPECT_EQ(at<Exercise>(8).Minutes(), 15);
+    EXPECT_EQ(at<CalCode>(9).FromValue(), "12");
+    EXPECT_EQ(at<CalCode>(9).ToValue(), "7");
+    EXPECT_EQ(at<CalCode>(9).Ordinal(), 9);
+}
+
+TEST_F(Conversion, MissingValuesSnacksAndRanges) {
+    add(20, 1, [](auto& r) { r.mealSegment = 1, r.carbs = 45, r.fats = -1; });
+    add(20, 1, [](auto& r) { r.mealSegment = 3, r.carbs = 10, r.fats = 2; });
+    add(21, 1, [](auto& r) { r.mealSegment = 3, r.calories = -1, r.protein = 4; });
+    add(36, 1, [](auto& r) { r.weight = -1.0, r.height = 170.5; });
+    add(34, 1, [](auto& r) { r.cholesterolTotal = 1001, r.cholesterolTriglyceride = 3000; });
+    ASSERT_TRUE(convertBinary());
+    EXPECT_EQ(types(), (std::vector<std::int32_t>{50, 55, 57, 58, 101, 140, 150}));
+    EXPECT_EQ(at<Food>(1).MealSlot(), 3);
+    EXPECT_EQ(at<Food>(2).MealSlot(), 0);
+    EXPECT_EQ(at<BodyDimensions>(5).Value(), 170.5);
+    EXPECT_EQ(at<Cholestrol>(6).ValueInMeterRange(), 1);
+    EXPECT_EQ(at<Cholestrol>(7).ValueInMeterRange(), 3);
+}
+
+TEST_F(Conversion, MealsAndCholesterolOfOneDateShareAGroup) {
+    add(20, 1, [](auto& r) { r.carbs = 40, r.fats = 10; });
+    add(21, 1, [](auto& r) { r.calories = 400, r.protein = 20; });
+    add(20, 2, [](auto& r) { r.carbs = 30, r.fats = 5; });
+    add(21, 3, [](auto& r) { r.calories = 300, r.protein = 15; });  // a later date: a new group
+    add(21, 4, [](auto& r) { r.calories = 200, r.protein = 10; });  // after a closed group: its own
+    add(21, 4, [](auto& r) { r.mealSegment = 4; });                 // no open group: not unmatched
+    add(33, 5, [](auto& r) { r.cholesterolLDL = 100, r.cholesterolHDL = 50; });
+    add(34, 6, [](auto& r) { r.cholesterolTotal = 180, r.cholesterolTriglyceride = 120; });
+    add(37, 6, [](auto& r) { r.stressFlag = 1, r.illnessFlag = 1; });
+    add(20, 7, [](auto& r) { r.carbs = 5, r.fats = -1; });
+    add(21, 7, [](auto& r) { r.mealSegment = 4; });
+    ASSERT_TRUE(convertBinary());
+    EXPECT_EQ(groups(), (std::vector<std::int32_t>{1, 1, 1, 1, 2, 2, 3, 3, 4, 4, 5, 5, 6, 6, 7, 7, 8}));
+    EXPECT_EQ(results.Item(2)->MeterGroupId(), 1);
+    EXPECT_EQ(results.Item(3)->MeterGroupId(), 2);
+    EXPECT_EQ(at<HealthNotes>(16).ResultType(), 172);
+    EXPECT_EQ(at<HealthNotes>(16).MeterGroupId(), 8);
+    EXPECT_EQ(fns.unmatchedCount(), 1);
+}
+
+TEST_F(Conversion, UndecodableRecordStopsWithEarlierResultsKept) {
+    for (int day = 1; day <= 4; ++day) add(0, day, [](auto& r) { r.reading = 100; });
+    sim::encodeBinaryDatalog(records, fns.binaryDatalog());
+    sim::corruptBinaryRecord(fns.binaryDatalog(), 2);
+    fns.binaryDatalog().corruptedCount = -3;
+    fns.binaryDatalog().maxRecordsForMeter = 500;
+    EXPECT_FALSE(fns.Fastmeterupload(serial, type, results, oralMeds, insulins));
+    EXPECT_EQ(results.Count(), 2);
+    EXPECT_EQ(fns.recordCount(), 4);
+    EXPECT_EQ(fns.corruptedCount(), 0);
+    EXPECT_EQ(fns.maxRecordsForMeter(), 500);
+}
+
+TEST_F(Conversion, MedicationOutsideTheNamesRaisesWithEarlierResultsKept) {
+    add(0, 1, [](auto& r) { r.reading = 100; });
+    add(10, 1, [](auto& r) { r.oralMedType = 3; });
+    EXPECT_THROW(convertBinary(), ComponentError);
+    EXPECT_EQ(errPropagator().error().ErrorNo, errc::subscript_out_of_range);
+    EXPECT_EQ(errPropagator().error().ErrorTrace, "Fastmeterupload --> ");
+    EXPECT_EQ(results.Count(), 1);
+}
+
+namespace {
+
+data_rec entry(std::int16_t dType, std::int16_t tType, std::int16_t flags = 0, double medication = 0) {
+    data_rec r{};
+    r.D_Type = dType;
+    r.D_Time = sim::secondsOf(2005, 6, 7, 21, 5, 9);
+    r.Test.T_Type = tType;
+    r.Test.Flags = flags;
+    r.Test.Result = 111;
+    r.Test.Medication = medication;
+    return r;
+}
+
+}  // namespace
+
+TEST_F(Conversion, RecordDatalogRows) {
+    METER_DATALOG& log = fns.recordDatalog();
+    data_rec rows[] = {entry(1, 9, 3),  entry(1, 2, 1),        entry(1, 0, 2),       entry(1, 5),
+                       entry(2, 13, 0, 12.5), entry(2, 12, 0, 3.25), entry(2, 4, 0, 6), entry(2, 4, 0, 0),
+                       entry(2, 15, 0, 5), entry(3, 0),        entry(1, 0)};
+    rows[2].Test.Sample_detected = 1;
+    rows[2].Test.Event_code = 8;
+    rows[10].Valid = 1;
+    std::copy(std::begin(rows), std::end(rows), log.DataLog);
+    log.recordCount = 11;
+    log.ValidRecordCount = 10;
+    ASSERT_TRUE(fns.NonFastmeterUpload(serial, type, results));
+    EXPECT_EQ(types(), (std::vector<std::int32_t>{0, 20, 10, 21, 50, 41, 30}));
+    EXPECT_EQ(fns.recordCount(), 11);
+    EXPECT_EQ(fns.corruptedCount(), 1);
+    EXPECT_EQ(at<Error>(1).Value(), 111);
+    EXPECT_EQ(at<CheckStrip>(2).ValueInMeterRange(), 1);
+    auto& glucose = at<Glucose>(3);
+    EXPECT_EQ(glucose.ValueInMeterRange(), 2);
+    EXPECT_EQ(glucose.Calibration(), 2);
+    EXPECT_NE(glucose.Comments()->Item("8"), nullptr);
+    EXPECT_EQ(glucose.DateTime(), *DateTime::fromParts(2005, 6, 7, 21, 5, 9));
+    EXPECT_EQ(at<Food>(5).Value(), 12);
+    EXPECT_EQ(at<InsulinPump>(6).Value(), 3.25);
+    EXPECT_EQ(at<InsulinInjection>(7).InsulinName(), "Ultralente");
+}
+
+TEST_F(Conversion, RecordDatalogNeverReadsPastItsBuffer) {
+    METER_DATALOG& log = fns.recordDatalog();
+    std::fill(std::begin(log.DataLog), std::end(log.DataLog), entry(1, 0));
+    log.DataLog[3] = entry(1, 16);
+    log.recordCount = 5;
+    EXPECT_THROW(fns.NonFastmeterUpload(serial, type, results), ComponentError);
+    EXPECT_EQ(results.Count(), 3);
+
+    results = {};
+    log.DataLog[3] = entry(1, 0);
+    log.recordCount = 300;
+    errPropagator().reset();
+    EXPECT_THROW(fns.NonFastmeterUpload(serial, type, results), ComponentError);
+    EXPECT_EQ(errPropagator().error().ErrorTrace, "NonFastmeterUpload --> ");
+    EXPECT_EQ(results.Count(), 255);
+
+    results = {};
+    log.recordCount = -4;
+    EXPECT_TRUE(fns.NonFastmeterUpload(serial, type, results));
+    EXPECT_EQ(results.Count(), 0);
+}
+
+TEST_F(Conversion, TwoDigitYearWindow) {
+    METER_DATALOG& log = fns.recordDatalog();
+    int years[] = {2029, 2030, 1999};
+    for (int i = 0; i < 3; ++i) {
+        log.DataLog[i] = entry(1, 0);
+        log.DataLog[i].D_Time = sim::secondsOf(years[i], 12, 31, 23, 58, 59);
+    }
+    log.recordCount = 3;
+    ASSERT_TRUE(fns.NonFastmeterUpload(serial, type, results));
+    for (int i = 0; i < 3; ++i)
+        EXPECT_EQ(results.Item(i + 1)->DateTime(), *DateTime::fromParts(i == 1 ? 1930 : years[i], 12, 31, 23, 58, 59));
+}

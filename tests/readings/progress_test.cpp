@@ -1,0 +1,141 @@
+#include <gtest/gtest.h>
+
+#include "readings/meter_fns.h"
+#include "simulator.h"
+#include "support/fake_transport.h"
+#include "support/sim_transport.h"
+#include "util/helpers.h"
+#include "varnel/clock.h"
+
+using namespace varnel;
+using namespace varnel::detail;
+
+namespace {
+
+struct Progress : ::testing::Test {
+    std::shared_ptr<ManualClock> clock = std::make_shared<ManualClock>();
+    std::shared_ptr<test::FakeTransport> fake = std::make_shared<test::FakeTransport>();
+    clsMeterFns fns{fake};
+    std::vector<int> raised;
+
+    void SetUp() override {
+        setThreadClock(clock);
+        SetContinueFlag(true);
+        fns.onProgress = [this](std::int16_t& p) { raised.push_back(p); };
+        frmTimer().enableTimer();
+    }
+    void TearDown() override {
+        frmTimer().disableTimer();
+        setThreadClock(nullptr);
+        sim::reset();
+    }
+    // The transport fills the binary datalog in ten steps, pumping messages as it goes.
+    void uploadInSteps(std::int16_t capacity) {
+        fake->does("GetMeterDatalog", [this, capacity](test::FakeArgs& a) {
+            a.binDatalog->maxRecordsForMeter = capacity;
+            for (std::int16_t k = 1; k <= 10; ++k) {
+                a.binDatalog->recordCount = static_cast<std::int16_t>(k * 10);
+                clock->advance(400);
+                doEvents();
+            }
+        });
+    }
+    void convert(std::int16_t records) {
+        fns.recordDatalog().recordCount = records;
+        ResultCollection out;
+        std::string serial;
+        std::int16_t type = 1;
+        ASSERT_TRUE(fns.NonFastmeterUpload(serial, type, out));
+    }
+};
+
+}  // namespace
+
+TEST_F(Progress, UploadsStartIn2000AndNeverReportFailureAsSuccess) {
+    fake->does("convert_to_seconds", [](test::FakeArgs& a) {
+        const TIME_REC& t = *a.time;
+        EXPECT_EQ(std::vector<int>({t.sec, t.min, t.hour, t.mday, t.mon, t.year, t.wday, t.yday, t.isdst}),
+                  std::vector<int>({0, 0, 0, 1, 1, 2000, 0, 0, 0}));
+    });
+    fake->returns("convert_to_seconds", {946684800});
+    std::int16_t errorCode = -2;
+    fake->does("GetMeterDatalog", [&](test::FakeArgs& a) { a.rec->Error_code = errorCode; });
+    fake->returns("GetMeterDatalog", {0, -2, -3});
+    EXPECT_EQ(fns.GetFastmeterReading(), 0);
+    EXPECT_EQ(fake->calls().back().values, std::vector<std::int32_t>{946684800});
+    EXPECT_EQ(fns.GetFastmeterReading(), -2);
+    errorCode = 0;
+    EXPECT_EQ(fns.GetFastmeterReading(), -3);
+
+    fake->does("vb_Upload_Meter_Datalog", [](test::FakeArgs& a) { a.rec->Error_code = -13; });
+    fake->returns("vb_Upload_Meter_Datalog", {-1});
+    EXPECT_EQ(fns.GetNonFastMeterReading(), -13);
+
+    SetContinueFlag(false);
+    fake->clearLog();
+    EXPECT_EQ(fns.GetFastmeterReading(), 0);
+    EXPECT_EQ(fns.GetNonFastMeterReading(), 0);
+    EXPECT_TRUE(fake->calls().empty());
+}
+
+TEST_F(Progress, TimerProgressOfASessionNeverRepeats) {
+    uploadInSteps(100);
+    EXPECT_EQ(fns.GetFastmeterReading(), 0);
+    EXPECT_EQ(raised, (std::vector<int>{10, 20, 30, 40, 50, 60, 70, 80, 90, 100}));
+    raised.clear();
+    EXPECT_EQ(fns.GetFastmeterReading(), 0);
+    EXPECT_TRUE(raised.empty());
+}
+
+TEST_F(Progress, TimerOutsideUploadsAndWithoutCapacity) {
+    uploadInSteps(0);
+    EXPECT_EQ(fns.GetFastmeterReading(), 0);
+    EXPECT_TRUE(raised.empty());
+    fns.MeterRec.Percent_done = 35;
+    clock->advance(400);
+    doEvents();
+    fns.updateProgress(0);  // model set-up reports only values above 0
+    fns.updateProgress(50);
+    EXPECT_EQ(raised, (std::vector<int>{35, 50}));
+}
+
+TEST_F(Progress, ConversionReportsEveryTenPercentAndPumps) {
+    int ticks = 0;
+    TimerControl other(400);
+    auto connection = other.onTick([&] { ++ticks; });
+    other.setEnabled(true);
+    fns.onProgress = [&](std::int16_t& p) {
+        raised.push_back(p);
+        clock->advance(400);
+    };
+    convert(5);
+    EXPECT_EQ(raised, (std::vector<int>{20, 40, 60, 80}));
+    EXPECT_EQ(ticks, 4);
+    raised.clear();
+    convert(200);
+    EXPECT_EQ(raised, (std::vector<int>{10, 20, 30, 40, 50, 60, 70, 80, 90, 100}));
+}
+
+TEST_F(Progress, SimulatedMeterUploadOnTheManualClock) {
+    sim::MeterProfile meter = sim::defaultProfile(eMorvex);
+    meter.binaryDatalog.assign(200, RECORD_DATA{});
+    for (auto& r : meter.binaryDatalog) r.timeStamp = sim::secondsOf(2004, 5, 6), r.reading = 101;
+    meter.maxRecords = 200;
+    sim::loadProfile(meter);
+    clsMeterFns session(test::simTransport());
+    session.MeterRec.port.com_number = meter.port;
+    session.onProgress = fns.onProgress;
+
+    ASSERT_EQ(session.GetFastmeterReading(), 0);
+    ASSERT_GE(raised.size(), 3u);
+    for (std::size_t i = 1; i < raised.size(); ++i) EXPECT_GE(raised[i], raised[i - 1] + 10);
+    EXPECT_EQ(session.binaryDatalog().recordCount, 200);
+    clock->advance(400);  // after the upload the timer follows the record's percentage
+    doEvents();
+    EXPECT_EQ(raised.back(), 100);
+
+    sim::loadProfile(meter);
+    raised.clear();
+    ASSERT_EQ(session.GetFastmeterReading(), 0);
+    EXPECT_EQ(raised, (std::vector<int>{}));
+}
