@@ -2,6 +2,7 @@
 
 #include <dlfcn.h>
 
+#include <algorithm>
 #include <cstring>
 #include <functional>
 #include <stdexcept>
@@ -9,6 +10,8 @@
 
 #include "contracts/transport.h"
 #include "platform/message_pump.h"
+#include "simulator.h"
+#include "support/sim_transport.h"
 #include "varnel/clock.h"
 #include "varnel/component_error.h"
 
@@ -176,3 +179,27 @@ TEST_F(TransportYield, DueTicksRunWhileTheLibraryYieldsAndTheirErrorsFollowTheCa
 }
 
 }  // namespace
+
+TEST_F(TransportYield, TheSimulatorsLongOperationsDriveTheTimerThroughTheHook) {
+    varnel::sim::reset();
+    varnel::sim::selectType(7);
+    auto t = test::simTransport();
+    METER_REC rec{};
+    std::int32_t found[11]{};
+    std::int16_t ports[11]{1};
+    t->initialize_meter_structure(rec);
+    ASSERT_EQ(t->find_meter(rec, found, ports), ME_SUCCESS);
+
+    std::vector<int> seen;
+    auto connection = frmTimer().tmrStatus().onTick([&] { seen.push_back(rec.Percent_done); });
+    frmTimer().enableTimer();
+    const std::uint32_t start = clock->tickCount();
+    METER_BIN_DATALOG datalog{};
+    EXPECT_EQ(t->GetMeterDatalog(rec, datalog, 0), ME_SUCCESS);
+    const std::uint32_t took = clock->tickCount() - start;
+    ASSERT_GE(took, 800u);
+    EXPECT_NEAR(double(seen.size()), took / 400.0, 1.0);
+    EXPECT_TRUE(std::is_sorted(seen.begin(), seen.end()));
+    vx_set_yield_hook(nullptr, nullptr);
+    varnel::sim::reset();
+}
