@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <iterator>
-#include <span>
 #include <string>
 
 #include "component/err_propagator.h"
@@ -12,9 +11,8 @@ namespace varnel::detail {
 
 namespace {
 
-// Names are read from at most 9 bytes and written as at most 8 characters and a zero.
+// Names are read from at most 9 bytes; TextToBytes writes at most 8 characters and a zero.
 constexpr int kNameReadBytes = 9;
-constexpr std::size_t kNameWriteBytes = 9;
 
 std::int16_t getInsulinFavourites(Transport& t, METER_REC& rec, std::int16_t* out) {
     PREDEFINED_INSULINS_TYPE v{};
@@ -122,7 +120,7 @@ std::int16_t MedicationGroup::saveToMeter() {
             if (!changed_[slot]) continue;
             INSULIN_OR_ORAL_MED_NAME_TYPE record{};
             record.index = toInt16(p);
-            TextToBytes(std::span(record.nameStr).first(kNameWriteBytes), names_[slot]);
+            TextToBytes(record.nameStr, names_[slot]);
             if (std::int16_t code = outcome((t.*table_.setName)(rec_, record))) return code;
         }
         return outcome(table_.setFavourites(t, rec_, favourites_.data()));
