@@ -102,8 +102,9 @@ struct Entry {
 
 // --- glucose and check strip ---
 
-constexpr const char* kMealSlotTexts[] = {"Before Breakfast", "After Breakfast", "Before Lunch", "After Lunch",
-                                          "Before Dinner",    "After Dinner",    "Night",        "Sleep"};
+constexpr const char* kMealSlotTexts[] = {
+    "Before Breakfast", "After Breakfast", "Before Lunch", "After Lunch",
+    "Before Dinner",    "After Dinner",    "Night",        "Sleep"};
 
 void mealSlot(Entry& e, std::int32_t slot, bool glucose) {
     if (slot < 1 || slot > 8) return;
@@ -122,13 +123,20 @@ struct CommentElement {
 };
 
 constexpr CommentElement kCommentElements[] = {
-    {1, "Food", "1", "Fasting"},          {8, "Food", "0", "Different Food"},
-    {10, "Ex", "2", "During"},            {11, "Ex", "0", "Before"},
-    {12, "Ex", "1", "After"},             {13, "Ill", nullptr, nullptr},
-    {14, "Hypo", nullptr, nullptr},       {15, "Other", "0", "Other"},
-    {17, "Stress", nullptr, nullptr},     {18, "Menses", nullptr, nullptr},
-    {19, "Vac", nullptr, nullptr},        {23, "Food", "2", "Too much Food"},
-    {24, "Food", "3", "Not enough Food"}, {25, "Other", "1", "Other1"},
+    {1, "Food", "1", "Fasting"},
+    {8, "Food", "0", "Different Food"},
+    {10, "Ex", "2", "During"},
+    {11, "Ex", "0", "Before"},
+    {12, "Ex", "1", "After"},
+    {13, "Ill", nullptr, nullptr},
+    {14, "Hypo", nullptr, nullptr},
+    {15, "Other", "0", "Other"},
+    {17, "Stress", nullptr, nullptr},
+    {18, "Menses", nullptr, nullptr},
+    {19, "Vac", nullptr, nullptr},
+    {23, "Food", "2", "Too much Food"},
+    {24, "Food", "3", "Not enough Food"},
+    {25, "Other", "1", "Other1"},
     {26, "Other", "2", "Other2"},
 };
 
@@ -139,13 +147,14 @@ const CommentElement* commentElement(std::int32_t id) {
 }
 
 void comments(Entry& e, const Glucose& g) {
-    // These meters keep no comments worth showing.
+    // Meters of types 6 and 8 show no comments in the datalog.
     if (e.context.storedMeterType == 6 || e.context.storedMeterType == 8) return;
     auto list = g.Comments();
     auto events = g.events();
     // Any real comment counts, not just the first: a leading code 0 must not hide the rest.
     bool any = events->Count() > 0;
-    for (const CommentPtr& c : *list) any = any || c->Id() != 0;
+    for (const CommentPtr& c : *list)
+        any = any || c->Id() != 0;
     if (!any) return;
     e.child("Comments");
     for (const CommentPtr& c : *list) {
@@ -167,7 +176,8 @@ void writeGlucose(Entry& e, const Result& r) {
         std::int32_t type;
         const char *kind, *txt, *site;
     };
-    static constexpr Sample samples[] = {{21, "1", "Control", "4"}, {11, "0", "Blood", "1"}, {0, "0", "Blood", "0"}};
+    static constexpr Sample samples[] = {
+        {21, "1", "Control", "4"}, {11, "0", "Blood", "1"}, {0, "0", "Blood", "0"}};
     const Sample* s = &samples[2];
     for (const Sample& x : samples)
         if (x.type == g.ResultType()) {
@@ -210,21 +220,28 @@ void valueHtWt(Entry& e, const Result&, const Result& r) {
 }
 
 void valueCholes(Entry& e, const Result&, const Result& r) {
-    static constexpr Coded names[] = {{130, "LDL", ""}, {131, "HDL", ""}, {140, "Total", ""}, {150, "Trig", ""}};
-    if (const Coded* c = lookup(names, r.ResultType())) e.child(c->text, valueText<ResultKind::Cholestrol>(r));
+    static constexpr Coded names[] = {
+        {130, "LDL", ""}, {131, "HDL", ""}, {140, "Total", ""}, {150, "Trig", ""}};
+    if (const Coded* c = lookup(names, r.ResultType()))
+        e.child(c->text, valueText<ResultKind::Cholestrol>(r));
 }
 
-bool isSnack(const Result& r) { return r.ResultType() >= 55 && r.ResultType() <= 58; }
+bool isSnack(const Result& r) {
+    return r.ResultType() >= 55 && r.ResultType() <= 58;
+}
 
 void valueFood(Entry& e, const Result& first, const Result& r) {
     // Regular and snack codes name the same four values, five apart.
-    static constexpr Coded names[] = {{50, "Carbs", ""}, {51, "Cals", ""}, {52, "SFat", ""}, {53, "Protein", ""}};
+    static constexpr Coded names[] = {
+        {50, "Carbs", ""}, {51, "Cals", ""}, {52, "SFat", ""}, {53, "Protein", ""}};
     std::int32_t type = r.ResultType() - (isSnack(first) ? 5 : 0);
     if (const Coded* c = lookup(names, type)) e.child(c->text, valueText<ResultKind::Food>(r));
 }
 
 // A snack value never joins a meal entry nor the reverse: its value child would be lost.
-bool sameFoodKind(const Result& first, const Result& next) { return isSnack(first) == isSnack(next); }
+bool sameFoodKind(const Result& first, const Result& next) {
+    return isSnack(first) == isSnack(next);
+}
 
 void valueHNotes(Entry& e, const Result&, const Result& r) {
     static constexpr const char* names[] = {"Stress", "Hypo", "Ill", "Menses", "Vac", "Other"};
@@ -243,7 +260,9 @@ void writeFood(Entry& e, const Result& r) {
     e.codedChild("Slot", lookup(meals, as<Food>(r).MealSlot()));
 }
 
-void writeOrd(Entry& e, const Result& r) { e.ord(r); }
+void writeOrd(Entry& e, const Result& r) {
+    e.ord(r);
+}
 
 // --- entries of one result each ---
 
@@ -293,14 +312,18 @@ void writeInjection(Entry& e, const Result& r) {
 
 void writeKetones(Entry& e, const Result& r) {
     e.ord(r);
-    static constexpr Coded levels[] = {
-        {110, "0", "Negative"}, {111, "1", "Trace"}, {112, "2", "Small"}, {113, "3", "Moderate"}, {114, "4", "Large"}};
+    static constexpr Coded levels[] = {{110, "0", "Negative"},
+                                       {111, "1", "Trace"},
+                                       {112, "2", "Small"},
+                                       {113, "3", "Moderate"},
+                                       {114, "4", "Large"}};
     e.codedAttrs("Val", lookup(levels, r.ResultType()));
 }
 
 void writeVisit(Entry& e, const Result& r) {
     e.ord(r);
-    static constexpr Coded visits[] = {{160, "2", "Dr Visit"}, {161, "0", "Eye Exam"}, {162, "1", "Foot Exam"}};
+    static constexpr Coded visits[] = {
+        {160, "2", "Dr Visit"}, {161, "0", "Eye Exam"}, {162, "1", "Foot Exam"}};
     e.codedAttrs("Type", lookup(visits, r.ResultType()));
 }
 
@@ -434,8 +457,8 @@ void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryC
         Result& first = asResult(item);
         const EntryKind& k = entryKind(first.kind());
 
-        if (k.kind == ResultKind::Glucose && context.storedMeterType >= 1 &&
-            (context.storedMeterType <= 2 || context.storedMeterType == 7))
+        const std::int16_t type = context.storedMeterType;
+        if (k.kind == ResultKind::Glucose && (type == 1 || type == 2 || type == 7))
             ProcessCommentsAsPerDeviceType(as<Glucose>(first), context.lastMeterType);
         if (k.kind == ResultKind::Cholestrol && !context.cholesUnitWritten) {
             cholesUnit(datalog, as<Cholestrol>(first));

@@ -16,11 +16,12 @@ struct EntryContext {
     std::int16_t lastMeterType = 0;    // the session's LastMeterType (comment rewriting)
     std::int16_t checkStripLow = 0;    // the session's CheckStripLow / CheckStripHigh
     std::int16_t checkStripHigh = 0;
-    bool cholesUnitWritten = false;    // true when the transfer summary already wrote CholesUnit
+    bool cholesUnitWritten = false;  // true when the transfer summary already wrote CholesUnit
 };
 
-// Writes one entry element per result (merging as the rules say) under the datalog's Records element, which is current.
-void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryContext& context, UniqueChecker& checker);
+// Writes one entry element per result, merging the values of one meter entry, under the current Records.
+void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryContext& context,
+                          UniqueChecker& checker);
 
 // Rewrites a glucose result's comments for the meter type before its entry is written; always true.
 bool ProcessCommentsAsPerDeviceType(Glucose& result, std::int16_t deviceType);

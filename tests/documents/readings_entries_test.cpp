@@ -1,0 +1,225 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <pugixml.hpp>
+#include <sstream>
+
+#include "documents/readings_entries.h"
+#include "varnel/component_error.h"
+
+using namespace varnel;
+using namespace varnel::detail;
+using testing::HasSubstr;
+using testing::Not;
+using Lines = std::vector<std::string>;
+
+namespace {
+
+const std::string kDate = R"( D="5" MM="03" Y="2024" h="7" m="8" s="9")";
+
+// A datalog document as the request leaves it before the entries, and the results to write.
+struct Datalog {
+    XMLWrapper doc;
+    ResultCollection results;
+    EntryContext context{.checkStripLow = 80, .checkStripHigh = 120};
+    UniqueChecker checker;
+
+    explicit Datalog(std::int16_t meterType, bool withExtraInfo = true) {
+        context.storedMeterType = context.lastMeterType = meterType;
+        doc.InitDocument(doc_kind::datalog);
+        doc.SelectElement("TransferDetail");
+        doc.AddElement("Records");
+        if (withExtraInfo) doc.AddElement("ExtraInfo");
+        doc.SelectElement("Records");
+    }
+
+    template <class T>
+    T& add(std::int32_t type, double value = 0, std::int32_t group = 0) {
+        auto r = std::make_shared<T>();
+        r->setDateTime(*DateTime::fromParts(2024, 3, 5, 7, 8, 9));
+        r->setOrdinal(static_cast<std::int16_t>(results.Count() + 1));
+        r->setGroupId(group);
+        if constexpr (T::shape.fixedType == kSettableType) r->setResultType(type);
+        if constexpr (T::shape.value == ValueType::Long) r->setValue(static_cast<std::int32_t>(value));
+        if constexpr (T::shape.value == ValueType::Double) r->setValue(value);
+        results.Add(r);
+        return *r;
+    }
+
+    Glucose& glucose(std::initializer_list<std::int32_t> codes, std::int32_t slot = 0) {
+        Glucose& g = add<Glucose>(10, 100);
+        for (auto c : codes) g.Comments()->Add(c, 1, 1);
+        g.setSlot(slot);
+        return g;
+    }
+
+    // The children of the element at path, each as one line of XML with the test date shown as " @".
+    Lines at(const char* path) const {
+        pugi::xml_document parsed;
+        parsed.load_string(doc.XML().c_str());
+        Lines out;
+        for (pugi::xml_node n : parsed.first_element_by_path(path).children()) {
+            std::ostringstream s;
+            n.print(s, "", pugi::format_raw);
+            std::string text = s.str();
+            if (auto p = text.find(kDate); p != std::string::npos) text.replace(p, kDate.size(), " @");
+            out.push_back(text);
+        }
+        return out;
+    }
+
+    Lines write() {
+        writeReadingsEntries(doc, results, context, checker);
+        EXPECT_EQ(checker.Count(), 0u);
+        return at("/Datalog/Records");
+    }
+};
+
+}  // namespace
+
+TEST(ReadingsEntries, SingleEntriesByClass) {
+    Datalog d(4);
+    d.add<Error>(0, 7);
+    d.add<Glucose>(21, 112.5);
+    d.add<Glucose>(11, 3).setSlot(9);
+    d.add<CheckStrip>(0, 0.25).setSlot(7);
+    d.add<CalCode>(0).setToValue("13");
+    auto& ex = d.add<Exercise>(61);
+    ex.setHours(1);
+    ex.setMinutes(15);
+    d.add<Alcohol>(0, 0);
+    d.add<hbA1C>(0, 6.5);
+    d.add<InsulinPump>(41, 2.5);
+    d.add<InsulinInjection>(0, 4).setInsulinName("Rapid");
+    d.add<ketones>(113);
+    d.add<microalbumin>(123, 42);
+    d.add<microalbumin>(122);
+    d.add<OralMeds>(0, 1.5).setOralMedsName("Tab");
+    EXPECT_EQ(d.write(), (Lines{
+        R"(<Error @><Major>Gluc Error</Major><Minor>Test.Flags=3</Minor><Txt>7</Txt></Error>)",
+        R"(<Gluc @ Val="112.5" Type="1" Txt="Control" Site="4"/>)",
+        R"(<Gluc @ Val="3" Type="0" Txt="Blood" Site="1"/>)",
+        R"(<Gluc @ Site="4" Val="0.25" Type="2" Txt="Check Strip"><MealSlot Slot="7" Txt="Night"/>)"
+        R"(<Strip><Lvl Upper="120" Lower="80">1</Lvl></Strip></Gluc>)",
+        R"(<Change @ Type="2" From="" To="13"/>)",
+        R"(<Ex @ Duration="75"><Intensity Txt="Moderate">1</Intensity></Ex>)",
+        R"(<Alcohol @/>)",
+        R"(<HbA1c Health="true" @ Val="6.5"/>)",
+        R"(<MBolus Ins="true" Med="true" @ Val="2.5"/>)",
+        R"(<Ins Ins="true" Med="true" @ Val="4" InsName="Rapid"/>)",
+        R"(<Ketones Health="true" @ Val="3" Txt="Moderate"/>)",
+        R"(<MicroAlbumin Health="true" @><Val>42</Val></MicroAlbumin>)",
+        R"(<MicroAlbumin Health="true" @><Type Txt=">1000">2</Type></MicroAlbumin>)",
+        R"(<OralMed Med="true" @ Val="1.5"><OMedName>Tab</OMedName></OralMed>)"}));
+
+    Datalog ordered(7);
+    ordered.add<Error>(0, 1);
+    ordered.add<CalCode>(0);
+    ordered.add<Glucose>(10, 95);
+    ordered.add<InsulinPump>(40, 30);
+    EXPECT_EQ(ordered.write(), (Lines{
+        R"(<Error @><Major>Gluc Error</Major><Minor>Test.Flags=3</Minor><Txt>1</Txt></Error>)",
+        R"(<Change @ Type="2" From="" To=""/>)",
+        R"(<Gluc @ Val="95" Type="0" Txt="Blood" Site="0" Ord="3"/>)",
+        R"(<MTDD Ins="true" Med="true" @ Ord="4" Val="30"/>)"}));
+}
+
+TEST(ReadingsEntries, MergesValuesOfOneMeterEntry) {
+    Datalog d(4);
+    d.add<BloodPressure>(90, 120, 1);
+    d.add<BloodPressure>(91, 80, 2);  // BP merges whatever the group
+    d.add<BloodPressure>(90, 130, 3);
+    d.add<BloodPressure>(90, 125, 3);  // a second systolic is a new reading
+    d.add<BodyDimensions>(100, 70.5, 4);
+    d.add<BodyDimensions>(101, 180, 5);
+    d.add<BodyDimensions>(101, 175, 6);
+    d.add<BodyDimensions>(100, 72, 6);
+    d.add<HealthNotes>(170, 1, 7);
+    d.add<HealthNotes>(172, 1, 7);
+    d.add<Food>(50, 45, 8).setMealSlot(3);
+    d.add<Food>(52, 10, 8);
+    d.add<Food>(51, 400, 8);
+    d.add<Food>(53, 20, 8);
+    d.add<Food>(57, 5, 8);  // a snack value does not join a meal
+    d.add<Food>(55, 12, 9);
+    d.add<Food>(55, 30, 9);
+    EXPECT_EQ(d.write(), (Lines{
+        R"(<BP Health="true" @ Syst="120" Diast="80"/>)",
+        R"(<BP Health="true" @ Syst="130"/>)",
+        R"(<BP Health="true" @ Syst="125"/>)",
+        R"(<HtWt Health="true" @><Wt>70.5</Wt></HtWt>)",
+        R"(<HtWt Health="true" @><Ht>180</Ht></HtWt>)",
+        R"(<HtWt Health="true" @><Ht>175</Ht><Wt>72</Wt></HtWt>)",
+        R"(<HNotes Health="true" @><Stress/><Ill/></HNotes>)",
+        R"(<Food @><Slot Txt="Lunch">2</Slot><Carbs>45</Carbs><SFat>10</SFat><Cals>400</Cals>)"
+        R"(<Protein>20</Protein></Food>)",
+        R"(<Food @><Slot Txt="Snack">4</Slot><SFat>5</SFat></Food>)",
+        R"(<Food @><Slot Txt="Snack">4</Slot><Carbs>12</Carbs></Food>)",
+        R"(<Food @><Slot Txt="Snack">4</Slot><Carbs>30</Carbs></Food>)"}));
+}
+
+TEST(ReadingsEntries, CholesterolUnitWrittenOnceAndEarlierEntriesSurviveErrors) {
+    Datalog d(3);
+    d.add<Cholestrol>(130, 100, 1).setUnitType(1);
+    d.add<Cholestrol>(131, 2.5, 1);
+    d.add<Cholestrol>(150, 1.5, 1);
+    d.add<Cholestrol>(130, 3, 2);
+    EXPECT_EQ(d.write(), (Lines{
+        R"(<Choles Health="true" @><LDL>100</LDL><HDL>2.5</HDL><Trig>1.5</Trig></Choles>)",
+        R"(<Choles Health="true" @><LDL>3</LDL></Choles>)"}));
+    EXPECT_EQ(d.at("/Datalog/TransferDetail/ExtraInfo"),
+              (Lines{R"(<CholesUnit Txt="mmol/L">1</CholesUnit>)"}));
+
+    Datalog written(7);
+    written.context.cholesUnitWritten = true;
+    written.add<Cholestrol>(140, 180);
+    EXPECT_EQ(written.write().size(), 1u);
+    EXPECT_TRUE(written.at("/Datalog/TransferDetail/ExtraInfo").empty());
+
+    Datalog broken(3, /*withExtraInfo=*/false);
+    broken.add<hbA1C>(0, 7);
+    broken.add<Cholestrol>(140, 180);
+    EXPECT_THROW(broken.write(), ComponentError);
+    EXPECT_EQ(broken.at("/Datalog/Records"), (Lines{R"(<HbA1c Health="true" @ Val="7"/>)"}));
+}
+
+TEST(ReadingsEntries, GlucoseCommentsAndSlotsByMeterType) {
+    const std::string plain = R"(<Gluc @ Val="100" Type="0" Txt="Blood" Site="0">)";
+    Datalog two(2);
+    two.glucose({5});
+    two.glucose({13});
+    two.glucose({0, 3, 9, 1});  // the later slot code wins, code 1 stays a comment
+    two.add<CheckStrip>(0, 1).setSlot(7);
+    Lines lines = two.write();
+    EXPECT_EQ(lines[0], plain + R"(<MealSlot Slot="4" Txt="After Lunch"/></Gluc>)");
+    EXPECT_EQ(lines[1], plain + R"(<Comments><Ill/></Comments></Gluc>)");
+    EXPECT_EQ(lines[2], plain + R"(<MealSlot Slot="7" Txt="Sleep"/>)"
+                                R"(<Comments><Food Txt="Fasting">1</Food></Comments></Gluc>)");
+    EXPECT_THAT(lines[3], HasSubstr(R"(<MealSlot Slot="7" Txt="Night"/>)"));
+
+    Datalog one(1);
+    one.glucose({0, 11, 24});
+    EXPECT_EQ(one.write()[0], plain + R"(<Comments><Event Txt="EVENT11">11</Event>)"
+                                      R"(<Event Txt="EVENT24">24</Event></Comments></Gluc>)");
+
+    Datalog seven(7);
+    seven.glucose({1, 8, 10, 14, 25, 99}).events()->Add(5, 1, 0);
+    EXPECT_THAT(seven.write()[0],
+                HasSubstr(R"(<Comments><Food Txt="Fasting">1</Food><Food Txt="Different Food">0</Food>)"
+                          R"(<Ex Txt="During">2</Ex><Hypo/><Other Txt="Other1">1</Other>)"
+                          R"(<Event Txt="EVENT5">5</Event></Comments>)"));
+
+    // Other meters keep their comments as they come; a leading code 0 hides nothing.
+    Datalog four(4);
+    four.glucose({0, 13});
+    four.glucose({11}, 7);
+    lines = four.write();
+    EXPECT_EQ(lines[0], plain + "<Comments><Ill/></Comments></Gluc>");
+    EXPECT_EQ(lines[1], plain + R"(<MealSlot Slot="7" Txt="Night"/>)"
+                                R"(<Comments><Ex Txt="Before">0</Ex></Comments></Gluc>)");
+    for (std::int16_t type : {6, 8}) {
+        Datalog quiet(type);
+        quiet.glucose({13}).events()->Add(4, 1, 0);
+        EXPECT_THAT(quiet.write()[0], Not(HasSubstr("Comments"))) << type;
+    }
+}
