@@ -149,20 +149,31 @@ TEST_F(Groups, MedicationNamesRoundTripAndOnlyCustomChangesAreSent) {
     EXPECT_TRUE(insulins.InsulinNameChanged(12));  // a save leaves the flags
 }
 
-TEST_F(Groups, MedicationReadFailsOnAnyMissingNameAndStopsOnTheContinueFlag) {
+TEST_F(Groups, MedicationReadDecidedByTheLastNameAndStopsOnTheContinueFlag) {
     connect(eMorvex);
     auto insulins = initialised<Group_Insulins>(*fns);
-    sim::injectFault("GetInsulinName", 5, ME_CHKSUM_ERROR, false);
-    EXPECT_EQ(insulins.readFromMeter(), ME_CHKSUM_ERROR);
-    EXPECT_EQ(insulins.InsulinName(4), sim::meter().insulinNames[3].bytes);
-    EXPECT_EQ(insulins.InsulinName(5), "");
-    EXPECT_EQ(sim::callCount("GetInsulinName"), 5);
-    EXPECT_EQ(sim::callCount("GetPredefinedInsulins"), 0);
+    ASSERT_EQ(insulins.readFromMeter(), 0);
+    const std::string fifth = insulins.InsulinName(5);
+    ASSERT_FALSE(fifth.empty());
 
+    // A failure before the last position still counts as read; the name it missed is kept.
+    sim::clearFaults();
+    sim::injectFault("GetInsulinName", 5, ME_CHKSUM_ERROR, false);
+    EXPECT_EQ(insulins.readFromMeter(), 0);
+    EXPECT_EQ(insulins.InsulinName(5), fifth);
+    EXPECT_EQ(insulins.InsulinName(4), sim::meter().insulinNames[3].bytes);
+
+    // A failure at the last position fails the read before the favourites.
+    const int favouriteCalls = sim::callCount("GetPredefinedInsulins");
+    sim::injectFault("GetInsulinName", 21, ME_CHKSUM_ERROR, false);
+    EXPECT_EQ(insulins.readFromMeter(), ME_CHKSUM_ERROR);
+    EXPECT_EQ(sim::callCount("GetPredefinedInsulins"), favouriteCalls);
+
+    const int nameCalls = sim::callCount("GetInsulinName");
     insulins.setInsulinName(14, "Mine");
     SetContinueFlag(false);
     EXPECT_EQ(insulins.readFromMeter(), 0);
-    EXPECT_EQ(sim::callCount("GetInsulinName"), 5);
+    EXPECT_EQ(sim::callCount("GetInsulinName"), nameCalls);
     EXPECT_TRUE(insulins.InsulinNameChanged(14));
 }
 
