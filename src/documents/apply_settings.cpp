@@ -1,0 +1,286 @@
+// setDeviceSettings: writes a device configuration document, as the client
+// edited it, to the meter it describes.
+#include "documents/apply_settings.h"
+
+#include <algorithm>
+#include <cmath>
+#include <initializer_list>
+#include <iterator>
+
+#include "component/err_propagator.h"
+#include "component/error_description.h"
+#include "component/request_frame.h"
+#include "documents/settings_requests.h"
+#include "settings/clock_group.h"
+#include "util/helpers.h"
+
+namespace varnel::detail {
+
+namespace {
+
+// How an element of "Settings" is written.
+enum class Write { clock, option, devInit, insulins, pills, schedule, targets };
+
+// Meter types as bits: bit t for type t.
+using TypeSet = std::uint16_t;
+
+constexpr TypeSet types(std::initializer_list<int> list) {
+    TypeSet set = 0;
+    for (int t : list) set = static_cast<TypeSet>(set | (1u << t));
+    return set;
+}
+
+constexpr TypeSet kAllTypes = types({1, 2, 3, 4, 5, 6, 7, 8});
+
+struct SettingsItem {
+    const char* name;
+    const char* alias;  // a second element name for the same item, or null
+    TypeSet acceptedFor;
+    Write write;
+    MeterOptions_Enum option;  // for Write::option
+};
+
+// The elements setDeviceSettings writes, in the order it writes them, with the
+// meter types that accept each.
+constexpr SettingsItem kItems[] = {
+    {"Clock", nullptr, kAllTypes, Write::clock, eStripCalCode},
+    {"CC", nullptr, types({1, 2, 3, 5, 7}), Write::option, eStripCalCode},
+    {"Beep", nullptr, types({1, 2, 3, 5, 7}), Write::option, eBeepStatus},
+    {"GlucUnit", nullptr, kAllTypes, Write::option, eUnits},
+    {"DevInit", nullptr, types({7}), Write::devInit, eStripCalCode},
+    {"Decimal", nullptr, types({1, 2, 5}), Write::option, eNumericSeparator},
+    {"DateFormat", nullptr, types({1, 2, 3, 5, 7}), Write::option, eDateFormat},
+    {"TimeFormat", nullptr, types({1, 2, 3, 5, 6, 7, 8}), Write::option, eTimeFormat},
+    {"Language", nullptr, types({1, 2, 3, 5, 7}), Write::option, eLanguage},
+    {"CommMode", nullptr, types({1, 5}), Write::option, eCommunicationMode},
+    {"Baud", nullptr, types({1, 5}), Write::option, eCommunicationRate},
+    {"NewLang", nullptr, types({1, 5}), Write::option, eTranslateNewLang},
+    {"EvtAvg", "EvtAvgDurn", types({2, 7}), Write::option, eEvevtAveraging},
+    {"InsPrompt", nullptr, types({2}), Write::option, eInsulinPrompt},
+    {"ShowLastResult", nullptr, types({3}), Write::option, eDisplayLastTest},
+    {"DaysAveraged", nullptr, types({3}), Write::option, eDayAverage},
+    {"ShowClock", nullptr, types({5}), Write::option, eDisplayClock},
+    {"DayLight", nullptr, types({5}), Write::option, eDaylightSavings},
+    {"WeekBegin", nullptr, types({7}), Write::option, eWeekStartDay},
+    {"CholesUnit", nullptr, types({7}), Write::option, eCholestrolUnits},
+    {"PumpUse", nullptr, types({7}), Write::option, eInsulinPumpUse},
+    {"Insulins", nullptr, types({7}), Write::insulins, eStripCalCode},
+    {"Pills", nullptr, types({7}), Write::pills, eStripCalCode},
+    {"Schedule", nullptr, types({7}), Write::schedule, eStripCalCode},
+    {"Targets", nullptr, types({7}), Write::targets, eStripCalCode},
+};
+
+// Elements the client may send back as it read them, which are never written.
+constexpr const char* kReadOnlyItems[] = {"GlucErrRange", "GlucRange", "GlucCalib"};
+
+std::string trimmed(const std::string& s) {
+    const auto first = s.find_first_not_of(' ');
+    if (first == std::string::npos) return {};
+    return s.substr(first, s.find_last_not_of(' ') - first + 1);
+}
+
+std::string lowerCase(std::string s) {
+    for (char& c : s)
+        if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
+    return s;
+}
+
+bool validType(const std::string& text) {
+    const double type = ToNumber(text);
+    return type > 0 && type <= 8;
+}
+
+bool wholeNumber(double v) { return std::floor(v) == v; }
+
+// The clock of "Settings/Clock/Val", refused with a message when it is not a
+// time the meter type can hold; nothing is written then.
+MissingElement applyClock(ApplyContext& ctx, bool& written) {
+    auto clock = std::dynamic_pointer_cast<Group_Clock>(ctx.meter.Settings().Item(eGroupClock));
+    if (!clock) return {};
+    written = true;
+    clock->initialise(ctx.session.meterFns());
+    XMLWrapper& cfg = ctx.deviceCfg;
+    cfg.SelectElement("Settings");
+    if (cfg.CountElements("Clock") != 1) return "Clock";
+    cfg.MoveToChild("Clock");
+    const auto part = [&](const char* name) { return trimmed(cfg.GetChildAttribute("Val", name)); };
+    const std::string day = part("D"), month = part("MM"), year = part("Y");
+    const std::string h = part("h"), m = part("m"), s = part("s");
+
+    const double hour = ToNumber(h), minute = ToNumber(m), second = ToNumber(s);
+    // Fractions are refused too: they would round into the next hour or day.
+    const bool valid = IsNumeric(h) && IsNumeric(m) && (s.empty() || IsNumeric(s)) && hour >= 0 && hour < 24 &&
+                       minute >= 0 && minute < 60 && second >= 0 && second < 60 && wholeNumber(hour) &&
+                       wholeNumber(minute) && wholeNumber(second) &&
+                       IsValidDate(day + "/" + month + "/" + year, "/", "dd/MM/yyyy");
+    if (!valid) {
+        ctx.outcome.refuse("Invalid DeviceClock value ; ");
+        return {};
+    }
+    const int y = static_cast<int>(ToNumber(year));
+    std::int32_t first = 0, last = -1;  // no range: no year test
+    getMinMaxDates(ctx.session.storedRecord().M_Type, first, last);
+    if (first <= last && (y < DateTime::fromSerial(first).year() || y > DateTime::fromSerial(last).year())) {
+        ctx.outcome.refuse("Invalid DeviceClock year value ; ");
+        return {};
+    }
+    clock->setClockTime(*DateTime::fromParts(y, static_cast<int>(ToNumber(month)), static_cast<int>(ToNumber(day)),
+                                             static_cast<int>(hour), static_cast<int>(minute),
+                                             static_cast<int>(second)));
+    if (clock->saveToMeter() != 0)
+        ctx.outcome.refuse("Invalid DeviceClock value ; ");
+    else
+        ctx.outcome.bSuccess = true;
+    return {};
+}
+
+// The meter's initialised flag, 0 or 1.
+void applyDevInit(ApplyContext& ctx) {
+    ctx.deviceCfg.SelectElement("Settings");
+    const std::string v = trimmed(ctx.deviceCfg.GetChildValue("DevInit"));
+    const double flag = ToNumber(v);
+    // An empty element is no value, not 0.
+    if (v.empty() || (flag != 0 && flag != 1)) {
+        ctx.outcome.refuse("Invalid DevInit value ; ");
+        return;
+    }
+    if (const std::int16_t code = ctx.session.setDevInitialised(toInt16(static_cast<long long>(flag))))
+        ctx.outcome.refuse("Invalid DevInit value ; " + ErrorDescription(code) + ";");
+    else
+        ctx.outcome.bSuccess = true;
+}
+
+}  // namespace
+
+std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
+                               XMLWrapper& deviceCfg, XMLWrapper& status) {
+    Request req(owner, "getDeviceSettings", udtMeterRec, &status);
+    return req.run([&]() -> std::int32_t {
+        MeterDll& session = req.session;
+        WriteOutcome outcome;
+        const auto stop = [&](std::int32_t major, std::int32_t minor, const std::string& description) {
+            req.report(major, minor, description);
+            return req.complete(ME_FAIL);
+        };
+        const auto badParameter = [&](const char* context) {
+            return stop(ME_FAIL, ME_BAD_PARAMETER, ErrorDescription(ME_BAD_PARAMETER) + context);
+        };
+        const auto invalidXml = [&](const std::string& context) {
+            return stop(ME_FAIL, ME_INVALID_XMLWRAPPOBJ, ErrorDescription(ME_INVALID_XMLWRAPPOBJ) + context);
+        };
+        const auto different = [&](const std::string& context) {
+            return stop(ME_DIFFERENT_DEVICE, ME_DIFFERENT_DEVICE, ErrorDescription(ME_DIFFERENT_DEVICE) + context);
+        };
+
+        deviceInfo.SelectElement("PortInfo");
+        const std::string portText = deviceInfo.GetChildValue("PortID");
+        req.ensureSession();
+        deviceInfo.SelectElement("DeviceInfo");
+        const std::string infoSerial = deviceInfo.GetChildValue("SN");
+        if (infoSerial.empty()) return badParameter(" ; Device SN from Device Info XML is invalid");
+        const std::string infoType = deviceInfo.GetChildValue("TypeID");
+        if (!validType(infoType)) return badParameter(" ; Device Type from Device Info XML is invalid");
+
+        deviceCfg.MoveToRoot();
+        if (deviceCfg.GetRootName() != "DeviceSettings") return invalidXml(" ;");
+        if (deviceCfg.CountElements("DeviceInfo") != 1) return invalidXml(" ;DeviceInfo missing in Device settings");
+        deviceCfg.MoveToChild("DeviceInfo");
+        const std::string cfgType = deviceCfg.GetChildValue("TypeID");
+        deviceCfg.MoveToRoot();
+        if (!validType(cfgType)) return badParameter(" ; Device Type from Device Info XML is invalid");
+        deviceCfg.SelectElement("DeviceInfo");
+        const std::string cfgSerial = deviceCfg.GetChildValue("SN");
+        deviceCfg.MoveToRoot();
+        if (cfgSerial.empty()) return badParameter(" ; Device SN from Device settings XML is invalid");
+
+        const double port = ToNumber(portText);
+        if (port < 0)
+            return stop(ME_COM_ERROR, ME_BAD_PARAMETER,
+                        ErrorDescription(ME_BAD_PARAMETER) + " ; Port number from XML is invalid");
+        session.setCOMPort_Pref(roundToInt16(port));
+        session.initMeter(udtMeterRec);
+        if (const std::int32_t c = session.checkmeter(udtMeterRec)) return stop(ME_FAIL, c, ErrorDescription(c));
+
+        const std::string meterSerial = session.LastMeterSerialNo();
+        if (lowerCase(meterSerial) != lowerCase(cfgSerial))
+            return different(" ; Device SN from Device settings XML - " + cfgSerial + " Device SN from device - " +
+                             meterSerial + " do not match");
+        const std::int16_t meterType = session.storedRecord().M_Type;
+        if (ToNumber(cfgType) != meterType)
+            return different(" ; Device Type from Device settings XML - " + cfgType + " Device Type from device - " +
+                             std::to_string(meterType) + " do not match");
+        if (ToNumber(infoType) != meterType)
+            return different(" ; Device Type from Device Info XML - " + infoType + " Device Type from device - " +
+                             std::to_string(meterType) + " do not match");
+        if (lowerCase(meterSerial) != lowerCase(infoSerial))
+            return different(" ; Device SN from Device Info XML - " + infoSerial + " Device SN from device - " +
+                             meterSerial + " do not match");
+
+        deviceCfg.MoveToRoot();
+        if (deviceCfg.CountElements("Settings") != 1) return invalidXml(" ;Settings missing in Device settings");
+        deviceCfg.MoveToChild("Settings");
+        const std::int32_t children = deviceCfg.GetChildCount();
+        if (children == 0) return invalidXml("");
+
+        bool wanted[std::size(kItems)] = {};
+        int accepted = 0;
+        for (std::int32_t i = 0; i < children; ++i) {
+            const std::string name = deviceCfg.GetChildName(i);
+            const auto item = std::find_if(std::begin(kItems), std::end(kItems), [&](const SettingsItem& it) {
+                return name == it.name || (it.alias && name == it.alias);
+            });
+            if (item != std::end(kItems) && (item->acceptedFor >> meterType & 1u)) {
+                wanted[item - std::begin(kItems)] = true;
+                ++accepted;
+            } else if (std::find(std::begin(kReadOnlyItems), std::end(kReadOnlyItems), name) !=
+                       std::end(kReadOnlyItems)) {
+                outcome.refuse(name + " value is read only;");
+            } else {
+                outcome.refuse(name + " is not supported;");
+            }
+        }
+
+        std::shared_ptr<MeterModel> meter = session.Meter();
+        const std::int16_t step = accepted > 0 ? roundToInt16(100.0 / accepted) : 0;
+        if (!meter) return stop(ME_FAIL, ME_NO_DEVICE, ErrorDescription(ME_NO_DEVICE));
+
+        // One stage of 0-100, whatever an earlier request left.
+        owner.resetPercentage();
+        owner.PercentLimit(100);
+        ApplyContext ctx{session, *meter, deviceCfg, outcome};
+        std::int16_t percent = 0;
+        for (std::size_t i = 0; i < std::size(kItems); ++i) {
+            if (!wanted[i]) continue;
+            MissingElement missing;
+            bool written = true;
+            switch (kItems[i].write) {
+                case Write::clock: written = false; missing = applyClock(ctx, written); break;
+                case Write::option: writeOption(session, kItems[i].option, deviceCfg, status, outcome); break;
+                case Write::devInit: applyDevInit(ctx); break;
+                case Write::insulins: missing = applyInsulins(ctx); break;
+                case Write::pills: missing = applyOralMeds(ctx); break;
+                case Write::schedule: missing = applySchedule(ctx); break;
+                case Write::targets: missing = applyTargets(ctx); break;
+            }
+            // The writes made so far stay made; the refusals gathered so far are told too.
+            if (missing)
+                return invalidXml(" ;" + *missing + " missing in Device settings" +
+                                  (outcome.strError.empty() ? "" : ";" + outcome.strError));
+            if (!written) continue;
+            percent = static_cast<std::int16_t>(std::min(percent + step, 100));
+            owner.RaiseProgress(percent);
+        }
+
+        if (outcome.bFailure && outcome.bSuccess)
+            req.report(ME_PARTIALSUCCESS, ME_PARTIALSUCCESS,
+                       ErrorDescription(ME_PARTIALSUCCESS) + ";" + outcome.strError);
+        else if (outcome.bFailure)
+            req.report(ME_FAIL, ME_FAIL, ErrorDescription(ME_FAIL) + ";" + outcome.strError);
+        else
+            req.report(ME_SUCCESS, ME_SUCCESS, ErrorDescription(ME_SUCCESS));
+        status.MoveToRoot();
+        return req.complete(ME_SUCCESS);
+    });
+}
+
+}  // namespace varnel::detail

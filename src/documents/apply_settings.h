@@ -1,0 +1,37 @@
+// The steps of setDeviceSettings that write one settings group each, from the
+// "Settings" element of a device configuration document.
+#pragma once
+
+#include <optional>
+#include <string>
+
+#include "readings/meter_models.h"
+#include "session/meter_dll.h"
+#include "session/option_writers.h"
+#include "varnel/xml_wrapper.h"
+
+namespace varnel::detail {
+
+// What a write step works on.
+struct ApplyContext {
+    MeterDll& session;
+    MeterModel& meter;
+    XMLWrapper& deviceCfg;
+    WriteOutcome& outcome;
+};
+
+// The element a step found missing or doubled, which ends the request; nothing
+// when the step ran to its end. Value refusals only go into the outcome.
+using MissingElement = std::optional<std::string>;
+
+// Element of meal segment 1-7 ("PreB" ... "Night"); null for any other segment.
+const char* mealSegmentElement(std::int32_t segment);
+
+// Each fills its group from the document and saves it once; a model without
+// the group makes the step do nothing.
+MissingElement applyInsulins(ApplyContext& ctx);
+MissingElement applyOralMeds(ApplyContext& ctx);
+MissingElement applySchedule(ApplyContext& ctx);
+MissingElement applyTargets(ApplyContext& ctx);
+
+}  // namespace varnel::detail

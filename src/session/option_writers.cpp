@@ -1,0 +1,169 @@
+#include "session/option_writers.h"
+
+#include <iterator>
+
+#include "component/err_propagator.h"
+#include "component/error_description.h"
+#include "util/helpers.h"
+
+namespace varnel::detail {
+
+namespace {
+
+// How the document's value becomes the meter's.
+enum class Mapping {
+    none,
+    swapOnOff,    // numeric 1 is written as 0 and 0 as 1; anything else as it is
+    reverseBaud,  // "0" "1" "2" "3" become "3" "2" "1" "0"; anything else as it is
+};
+
+struct OptionWriter {
+    const char* member;
+    const char* element;  // null: chosen by meter type
+    Mapping mapping;
+    // Messages: no value, the meter refused the write, the option is not writable.
+    const char* emptyValue;
+    const char* refused;
+    const char* readOnly;
+    // Notes itself in the status document when it fails unexpectedly.
+    bool notesFailure = false;
+};
+
+// One writer per option, indexed by MeterOptions_Enum. The messages' blanks and
+// semicolons are what clients have always received; keep them as they are.
+constexpr OptionWriter kWriters[] = {
+    {"SetStripCalCode", "CC", Mapping::none, " Invalid StripCalCode value ;", " Invalid StripCalCode value ;",
+     " StripCalCode value is read only;"},
+    {"SetBeeper", "Beep", Mapping::swapOnOff, " Invalid Beeper value ;", " Invalid Beeper value ;",
+     " Beeper value is read only; "},
+    {"SetGlucoseUnits", "GlucUnit", Mapping::none, " Invalid GlucoseUnit value ;", " Invalid GlucoseUnit value; ",
+     " GlucoseUnit value is read only "},
+    {"SetPunctuation", "Decimal", Mapping::none, " Invalid Punctuation value ;", " Invalid Punctuation value ;",
+     " Punctuation value is read only ;"},
+    {"SetDateMode", "DateFormat", Mapping::none, " Invalid DateMode value ;", " Invalid DateMode value ;",
+     " DateMode value is read only ;"},
+    {"SetTimeMode", "TimeFormat", Mapping::none, " Invalid TimeMode value ;", " Invalid TimeMode value ;",
+     " TimeMode value is read only ;"},
+    {"SetLanguage", "Language", Mapping::none, " Invalid Language value ;", " Invalid Language value; ",
+     " Language value is read only; "},
+    {"SetCommMode", "CommMode", Mapping::none, " Invalid CommMode value ;", " Invalid CommMode value ;",
+     " CommMode value is read only ;"},
+    {"SetBaudRate", "Baud", Mapping::reverseBaud, " Invalid BaudRate value ;", " Invalid BaudRate value ;",
+     " BaudRate value is read only ;"},
+    {"SetNewLang", "NewLang", Mapping::none, " Invalid NewLang value ;", " Invalid NewLang value ;",
+     " NewLang value is read only ;"},
+    {"SetEventAveraging", nullptr, Mapping::none, " Invalid EventAveraging value ;",
+     " Invalid EventAveraging value ;", " EventAveraging value is read only ;"},
+    {"SetInsPrompt", "InsPrompt", Mapping::none, " Invalid InsPrompt value ;", " Invalid InsPrompt value ;",
+     " InsPrompt value is read only ;", true},
+    {"SetShowLastResult", "ShowLastResult", Mapping::swapOnOff, " Invalid ShowLastResult value ;",
+     " Invalid ShowLastResult value ;", " ShowLastResult value is read only ;"},
+    {"SetDaysAveraged", "DaysAveraged", Mapping::swapOnOff, " Invalid DaysAveraged value ;",
+     " Invalid DaysAveraged value ;", " DaysAveraged value is read only ;"},
+    {"SetDisplayClock", "ShowClock", Mapping::swapOnOff, " Invalid DisplayClock value ;",
+     " Invalid DisplayClock value ;", " DisplayClock value is read only ;"},
+    {"SetDaylight", "DayLight", Mapping::swapOnOff, " Invalid Daylight value ;", " Invalid Daylight value ;",
+     " Daylight value is read only ;"},
+    {"SetDaysBeginWeek", "WeekBegin", Mapping::none, " Invalid DaysBeginWeek value ;",
+     " Invalid DaysBeginWeek value ;", " DaysBeginWeek value is read only ;", true},
+    {"SetCholesterolUnits", "CholesUnit", Mapping::none, " Invalid CholesterolUnits value ;",
+     " Invalid CholesterolUnits value ;", " CholesterolUnits value is read only ;"},
+    {"SetInsulinPumpUse", "PumpUse", Mapping::swapOnOff, " Invalid InsulinPumpUse value ;",
+     " Invalid InsPumpUse value ;", " InsulinPumpUse value is read only ;"},
+};
+static_assert(std::size(kWriters) == eInsulinPumpUse + 1);
+
+constexpr std::int16_t kWritable = 2;
+// The language the type-7 meter cannot show, whatever its language table says.
+constexpr double kLanguageNotOnMorvex = 6;
+
+const OptionWriter& writerFor(MeterOptions_Enum option) {
+    if (option < 0 || option >= static_cast<int>(std::size(kWriters)))
+        raise(errc::subscript_out_of_range, "No writer for option " + std::to_string(option));
+    return kWriters[option];
+}
+
+std::string trimmed(const std::string& s) {
+    const auto first = s.find_first_not_of(' ');
+    if (first == std::string::npos) return {};
+    return s.substr(first, s.find_last_not_of(' ') - first + 1);
+}
+
+std::string mapped(Mapping mapping, const std::string& text) {
+    switch (mapping) {
+        case Mapping::none: return text;
+        case Mapping::swapOnOff: {
+            const double v = ToNumber(text);
+            return v == 1 ? "0" : v == 0 ? "1" : text;
+        }
+        case Mapping::reverseBaud:
+            if (text.size() == 1 && text[0] >= '0' && text[0] <= '3') return std::string(1, char('3' - text[0] + '0'));
+            return text;
+    }
+    return text;
+}
+
+}  // namespace
+
+const char* optionElement(MeterOptions_Enum option, std::int16_t meterType) {
+    if (option != eEvevtAveraging) return writerFor(option).element;
+    if (meterType == eCVPellis || meterType == eDunmark) return "EvtAvg";
+    if (meterType == eMorvex) return "EvtAvgDurn";
+    return "";
+}
+
+const char* optionWriterName(MeterOptions_Enum option) { return writerFor(option).member; }
+
+std::int16_t writeOption(MeterDll& session, MeterOptions_Enum option, XMLWrapper& deviceCfg, XMLWrapper& status,
+                         WriteOutcome& outcome) {
+    const OptionWriter& w = writerFor(option);
+    const auto noteFailure = [&](const IError& e) {
+        if (!w.notesFailure) return;
+        // Best effort: the error being raised matters more than this note.
+        try {
+            status.AddElement("ProcedureError", std::string(w.member) + " Line: " + std::to_string(e.ErrLine));
+        } catch (...) {
+        }
+    };
+    return guarded(
+        "MeterDll", w.member,
+        [&]() -> std::int16_t {
+            deviceCfg.MoveToRoot();
+            deviceCfg.MoveToChild("Settings");
+            const std::string element = optionElement(option, session.LastMeterType());
+            std::string text;
+            if (option == eLanguage)
+                text = deviceCfg.GetChildAttribute(element, "Val");
+            else if (!element.empty())
+                text = deviceCfg.GetChildValue(element);
+            text = trimmed(text);
+            // No value stays no value, whatever the mapping would make of it.
+            if (text.empty()) {
+                outcome.refuse(w.emptyValue + ErrorDescription(ME_FAIL) + ";");
+                return ME_FAIL;
+            }
+            text = mapped(w.mapping, text);
+            if (session.storedRecord().Setting.Availability[option] != kWritable) {
+                outcome.refuse(w.readOnly);
+                return ME_FAIL;
+            }
+            if (option == eLanguage && session.storedRecord().M_Type == eMorvex &&
+                ToNumber(text) == kLanguageNotOnMorvex) {
+                outcome.refuse(w.refused);
+                return ME_FAIL;
+            }
+            const std::int16_t value = roundToInt16(ToNumber(text));
+            // What the transport writes into this copy never reaches the session's record.
+            METER_REC copy = session.storedRecord();
+            const std::int16_t code = session.transport().vb_Set_Meter_Option(copy, option, value);
+            if (code == 0) {
+                outcome.bSuccess = true;
+                return 0;
+            }
+            outcome.refuse(w.refused + ErrorDescription(code) + ";");
+            return code;
+        },
+        noteFailure);
+}
+
+}  // namespace varnel::detail
