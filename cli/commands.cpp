@@ -1,0 +1,151 @@
+#include "commands.h"
+
+#include <cstdio>
+#include <memory>
+
+#include "csv.h"
+#include "documents.h"
+#include "output.h"
+#include "session.h"
+#include "varnel/records.h"
+#include "varnel/return_codes.h"
+
+namespace varnel::cli {
+
+namespace {
+
+// Options of the meter commands; one command runs per invocation, so they share one set.
+struct CommandLine {
+    MeterOptions meter;
+    std::string output;
+    bool csv = false;
+    bool clearAfter = false;
+    bool yes = false;
+};
+
+void addMeterOptions(CLI::App* cmd, MeterOptions& o) {
+    cmd->add_option("--port", o.port, "Serial port to search for the meter")->capture_default_str();
+    cmd->add_option("--transport", o.transport, "Transport library to load instead of the simulated one")
+        ->type_name("PATH");
+    auto* type = cmd->add_option("--sim-type", o.simType, "Attach the simulated meter of this type (1-8)")
+                     ->check(CLI::Range(1, 8));
+    cmd->add_option("--sim-profile", o.simProfile, "Attach the simulated meter described by a profile file")
+        ->type_name("FILE")
+        ->excludes(type);
+    cmd->add_option("--sim-save", o.simSave,
+                    "Afterwards, write the simulated meter as it is then to a profile file "
+                    "(attach it again with --sim-profile)")
+        ->type_name("FILE");
+    cmd->add_flag("-q,--quiet", o.quiet, "Show no progress");
+}
+
+CLI::Option* addOutputOption(CLI::App* cmd, std::string& output) {
+    return cmd->add_option("-o,--output", output, "Write to FILE instead of standard output")->type_name("FILE");
+}
+
+// Writes a command's result; a failure ends the run without touching the meter again.
+void emit(const std::string& path, const std::string& text) {
+    try {
+        writeOutput(path, text);
+    } catch (const OutputError& e) {
+        say(e.what());
+        throw RunEnd{exit_status::local_failure};
+    }
+}
+
+std::string xmlText(const XMLWrapper& doc) {
+    std::string text = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n" + doc.XML();
+    if (text.back() != '\n') text += '\n';
+    return text;
+}
+
+void readings(MeterSession& s, const CommandLine& cl) {
+    XMLWrapper datalog = emptyDocument(doc_kind::datalog);
+    XMLWrapper filter = emptyDocument(doc_kind::filter);
+    bool checked = false;
+    s.request("readings", [&](XMLWrapper& status) {
+        return s.wrapper().getReadings(s.record(), s.deviceInfo(), datalog, filter, status, checked);
+    });
+    emit(cl.output, cl.csv ? datalogToCsv(datalog.XML()) : xmlText(datalog));
+    // Only readings that are safely on disk may be erased from the meter.
+    if (!cl.clearAfter) return;
+    s.clearMeter();
+    if (!cl.meter.quiet)
+        say("readings saved to " + cl.output + "; meter " + sectionValue(s.deviceInfo(), "DeviceInfo", "SN") + " erased");
+}
+
+}  // namespace
+
+std::string exitStatusHelp() {
+    return "Exit status:\n"
+           "  0       success\n"
+           "  1-62    a request failed: its return code made positive (-13 exits with 13);\n"
+           "          'varnel codes' lists the codes, and each status description is printed\n"
+           "          on standard error as one line 'varnel: <text>'\n"
+           "  2       also a wrong command line, or 'clear' without --yes\n"
+           "  63      a request failed with a code outside -1..-62\n"
+           "  64      varnel itself failed: the simulated meter could not be set up, or the\n"
+           "          output could not be written (the meter is then not erased)\n"
+           "  70      the component failed unexpectedly (ComponentError: its number and\n"
+           "          routine trace are printed)\n";
+}
+
+void addCodesCommand(CLI::App& app, int& status) {
+    auto* codes = app.add_subcommand("codes", "List every return code with its text");
+    codes->callback([&status] {
+        for (int code = 0; code >= ME_INVALID_HANDLE; --code) {
+            const std::string text = returnCodeText(code);
+            if (code != ME_SUCCESS && text == "Unknown status" && code != ME_UNKNOWN && code != ME_CLOCK_ERROR)
+                continue;
+            std::printf("%4d  %s\n", code, text.c_str());
+        }
+        status = exit_status::success;
+    });
+}
+
+void addMeterCommands(CLI::App& app, int& status) {
+    auto cl = std::make_shared<CommandLine>();
+
+    auto* discover = app.add_subcommand("discover", "Find the meter on a port and print its device information");
+    addMeterOptions(discover, cl->meter);
+    addOutputOption(discover, cl->output);
+    discover->callback([cl, &status] {
+        status = MeterSession(cl->meter).run([&](MeterSession& s) { emit(cl->output, xmlText(s.deviceInfo())); });
+    });
+
+    auto* read = app.add_subcommand("readings", "Upload the meter's readings and print the datalog");
+    addMeterOptions(read, cl->meter);
+    auto* output = addOutputOption(read, cl->output);
+    read->add_flag("--csv", cl->csv, "Write one CSV line per entry instead of the XML datalog");
+    read->add_flag("--clear-after", cl->clearAfter,
+                   "Erase the meter once the readings are safely written to the -o file")
+        ->needs(output);
+    read->callback([cl, &status] {
+        if (cl->clearAfter && (isStandardOutput(cl->output) || !isReplaceableFile(cl->output))) {
+            say("--clear-after needs -o naming a regular file, so the readings are on disk before the meter is erased");
+            status = exit_status::usage;
+            return;
+        }
+        status = MeterSession(cl->meter).run([&](MeterSession& s) { readings(s, *cl); });
+    });
+
+    auto* clear = app.add_subcommand("clear", "Erase every reading stored in the meter");
+    addMeterOptions(clear, cl->meter);
+    clear->add_flag("--yes", cl->yes, "Really erase the meter");
+    clear->callback([cl, &status] {
+        if (!cl->yes) {
+            say("clear erases every reading stored in the meter; run 'varnel clear --yes' to erase, "
+                "or 'varnel readings -o FILE --clear-after' to save the readings first");
+            status = exit_status::usage;
+            return;
+        }
+        status = MeterSession(cl->meter).run([](MeterSession& s) {
+            s.clearMeter();
+            std::printf("Erased the readings of meter %s on port %s.\n",
+                        sectionValue(s.deviceInfo(), "DeviceInfo", "SN").c_str(),
+                        sectionValue(s.deviceInfo(), "PortInfo", "PortID").c_str());
+        });
+    });
+}
+
+}  // namespace varnel::cli

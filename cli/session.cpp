@@ -1,0 +1,145 @@
+#include "session.h"
+
+#include <cstdio>
+#include <exception>
+#include <utility>
+
+#include "documents.h"
+#include "output.h"
+#include "varnel/component_error.h"
+#include "varnel/return_codes.h"
+
+namespace varnel::cli {
+
+int statusForCode(std::int32_t code) {
+    if (code == 0) return exit_status::success;
+    return code < 0 && code > -exit_status::other_code ? -code : exit_status::other_code;
+}
+
+namespace {
+
+// What a ComponentError number means, for the one line a user reads.
+std::string unexpected(const ComponentError& e, const std::string& during = "") {
+    static const struct {
+        std::int32_t number;
+        const char* meaning;
+    } kMeanings[] = {
+        {errc::overflow, "a value does not fit its field"},
+        {errc::subscript_out_of_range, "an index outside its array or collection"},
+        {errc::missing_object, "a document element or meter model is missing"},
+        {errc::document_failure, "a document could not be read or written"},
+        {errc::transport_unavailable, "the transport library or one of its functions could not be loaded"},
+        {errc::internal, "an internal failure"},
+    };
+    std::string text = "unexpected error " + std::to_string(e.number());
+    for (const auto& m : kMeanings)
+        if (m.number == e.number()) text += std::string(" (") + m.meaning + ")";
+    return text + during + ", trace: " + e.description();
+}
+
+}  // namespace
+
+void say(const std::string& text) {
+    std::fprintf(stderr, "varnel: %s\n", text.c_str());
+    std::fflush(stderr);
+}
+
+MeterSession::MeterSession(MeterOptions options)
+    : options_(std::move(options)),
+      transportPath_(options_.transport.empty() ? DllWrapper::defaultTransportPath() : options_.transport),
+      progress_(stderr, Progress::styleFor(stderr, options_.quiet)) {}
+
+MeterSession::~MeterSession() = default;
+
+int MeterSession::run(const std::function<void(MeterSession&)>& work) {
+    int status = exit_status::success;
+    try {
+        attachSimulatedMeter();
+        wrapper_ = std::make_unique<DllWrapper>(transportPath_);
+        wrapper_->setOnProgress([this](std::int16_t& percent) { progress_.update(percent); });
+        discover();
+        work(*this);
+    } catch (const RunEnd& end) {
+        status = end.status;
+    } catch (const ComponentError& e) {
+        progress_.finish();
+        say(unexpected(e));
+        status = exit_status::component_error;
+    } catch (const std::exception& e) {
+        progress_.finish();
+        say(e.what());
+        status = exit_status::local_failure;
+    }
+    status = release(status);
+    return saveSimulatedMeter(status);
+}
+
+void MeterSession::request(const std::string& label,
+                           const std::function<std::int32_t(XMLWrapper& status)>& call) {
+    XMLWrapper status = emptyDocument(doc_kind::status);
+    progress_.start(label);
+    std::int32_t code = 0;
+    try {
+        code = call(status);
+    } catch (const ComponentError& e) {
+        progress_.finish();
+        for (const std::string& text : statusDescriptions(status)) say(text);
+        say(unexpected(e));
+        throw RunEnd{exit_status::component_error};
+    }
+    if (code == 0) return progress_.complete();
+    progress_.finish();
+    const auto texts = statusDescriptions(status);
+    for (const std::string& text : texts) say(text);
+    // A failure always says something, even when the component wrote no description.
+    if (texts.empty()) say(label + " failed: " + returnCodeText(code));
+    throw RunEnd{statusForCode(code)};
+}
+
+void MeterSession::clearMeter() {
+    request("clear", [this](XMLWrapper& status) { return wrapper_->clearMeter(record_, deviceInfo_, status); });
+}
+
+void MeterSession::attachSimulatedMeter() {
+    if (options_.simType == 0 && options_.simProfile.empty() && options_.simSave.empty()) return;
+    simulator_ = std::make_unique<SimulatorControls>(transportPath_);
+    if (options_.simType != 0) simulator_->selectType(options_.simType);
+    if (!options_.simProfile.empty()) simulator_->loadProfile(options_.simProfile);
+}
+
+void MeterSession::discover() {
+    XMLWrapper connection = connectionDocument(options_.port);
+    deviceInfo_ = emptyDocument(doc_kind::device_info);
+    request("discover", [&](XMLWrapper& status) {
+        return wrapper_->discoverDevice(record_, deviceInfo_, connection, status);
+    });
+    found_ = true;
+}
+
+int MeterSession::release(int status) {
+    // Nothing was found, so nothing is held; a failed request may have released it already,
+    // and releasing twice is harmless.
+    if (!found_) return status;
+    try {
+        const std::int32_t code = wrapper_->closeMeter(record_);
+        if (code == 0) return status;
+        say("the meter could not be released: " + returnCodeText(code));
+        return status == exit_status::success ? statusForCode(code) : status;
+    } catch (const ComponentError& e) {
+        say(unexpected(e, " releasing the meter"));
+        return status == exit_status::success ? exit_status::component_error : status;
+    }
+}
+
+int MeterSession::saveSimulatedMeter(int status) {
+    if (!simulator_ || options_.simSave.empty()) return status;
+    try {
+        simulator_->saveProfile(options_.simSave);
+        return status;
+    } catch (const SimulatorError& e) {
+        say(e.what());
+        return status == exit_status::success ? exit_status::local_failure : status;
+    }
+}
+
+}  // namespace varnel::cli

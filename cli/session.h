@@ -1,0 +1,94 @@
+// One meter as a client program drives it: discovery first, then the command's
+// requests, then the meter is released.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <string>
+
+#include "progress.h"
+#include "sim_control.h"
+#include "varnel/dll_wrapper.h"
+#include "varnel/records.h"
+#include "varnel/xml_wrapper.h"
+
+namespace varnel::cli {
+
+// Exit statuses besides 0 and the request codes made positive; `varnel --help` lists them.
+namespace exit_status {
+inline constexpr int success = 0;
+// A wrong command line, or a command that refuses to act as given (clear without --yes).
+inline constexpr int usage = 2;
+// A request code that does not fit the range of request statuses.
+inline constexpr int other_code = 63;
+// varnel itself could not do what was asked: the simulated meter, the output file.
+inline constexpr int local_failure = 64;
+// The component raised ComponentError (an unexpected failure).
+inline constexpr int component_error = 70;
+}  // namespace exit_status
+
+// The exit status for a failed request's return code: the code made positive.
+int statusForCode(std::int32_t code);
+
+// The options every meter command takes.
+struct MeterOptions {
+    int port = 1;
+    std::string transport;   // empty: the simulated transport shipped with Varnel
+    int simType = 0;         // 0: leave the simulated meter as the library starts it
+    std::string simProfile;
+    std::string simSave;
+    bool quiet = false;
+};
+
+// Prints "varnel: <text>" on standard error.
+void say(const std::string& text);
+
+// Ends a run early with an exit status; the reason was already printed.
+struct RunEnd {
+    int status;
+};
+
+class MeterSession {
+public:
+    explicit MeterSession(MeterOptions options);
+    ~MeterSession();
+    MeterSession(const MeterSession&) = delete;
+    MeterSession& operator=(const MeterSession&) = delete;
+
+    // Attaches the simulated meter asked for, discovers the meter, runs `work`
+    // and releases the meter; returns the exit status.
+    int run(const std::function<void(MeterSession&)>& work);
+
+    // Runs one request, showing its progress under `label`, with a fresh status
+    // document. A failure prints each description of the status document and
+    // throws RunEnd with the code made positive; a ComponentError prints its
+    // number and trace and throws RunEnd with exit_status::component_error.
+    void request(const std::string& label, const std::function<std::int32_t(XMLWrapper& status)>& call);
+
+    // Erases the meter found by discovery.
+    void clearMeter();
+
+    DllWrapper& wrapper() { return *wrapper_; }
+    METER_REC& record() { return record_; }
+    XMLWrapper& deviceInfo() { return deviceInfo_; }
+    const MeterOptions& options() const { return options_; }
+
+private:
+    void attachSimulatedMeter();
+    void discover();
+    // closeMeter at the end of a run; a failure to release turns a success into a failure.
+    int release(int status);
+    int saveSimulatedMeter(int status);
+
+    MeterOptions options_;
+    std::string transportPath_;
+    Progress progress_;
+    std::unique_ptr<SimulatorControls> simulator_;  // declared before wrapper_: outlives it
+    std::unique_ptr<DllWrapper> wrapper_;
+    METER_REC record_{};
+    XMLWrapper deviceInfo_;
+    bool found_ = false;
+};
+
+}  // namespace varnel::cli
