@@ -278,24 +278,44 @@ TEST_F(Session, ErrorsCarryTheRoutineTraceAndLeaveProcessingSet) {
     EXPECT_EQ(errPropagator().error().ErrorTrace, "MeterInit --> ");
 }
 
-// On the simulated meter: a meter that answers identification with 00.
-TEST(SessionOnSimulator, SerialNumberOf00IsRepairedDuringDiscovery) {
-    setThreadClock(std::make_shared<ManualClock>());
-    sim::reset();
-    SetContinueFlag(true);
-    sim::selectType(eDunmark);
-    sim::setIdentitySerial("00");
-    {
-        MeterDll session(test::simTransport());
-        METER_REC rec{};
-        session.setCOMPort_Pref(sim::meter().port);
-        EXPECT_EQ(session.findmeter(rec), 0);
-        EXPECT_EQ(session.LastMeterSerialNo(), sim::meter().serial);
-        EXPECT_EQ(sim::callCount("vb_Upload_Meter_Datalog"), 1);
+struct SessionOnSimulator : ::testing::Test {
+    std::unique_ptr<MeterDll> session;
+    METER_REC rec{};
+
+    void SetUp() override {
+        setThreadClock(std::make_shared<ManualClock>());
+        sim::reset();
+        SetContinueFlag(true);
+        sim::selectType(eDunmark);
+        session = std::make_unique<MeterDll>(test::simTransport());
+        session->setCOMPort_Pref(sim::meter().port);
     }
-    vx_set_yield_hook(nullptr, nullptr);
-    sim::reset();
-    setThreadClock(nullptr);
+    void TearDown() override {
+        session.reset();
+        vx_set_yield_hook(nullptr, nullptr);
+        sim::reset();
+        setThreadClock(nullptr);
+    }
+};
+
+TEST_F(SessionOnSimulator, SerialNumberOf00IsRepairedDuringDiscovery) {
+    sim::setIdentitySerial("00");
+    EXPECT_EQ(session->findmeter(rec), 0);
+    EXPECT_EQ(session->LastMeterSerialNo(), sim::meter().serial);
+    EXPECT_EQ(sim::callCount("vb_Upload_Meter_Datalog"), 1);
+}
+
+TEST_F(SessionOnSimulator, AnErrorOfATickDuringTheEraseReachesTheCaller) {
+    ASSERT_EQ(session->findmeter(rec), 0);
+    session->onProgress = [](std::int16_t&) { raise(errc::internal, "tick"); };
+    try {
+        session->clearMeter();
+        FAIL() << "no error";
+    } catch (const ComponentError& e) {
+        EXPECT_EQ(e.number(), errc::internal);
+        EXPECT_EQ(e.description(), "clearMeter --> ");
+    }
+    EXPECT_FALSE(frmTimer().tmrStatus().enabled());
 }
 
 }  // namespace

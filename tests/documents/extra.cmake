@@ -1,0 +1,2 @@
+# The readings tests load the simulated transport library by path and by default.
+add_dependencies(${target} vantrix32)
