@@ -10,6 +10,7 @@
 #include "component/err_propagator.h"
 #include "component/error_description.h"
 #include "component/request_frame.h"
+#include "documents/option_tables.h"
 #include "documents/settings_requests.h"
 #include "settings/clock_group.h"
 #include "util/helpers.h"
@@ -40,34 +41,44 @@ struct SettingsItem {
     MeterOptions_Enum option;  // for Write::option
 };
 
+constexpr SettingsItem item(const char* name, TypeSet acceptedFor, Write write) {
+    return {name, nullptr, acceptedFor, write, eStripCalCode};
+}
+
+constexpr SettingsItem option(MeterOptions_Enum o, TypeSet acceptedFor) {
+    // Type 7 calls its event averaging by another name; either sets the one item.
+    return {kOptionElements[o].element, o == eEvevtAveraging ? kEvtAvgDurnElement.element : nullptr, acceptedFor,
+            Write::option, o};
+}
+
 // The elements setDeviceSettings writes, in the order it writes them, with the
 // meter types that accept each.
 constexpr SettingsItem kItems[] = {
-    {"Clock", nullptr, kAllTypes, Write::clock, eStripCalCode},
-    {"CC", nullptr, types({1, 2, 3, 5, 7}), Write::option, eStripCalCode},
-    {"Beep", nullptr, types({1, 2, 3, 5, 7}), Write::option, eBeepStatus},
-    {"GlucUnit", nullptr, kAllTypes, Write::option, eUnits},
-    {"DevInit", nullptr, types({7}), Write::devInit, eStripCalCode},
-    {"Decimal", nullptr, types({1, 2, 5}), Write::option, eNumericSeparator},
-    {"DateFormat", nullptr, types({1, 2, 3, 5, 7}), Write::option, eDateFormat},
-    {"TimeFormat", nullptr, types({1, 2, 3, 5, 6, 7, 8}), Write::option, eTimeFormat},
-    {"Language", nullptr, types({1, 2, 3, 5, 7}), Write::option, eLanguage},
-    {"CommMode", nullptr, types({1, 5}), Write::option, eCommunicationMode},
-    {"Baud", nullptr, types({1, 5}), Write::option, eCommunicationRate},
-    {"NewLang", nullptr, types({1, 5}), Write::option, eTranslateNewLang},
-    {"EvtAvg", "EvtAvgDurn", types({2, 7}), Write::option, eEvevtAveraging},
-    {"InsPrompt", nullptr, types({2}), Write::option, eInsulinPrompt},
-    {"ShowLastResult", nullptr, types({3}), Write::option, eDisplayLastTest},
-    {"DaysAveraged", nullptr, types({3}), Write::option, eDayAverage},
-    {"ShowClock", nullptr, types({5}), Write::option, eDisplayClock},
-    {"DayLight", nullptr, types({5}), Write::option, eDaylightSavings},
-    {"WeekBegin", nullptr, types({7}), Write::option, eWeekStartDay},
-    {"CholesUnit", nullptr, types({7}), Write::option, eCholestrolUnits},
-    {"PumpUse", nullptr, types({7}), Write::option, eInsulinPumpUse},
-    {"Insulins", nullptr, types({7}), Write::insulins, eStripCalCode},
-    {"Pills", nullptr, types({7}), Write::pills, eStripCalCode},
-    {"Schedule", nullptr, types({7}), Write::schedule, eStripCalCode},
-    {"Targets", nullptr, types({7}), Write::targets, eStripCalCode},
+    item("Clock", kAllTypes, Write::clock),
+    option(eStripCalCode, types({1, 2, 3, 5, 7})),
+    option(eBeepStatus, types({1, 2, 3, 5, 7})),
+    option(eUnits, kAllTypes),
+    item("DevInit", types({7}), Write::devInit),
+    option(eNumericSeparator, types({1, 2, 5})),
+    option(eDateFormat, types({1, 2, 3, 5, 7})),
+    option(eTimeFormat, types({1, 2, 3, 5, 6, 7, 8})),
+    option(eLanguage, types({1, 2, 3, 5, 7})),
+    option(eCommunicationMode, types({1, 5})),
+    option(eCommunicationRate, types({1, 5})),
+    option(eTranslateNewLang, types({1, 5})),
+    option(eEvevtAveraging, types({2, 7})),
+    option(eInsulinPrompt, types({2})),
+    option(eDisplayLastTest, types({3})),
+    option(eDayAverage, types({3})),
+    option(eDisplayClock, types({5})),
+    option(eDaylightSavings, types({5})),
+    option(eWeekStartDay, types({7})),
+    option(eCholestrolUnits, types({7})),
+    option(eInsulinPumpUse, types({7})),
+    item("Insulins", types({7}), Write::insulins),
+    item("Pills", types({7}), Write::pills),
+    item("Schedule", types({7}), Write::schedule),
+    item("Targets", types({7}), Write::targets),
 };
 
 // Elements the client may send back as it read them, which are never written.

@@ -175,10 +175,10 @@ std::int16_t MeterDll::DevInitialised() {
     return DevInitialised_;
 }
 
-void MeterDll::setDevInitialised(std::int16_t value) {
+std::int16_t MeterDll::setDevInitialised(std::int16_t value) {
     DevInitialised_ = value;
     METER_REC copy = storedRecord();
-    transport_->SetInitializedFlag(copy, value);
+    return transport_->SetInitializedFlag(copy, value);
 }
 
 }  // namespace varnel::detail

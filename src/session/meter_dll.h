@@ -46,7 +46,8 @@ public:
 
     // The meter's initialised flag, read from or written to the meter.
     std::int16_t DevInitialised();
-    void setDevInitialised(std::int16_t value);
+    // The transport's code for the write.
+    std::int16_t setDevInitialised(std::int16_t value);
 
     // Values of the stored record.
     std::int16_t Calibration() const { return storedRecord().Plasma_cal_flag; }

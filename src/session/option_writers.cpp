@@ -4,23 +4,15 @@
 
 #include "component/err_propagator.h"
 #include "component/error_description.h"
+#include "documents/option_tables.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {
 
 namespace {
 
-// How the document's value becomes the meter's.
-enum class Mapping {
-    none,
-    swapOnOff,    // numeric 1 is written as 0 and 0 as 1; anything else as it is
-    reverseBaud,  // "0" "1" "2" "3" become "3" "2" "1" "0"; anything else as it is
-};
-
 struct OptionWriter {
     const char* member;
-    const char* element;  // null: chosen by meter type
-    Mapping mapping;
     // Messages: no value, the meter refused the write, the option is not writable.
     const char* emptyValue;
     const char* refused;
@@ -29,49 +21,42 @@ struct OptionWriter {
     bool notesFailure = false;
 };
 
-// One writer per option, indexed by MeterOptions_Enum. The messages' blanks and
+// One writer per option, indexed by MeterOptions_Enum; the element and the
+// value mapping are the option's document element's. The messages' blanks and
 // semicolons are what clients have always received; keep them as they are.
 constexpr OptionWriter kWriters[] = {
-    {"SetStripCalCode", "CC", Mapping::none, " Invalid StripCalCode value ;", " Invalid StripCalCode value ;",
+    {"SetStripCalCode", " Invalid StripCalCode value ;", " Invalid StripCalCode value ;",
      " StripCalCode value is read only;"},
-    {"SetBeeper", "Beep", Mapping::swapOnOff, " Invalid Beeper value ;", " Invalid Beeper value ;",
-     " Beeper value is read only; "},
-    {"SetGlucoseUnits", "GlucUnit", Mapping::none, " Invalid GlucoseUnit value ;", " Invalid GlucoseUnit value; ",
+    {"SetBeeper", " Invalid Beeper value ;", " Invalid Beeper value ;", " Beeper value is read only; "},
+    {"SetGlucoseUnits", " Invalid GlucoseUnit value ;", " Invalid GlucoseUnit value; ",
      " GlucoseUnit value is read only "},
-    {"SetPunctuation", "Decimal", Mapping::none, " Invalid Punctuation value ;", " Invalid Punctuation value ;",
+    {"SetPunctuation", " Invalid Punctuation value ;", " Invalid Punctuation value ;",
      " Punctuation value is read only ;"},
-    {"SetDateMode", "DateFormat", Mapping::none, " Invalid DateMode value ;", " Invalid DateMode value ;",
-     " DateMode value is read only ;"},
-    {"SetTimeMode", "TimeFormat", Mapping::none, " Invalid TimeMode value ;", " Invalid TimeMode value ;",
-     " TimeMode value is read only ;"},
-    {"SetLanguage", "Language", Mapping::none, " Invalid Language value ;", " Invalid Language value; ",
-     " Language value is read only; "},
-    {"SetCommMode", "CommMode", Mapping::none, " Invalid CommMode value ;", " Invalid CommMode value ;",
-     " CommMode value is read only ;"},
-    {"SetBaudRate", "Baud", Mapping::reverseBaud, " Invalid BaudRate value ;", " Invalid BaudRate value ;",
-     " BaudRate value is read only ;"},
-    {"SetNewLang", "NewLang", Mapping::none, " Invalid NewLang value ;", " Invalid NewLang value ;",
-     " NewLang value is read only ;"},
-    {"SetEventAveraging", nullptr, Mapping::none, " Invalid EventAveraging value ;",
-     " Invalid EventAveraging value ;", " EventAveraging value is read only ;"},
-    {"SetInsPrompt", "InsPrompt", Mapping::none, " Invalid InsPrompt value ;", " Invalid InsPrompt value ;",
-     " InsPrompt value is read only ;", true},
-    {"SetShowLastResult", "ShowLastResult", Mapping::swapOnOff, " Invalid ShowLastResult value ;",
-     " Invalid ShowLastResult value ;", " ShowLastResult value is read only ;"},
-    {"SetDaysAveraged", "DaysAveraged", Mapping::swapOnOff, " Invalid DaysAveraged value ;",
-     " Invalid DaysAveraged value ;", " DaysAveraged value is read only ;"},
-    {"SetDisplayClock", "ShowClock", Mapping::swapOnOff, " Invalid DisplayClock value ;",
-     " Invalid DisplayClock value ;", " DisplayClock value is read only ;"},
-    {"SetDaylight", "DayLight", Mapping::swapOnOff, " Invalid Daylight value ;", " Invalid Daylight value ;",
-     " Daylight value is read only ;"},
-    {"SetDaysBeginWeek", "WeekBegin", Mapping::none, " Invalid DaysBeginWeek value ;",
-     " Invalid DaysBeginWeek value ;", " DaysBeginWeek value is read only ;", true},
-    {"SetCholesterolUnits", "CholesUnit", Mapping::none, " Invalid CholesterolUnits value ;",
-     " Invalid CholesterolUnits value ;", " CholesterolUnits value is read only ;"},
-    {"SetInsulinPumpUse", "PumpUse", Mapping::swapOnOff, " Invalid InsulinPumpUse value ;",
-     " Invalid InsPumpUse value ;", " InsulinPumpUse value is read only ;"},
+    {"SetDateMode", " Invalid DateMode value ;", " Invalid DateMode value ;", " DateMode value is read only ;"},
+    {"SetTimeMode", " Invalid TimeMode value ;", " Invalid TimeMode value ;", " TimeMode value is read only ;"},
+    {"SetLanguage", " Invalid Language value ;", " Invalid Language value; ", " Language value is read only; "},
+    {"SetCommMode", " Invalid CommMode value ;", " Invalid CommMode value ;", " CommMode value is read only ;"},
+    {"SetBaudRate", " Invalid BaudRate value ;", " Invalid BaudRate value ;", " BaudRate value is read only ;"},
+    {"SetNewLang", " Invalid NewLang value ;", " Invalid NewLang value ;", " NewLang value is read only ;"},
+    {"SetEventAveraging", " Invalid EventAveraging value ;", " Invalid EventAveraging value ;",
+     " EventAveraging value is read only ;"},
+    {"SetInsPrompt", " Invalid InsPrompt value ;", " Invalid InsPrompt value ;", " InsPrompt value is read only ;",
+     true},
+    {"SetShowLastResult", " Invalid ShowLastResult value ;", " Invalid ShowLastResult value ;",
+     " ShowLastResult value is read only ;"},
+    {"SetDaysAveraged", " Invalid DaysAveraged value ;", " Invalid DaysAveraged value ;",
+     " DaysAveraged value is read only ;"},
+    {"SetDisplayClock", " Invalid DisplayClock value ;", " Invalid DisplayClock value ;",
+     " DisplayClock value is read only ;"},
+    {"SetDaylight", " Invalid Daylight value ;", " Invalid Daylight value ;", " Daylight value is read only ;"},
+    {"SetDaysBeginWeek", " Invalid DaysBeginWeek value ;", " Invalid DaysBeginWeek value ;",
+     " DaysBeginWeek value is read only ;", true},
+    {"SetCholesterolUnits", " Invalid CholesterolUnits value ;", " Invalid CholesterolUnits value ;",
+     " CholesterolUnits value is read only ;"},
+    {"SetInsulinPumpUse", " Invalid InsulinPumpUse value ;", " Invalid InsPumpUse value ;",
+     " InsulinPumpUse value is read only ;"},
 };
-static_assert(std::size(kWriters) == eInsulinPumpUse + 1);
+static_assert(std::size(kWriters) == kOptionElements.size());
 
 constexpr std::int16_t kWritable = 2;
 // The language the type-7 meter cannot show, whatever its language table says.
@@ -89,28 +74,33 @@ std::string trimmed(const std::string& s) {
     return s.substr(first, s.find_last_not_of(' ') - first + 1);
 }
 
-std::string mapped(Mapping mapping, const std::string& text) {
+// The document's text as the meter takes it: a document 1 of an inverted option
+// is written as 0 and 0 as 1, the baud codes "0"-"3" run the other way; any
+// other text goes as it is.
+std::string mapped(OptionMapping mapping, const std::string& text) {
     switch (mapping) {
-        case Mapping::none: return text;
-        case Mapping::swapOnOff: {
+        case OptionMapping::raw: return text;
+        case OptionMapping::inverted: {
             const double v = ToNumber(text);
             return v == 1 ? "0" : v == 0 ? "1" : text;
         }
-        case Mapping::reverseBaud:
+        case OptionMapping::reversed:
             if (text.size() == 1 && text[0] >= '0' && text[0] <= '3') return std::string(1, char('3' - text[0] + '0'));
             return text;
     }
     return text;
 }
 
-}  // namespace
-
-const char* optionElement(MeterOptions_Enum option, std::int16_t meterType) {
-    if (option != eEvevtAveraging) return writerFor(option).element;
-    if (meterType == eCVPellis || meterType == eDunmark) return "EvtAvg";
-    if (meterType == eMorvex) return "EvtAvgDurn";
-    return "";
+// The element the writer reads: event averaging is "EvtAvg" on types 2 and 3,
+// "EvtAvgDurn" on type 7 and nothing elsewhere.
+std::string elementFor(MeterOptions_Enum option, std::int16_t lastMeterType) {
+    if (option == eEvevtAveraging && lastMeterType != eCVPellis && lastMeterType != eDunmark &&
+        lastMeterType != eMorvex)
+        return {};
+    return optionElementRow(option, lastMeterType).element;
 }
+
+}  // namespace
 
 const char* optionWriterName(MeterOptions_Enum option) { return writerFor(option).member; }
 
@@ -130,7 +120,7 @@ std::int16_t writeOption(MeterDll& session, MeterOptions_Enum option, XMLWrapper
         [&]() -> std::int16_t {
             deviceCfg.MoveToRoot();
             deviceCfg.MoveToChild("Settings");
-            const std::string element = optionElement(option, session.LastMeterType());
+            const std::string element = elementFor(option, session.LastMeterType());
             std::string text;
             if (option == eLanguage)
                 text = deviceCfg.GetChildAttribute(element, "Val");
@@ -142,7 +132,7 @@ std::int16_t writeOption(MeterDll& session, MeterOptions_Enum option, XMLWrapper
                 outcome.refuse(w.emptyValue + ErrorDescription(ME_FAIL) + ";");
                 return ME_FAIL;
             }
-            text = mapped(w.mapping, text);
+            text = mapped(kOptionElements[option].mapping, text);
             if (session.storedRecord().Setting.Availability[option] != kWritable) {
                 outcome.refuse(w.readOnly);
                 return ME_FAIL;

@@ -26,11 +26,6 @@ struct WriteOutcome {
     }
 };
 
-// Element under "Settings" that carries the option for this meter type; the
-// language's value is its attribute "Val". Event averaging reads "EvtAvg" on
-// types 2 and 3, "EvtAvgDurn" on type 7 and nothing ("") elsewhere.
-const char* optionElement(MeterOptions_Enum option, std::int16_t meterType);
-
 // Name of the option's writer in the routine trace ("SetStripCalCode" ...).
 const char* optionWriterName(MeterOptions_Enum option);
 

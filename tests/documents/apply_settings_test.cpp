@@ -1,0 +1,286 @@
+#include <gtest/gtest.h>
+
+#include "support/wrapper_fixture.h"
+
+using namespace varnel;
+using namespace varnel::test;
+
+namespace {
+
+struct Report {
+    std::string major, minor, desc;
+    bool operator==(const Report&) const = default;
+};
+
+void PrintTo(const Report& r, std::ostream* os) { *os << "{" << r.major << ", " << r.minor << ", \"" << r.desc << "\"}"; }
+
+std::vector<Report> reports(const XMLWrapper& status) {
+    std::vector<Report> out;
+    const auto tree = parsed(status);
+    for (pugi::xml_node n : tree->document_element().children()) {
+        if (std::string(n.name()) == "ErrCode") out.push_back({n.child_value("Major"), n.child_value("Minor"), ""});
+        if (std::string(n.name()) == "ErrDesc" && !out.empty()) out.back().desc = n.child_value();
+    }
+    return out;
+}
+
+struct ApplySettings : WrapperTest {
+    static XMLWrapper configFor(const std::string& sn, const std::string& type, const std::string& settings,
+                                const std::string& root = "DeviceSettings") {
+        XMLWrapper doc;
+        EXPECT_TRUE(doc.LoadXML("<" + root + "><DeviceInfo><SN>" + sn + "</SN><TypeID>" + type +
+                                "</TypeID></DeviceInfo><Settings>" + settings + "</Settings></" + root + ">"));
+        return doc;
+    }
+    // A configuration document for the discovered meter.
+    static XMLWrapper config(const std::string& settings) {
+        return configFor(sim::meter().serial, std::to_string(sim::meter().type), settings);
+    }
+    std::int32_t apply(XMLWrapper cfg, XMLWrapper info) {
+        fresh();
+        return wrapper->setDeviceSettings(rec, info, cfg, status);
+    }
+    std::int32_t apply(XMLWrapper cfg) { return apply(std::move(cfg), device); }
+    std::int32_t apply(const std::string& settings) { return apply(config(settings)); }
+    // The one report a request writes.
+    Report report() const {
+        const auto all = reports(status);
+        EXPECT_EQ(all.size(), 1u);
+        return all.empty() ? Report{} : all.back();
+    }
+    static Report summary(const std::string& code, const std::string& desc) { return {code, code, desc}; }
+    static std::int16_t option(MeterOptions_Enum o) { return sim::meter().options[o].value; }
+    static std::string clockVal(const std::string& d, const std::string& mm, const std::string& y,
+                                const std::string& h, const std::string& m, const std::string& s) {
+        return "<Clock><Val D=\"" + d + "\" MM=\"" + mm + "\" Y=\"" + y + "\" h=\"" + h + "\" m=\"" + m +
+               "\" s=\"" + s + "\"/></Clock>";
+    }
+};
+
+TEST_F(ApplySettings, OptionWritersMapValuesAndGatherEveryRefusalInOrder) {
+    discover(eCVTolvoMeter);
+    ASSERT_EQ(apply("<CC> 2 </CC><Beep>1</Beep><Decimal>  </Decimal><DateFormat>abc</DateFormat>"
+                    "<Language Val=\"3\"/><Baud>0</Baud><CommMode>9</CommMode><ShowClock>0</ShowClock>"
+                    "<DayLight>abc</DayLight>"),
+              ME_SUCCESS);
+    EXPECT_EQ(report(), summary("-31", "Partial success; Invalid Punctuation value ;Operation failed;"
+                                       " Invalid CommMode value ;Bad parameter passed to the function;"
+                                       " BaudRate value is read only ;"));
+    EXPECT_EQ(option(eStripCalCode), 2);
+    EXPECT_EQ(option(eBeepStatus), 0);
+    EXPECT_EQ(option(eDateFormat), 0);
+    EXPECT_EQ(option(eLanguage), 3);
+    EXPECT_EQ(option(eDisplayClock), 1);
+    EXPECT_EQ(option(eDaylightSavings), 1);
+    EXPECT_EQ(progress, (std::vector<int>{11, 22, 33, 44, 55, 66, 77, 88, 99}));
+    EXPECT_EQ(completions, 1);
+
+    discover(eCVTarnConsumerMeter);
+    for (auto [text, raw] : {std::pair{"0", 3}, {"3", 0}, {"2", 1}, {"00", 0}}) {
+        ASSERT_EQ(apply(std::string("<Baud>") + text + "</Baud>"), ME_SUCCESS);
+        EXPECT_EQ(option(eCommunicationRate), raw) << text;
+    }
+    ASSERT_EQ(apply("<Beep>2</Beep>"), ME_SUCCESS);
+    EXPECT_EQ(report(), summary("-17", "Operation failed; Invalid Beeper value ;Bad parameter passed to the function;"));
+}
+
+TEST_F(ApplySettings, LanguageAndEventAveragingFollowTheMeterType) {
+    discover(eMorvex);
+    const int before = sim::callCount("vb_Set_Meter_Option");
+    ASSERT_EQ(apply("<Language Val=\"6\"/><EvtAvg>2</EvtAvg>"), ME_SUCCESS);
+    EXPECT_EQ(report(), summary("-17", "Operation failed; Invalid Language value;  Invalid EventAveraging value ;"
+                                       "Operation failed;"));
+    EXPECT_EQ(sim::callCount("vb_Set_Meter_Option"), before);
+    ASSERT_EQ(apply("<EvtAvgDurn>3</EvtAvgDurn>"), ME_SUCCESS);
+    EXPECT_EQ(option(eEvevtAveraging), 3);
+
+    discover(eCVPellis);
+    ASSERT_EQ(apply("<Language Val=\"6\"/><EvtAvg>0</EvtAvg>"), ME_SUCCESS);
+    EXPECT_EQ(report(), summary("0", "Operation completed successfully"));
+    EXPECT_EQ(option(eLanguage), 6);
+    EXPECT_EQ(option(eEvevtAveraging), 0);
+}
+
+TEST_F(ApplySettings, AWriterThatFailsUnexpectedlyLeavesItsNameAndTheTrace) {
+    discover(eCVPellis);
+    EXPECT_THROW(apply("<InsPrompt>40000</InsPrompt>"), ComponentError);
+    auto doc = parsed(status);
+    EXPECT_STREQ(doc->document_element().child_value("ProcedureError"), "SetInsPrompt Line: 0");
+    EXPECT_EQ(reports(status).back().minor, "-16");
+    EXPECT_NE(reports(status).back().desc.find("Error number = 6 "), std::string::npos) << reports(status).back().desc;
+
+    discover(eCVPellis);
+    try {
+        apply("<Beep>40000</Beep>");
+        ADD_FAILURE() << "no error";
+    } catch (const ComponentError& e) {
+        EXPECT_EQ(e.description().rfind("getDeviceSettings --> SetBeeper --> ", 0), 0u) << e.description();
+    }
+    EXPECT_FALSE(parsed(status)->document_element().child("ProcedureError"));
+    EXPECT_EQ(completions, 1);
+}
+
+TEST_F(ApplySettings, ChecksStopTheRequestBeforeAnyWrite) {
+    discover(eMorvex);
+    const std::string sn = sim::meter().serial, port = std::to_string(sim::meter().port);
+    const std::string beep = "<Beep>0</Beep>";
+    const std::string bad = "Bad parameter passed to the function ; ";
+    const std::string diff = "Different device detected ; ";
+    struct Case {
+        XMLWrapper cfg, info;
+        Report expected;
+    };
+    Case cases[] = {
+        {configFor(sn, "7", beep, "Other"), device, {"-17", "-33", "Invalid XML ;"}},
+        {configFor(sn, "7", "</Settings><DeviceInfo/><Settings>"), device,
+         {"-17", "-33", "Invalid XML ;DeviceInfo missing in Device settings"}},
+        {configFor(sn, "9", beep), device, {"-17", "-19", bad + "Device Type from Device Info XML is invalid"}},
+        {configFor("", "7", beep), device, {"-17", "-19", bad + "Device SN from Device settings XML is invalid"}},
+        {config(beep), deviceDoc(port, "", "7"), {"-17", "-19", bad + "Device SN from Device Info XML is invalid"}},
+        {config(beep), deviceDoc("-1", sn, "7"), {"-3", "-19", bad + "Port number from XML is invalid"}},
+        {configFor("X1", "7", beep), device,
+         {"-8", "-8", diff + "Device SN from Device settings XML - X1 Device SN from device - " + sn + " do not match"}},
+        {configFor(sn, "5", beep), device,
+         {"-8", "-8", diff + "Device Type from Device settings XML - 5 Device Type from device - 7 do not match"}},
+        {config(beep), deviceDoc(port, sn, "2"),
+         {"-8", "-8", diff + "Device Type from Device Info XML - 2 Device Type from device - 7 do not match"}},
+        {config(beep), deviceDoc(port, "X2", "7"),
+         {"-8", "-8", diff + "Device SN from Device Info XML - X2 Device SN from device - " + sn + " do not match"}},
+        {config(beep + "</Settings><Settings>"), device,
+         {"-17", "-33", "Invalid XML ;Settings missing in Device settings"}},
+        {config(""), device, {"-17", "-33", "Invalid XML"}},
+    };
+    for (Case& c : cases) {
+        const int before = sim::callCount("vb_Set_Meter_Option");
+        EXPECT_EQ(apply(c.cfg, c.info), ME_FAIL) << c.expected.desc;
+        EXPECT_EQ(report(), c.expected);
+        EXPECT_EQ(completions, 1);
+        EXPECT_EQ(sim::callCount("vb_Set_Meter_Option"), before);
+    }
+    // Serial numbers match without regard to case, type texts by value.
+    std::string lower = sn;
+    for (char& ch : lower) ch = static_cast<char>(std::tolower(ch));
+    sim::setSerial(lower);
+    EXPECT_EQ(apply(configFor(sn, "7.0", beep)), ME_SUCCESS);
+    EXPECT_EQ(report().major, "0");
+}
+
+TEST_F(ApplySettings, UnacceptedElementsAreRefusedByNameAndProgressCountsTheRest) {
+    discover(eQuillaandBremo);
+    ASSERT_EQ(apply(clockVal("6", "5", "2010", "7", "8", "") +
+                    "<GlucUnit>1</GlucUnit><TimeFormat>1</TimeFormat><GlucRange/><Foo/>"),
+              ME_SUCCESS);
+    EXPECT_EQ(report(), summary("-31", "Partial success;TimeFormat is not supported;GlucRange value is read only;"
+                                       "Foo is not supported; GlucoseUnit value is read only "));
+    EXPECT_EQ(sim::meter().clock, sim::secondsOf(2010, 5, 6, 7, 8, 0));
+    EXPECT_EQ(progress, (std::vector<int>{50, 100}));
+}
+
+TEST_F(ApplySettings, ClockIsCheckedAndKeptWithinTheMeterTypesYears) {
+    discover(eMorvex);
+    const std::int32_t before = sim::meter().clock;
+    const std::string invalid = "Operation failed;Invalid DeviceClock value ; ";
+    const std::string year = "Operation failed;Invalid DeviceClock year value ; ";
+    struct Case {
+        std::string clock, refusal;
+    } refused[] = {
+        {clockVal("6", "5", "2010", "24", "0", "0"), invalid}, {clockVal("6", "5", "2010", "7.5", "0", ""), invalid},
+        {clockVal("30", "02", "2010", "7", "0", ""), invalid}, {clockVal("6", "5", "2010", "7", "x", ""), invalid},
+        {clockVal("6", "5", "2010", "7", "0", "60"), invalid}, {clockVal("6", "5", "2021", "7", "0", ""), year},
+        {clockVal("31", "12", "1999", "23", "59", "59"), year},
+    };
+    for (const Case& c : refused) {
+        ASSERT_EQ(apply(c.clock), ME_SUCCESS);
+        EXPECT_EQ(report(), summary("-17", c.refusal)) << c.clock;
+        EXPECT_EQ(sim::meter().clock, before);
+    }
+    ASSERT_EQ(apply(clockVal("31", "12", "2020", "23", "59", "59")), ME_SUCCESS);
+    EXPECT_EQ(sim::meter().clock, sim::secondsOf(2020, 12, 31, 23, 59, 59));
+
+    discover(eCVTolvoMeter);
+    ASSERT_EQ(apply(clockVal(" 1", "01", "2021 ", "0", "0", "")), ME_SUCCESS);
+    EXPECT_EQ(report().major, "0");
+    EXPECT_EQ(sim::meter().clock, sim::secondsOf(2021, 1, 1));
+}
+
+TEST_F(ApplySettings, DevInitTakesOnlyZeroOrOneAndReportsTheMetersRefusal) {
+    discover(eMorvex);
+    ASSERT_EQ(apply("<DevInit> 0 </DevInit>"), ME_SUCCESS);
+    EXPECT_EQ(sim::meter().initializedFlag, 0);
+    for (const char* v : {"2", ""}) {
+        ASSERT_EQ(apply(std::string("<DevInit>") + v + "</DevInit>"), ME_SUCCESS);
+        EXPECT_EQ(report(), summary("-17", "Operation failed;Invalid DevInit value ; "));
+    }
+    sim::injectFault("SetInitializedFlag", 1, ME_TIME_OUT, false);
+    ASSERT_EQ(apply("<DevInit>1</DevInit>"), ME_SUCCESS);
+    EXPECT_EQ(report(), summary("-17", "Operation failed;Invalid DevInit value ; Timeout error;"));
+    EXPECT_EQ(sim::meter().initializedFlag, 0);
+}
+
+TEST_F(ApplySettings, MedicationFavouritesMustNameFixedOrNewlyNamedEntries) {
+    discover(eMorvex);
+    const sim::MeterProfile before = sim::meter();
+    ASSERT_EQ(apply("<Insulins><Custom><Insulin Txt=\" Rapid \">12</Insulin><Insulin Txt=\"X\">25</Insulin></Custom>"
+                    "<Favorite><Insulin>12</Insulin><Insulin>13</Insulin><Insulin>0</Insulin><Insulin> </Insulin>"
+                    "<Insulin>3</Insulin><Insulin>5</Insulin><Insulin>7</Insulin></Favorite></Insulins>"
+                    "<Pills><Custom><Pill Txt=\"Metf\">7</Pill></Custom>"
+                    "<Favorite><Pill>8</Pill><Pill>7</Pill><Pill>2</Pill></Favorite></Pills>"),
+              ME_SUCCESS);
+    EXPECT_EQ(report(), summary("-31", "Partial success;Invalid CustomInsulin at index 25 ;"
+                                       "Invalid FavoriteInsulin at index 13  ;Invalid FavoriteInsulin at index 0 ;"
+                                       "Too many FavoriteInsulin at index 7 ;Invalid FavoriteInsulin at index 8 ;"));
+    const sim::MeterProfile after = sim::meter();
+    EXPECT_EQ(after.insulinNames[11].bytes, "Rapid");
+    EXPECT_EQ(after.insulinNames[12], before.insulinNames[12]);
+    EXPECT_EQ(after.favoriteInsulins, (std::array<std::int16_t, 3>{12, 3, 5}));
+    EXPECT_EQ(after.oralMedNames[6].bytes, "Metf");
+    EXPECT_EQ(after.favoriteOralMeds, (std::array<std::int16_t, 5>{7, 2, 0, 0, 0}));
+
+    // A fourteenth named entry has no place in the request's list.
+    std::string custom;
+    for (int p : {11, 12, 13, 14, 15, 16, 17, 18, 19, 20, 21, 11, 12, 13})
+        custom += "<Insulin Txt=\"N\">" + std::to_string(p) + "</Insulin>";
+    EXPECT_THROW(apply("<Insulins><Custom>" + custom + "</Custom><Favorite/></Insulins>"), ComponentError);
+    EXPECT_EQ(reports(status).back().minor, "-16");
+}
+
+TEST_F(ApplySettings, ScheduleAndTargetsKeepWhatTheDocumentDoesNotValidlyChange) {
+    discover(eMorvex);
+    ASSERT_EQ(apply("<Schedule Custom=\" TRUE \"><PreB h=\"6\" m=\"30\"/><PostB h=\"-1\" m=\"0\"/>"
+                    "<PreL h=\"25\" m=\"0\"/><PostL h=\"13\" m=\"45\"/><PreD h=\"18\" m=\"0\"/>"
+                    "<PostD h=\"20\" m=\"0\"/><Night h=\"22\" m=\"14\"/></Schedule>"
+                    "<Targets><PreMealLow>75</PreMealLow><PreMealHigh>140</PreMealHigh><PostMealLow>85</PostMealLow>"
+                    "<PostMealHigh>170</PostMealHigh><Hypo>0</Hypo></Targets>"),
+              ME_SUCCESS);
+    EXPECT_EQ(report(), summary("-31", "Partial success;Invalid Schedule PreL value ; Invalid Targets Hypo value ; "));
+    sim::MeterProfile meter = sim::meter();
+    EXPECT_EQ(meter.scheduleSelection, 1);
+    EXPECT_EQ(meter.mealSegments, (std::array<std::int16_t, 7>{26, 36, 46, 55, 72, 80, 88}));
+    EXPECT_EQ(meter.targets, (sim::TargetLimits{75, 140, 85, 170, 60}));
+
+    // With the fixed schedule no segment is needed; a selection that is neither keeps the meter's.
+    ASSERT_EQ(apply("<Schedule Custom=\"false\"/>"), ME_SUCCESS);
+    EXPECT_EQ(sim::meter().scheduleSelection, 0);
+    ASSERT_EQ(apply("<Schedule Custom=\"maybe\"/>"), ME_SUCCESS);
+    EXPECT_EQ(report(), summary("-31", "Partial success;Schedule type invalid ; "));
+    EXPECT_EQ(sim::meter().scheduleSelection, 0);
+}
+
+TEST_F(ApplySettings, AMissingElementEndsTheRequestAfterTheEarlierWrites) {
+    discover(eMorvex);
+    const std::int16_t beep = option(eBeepStatus);
+    ASSERT_EQ(apply(clockVal("6", "5", "2010", "7", "8", "") + clockVal("6", "5", "2011", "7", "8", "") +
+                    "<Beep>0</Beep>"),
+              ME_FAIL);
+    EXPECT_EQ(report(), (Report{"-17", "-33", "Invalid XML ;Clock missing in Device settings"}));
+    EXPECT_EQ(option(eBeepStatus), beep);
+
+    ASSERT_EQ(apply("<Beep>0</Beep><CC>abc</CC><Insulins><Custom/></Insulins><Targets/>"), ME_FAIL);
+    EXPECT_EQ(report(), (Report{"-17", "-33",
+                                "Invalid XML ;Favorite missing in Device settings; Invalid StripCalCode value ;"
+                                "Bad parameter passed to the function;"}));
+    EXPECT_EQ(option(eBeepStatus), 1);
+    EXPECT_EQ(completions, 1);
+}
+
+}  // namespace
