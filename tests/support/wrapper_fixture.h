@@ -1,79 +1,45 @@
-// A DllWrapper over the statically linked simulator on a virtual clock, with
-// the documents a client passes in and readers for what the requests wrote.
+// A DllWrapper over the statically linked simulator on a virtual clock, the
+// documents a client passes in, and readers for what the requests wrote.
 #pragma once
 
 #include <gtest/gtest.h>
 
 #include <pugixml.hpp>
 
-#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
 
+#include "component/err_propagator.h"
+#include "platform/message_pump.h"
 #include "simulator.h"
 #include "support/sim_transport.h"
 #include "util/helpers.h"
 #include "varnel/clock.h"
 #include "varnel/dll_wrapper.h"
-#include "varnel/vantrix32.h"
 #include "varnel/xml_wrapper.h"
 
 namespace varnel::test {
 
-// One ErrCode/ErrDesc group of a status document.
-struct StatusGroup {
-    std::string major, minor, desc, trace;  // trace: the VBTrace text, or "none"
-    bool operator==(const StatusGroup&) const = default;
-};
-
-inline void PrintTo(const StatusGroup& g, std::ostream* os) {
-    *os << "{" << g.major << ", " << g.minor << ", \"" << g.desc << "\", " << g.trace << "}";
-}
-
-// The groups of a status document, in order.
-inline std::vector<StatusGroup> statusGroups(const XMLWrapper& status) {
+// The status document's groups, each as "Major/Minor/ErrDesc", with "/VBTrace" when present.
+inline std::vector<std::string> statusGroups(const XMLWrapper& status) {
     pugi::xml_document doc;
     doc.load_string(status.XML().c_str());
-    std::vector<StatusGroup> groups;
+    std::vector<std::string> groups;
     for (pugi::xml_node n : doc.document_element().children()) {
         const std::string name = n.name();
         if (name == "ErrCode")
-            groups.push_back({n.child_value("Major"), n.child_value("Minor"), "", "none"});
-        else if (name == "ErrDesc" && !groups.empty())
-            groups.back().desc = n.child_value();
-        else if (name == "VBTrace" && !groups.empty())
-            groups.back().trace = n.child_value();
+            groups.push_back(std::string(n.child_value("Major")) + "/" + n.child_value("Minor"));
+        else if (!groups.empty() && (name == "ErrDesc" || name == "VBTrace"))
+            groups.back() += "/" + std::string(n.child_value());
     }
     return groups;
 }
 
-// A document as a pugixml tree, for reading back what a request wrote.
-inline std::unique_ptr<pugi::xml_document> parsed(const XMLWrapper& doc) {
-    auto tree = std::make_unique<pugi::xml_document>();
+inline std::shared_ptr<pugi::xml_document> parsed(const XMLWrapper& doc) {
+    auto tree = std::make_shared<pugi::xml_document>();
     tree->load_string(doc.XML().c_str());
     return tree;
-}
-
-inline XMLWrapper connectionDoc(const std::string& ports, const std::string& kind = "COM") {
-    XMLWrapper doc;
-    doc.InitDocument(doc_kind::connection_info);
-    doc.SelectElement("Ports");
-    doc.AddElement(kind);
-    doc.AddChildElement("PortsToSearch", "", ports);
-    return doc;
-}
-
-inline XMLWrapper deviceDoc(const std::string& port, const std::string& sn, const std::string& type) {
-    XMLWrapper doc;
-    doc.InitDocument(doc_kind::device_info);
-    doc.SelectElement("DeviceInfo");
-    doc.AddElement("SN", sn);
-    doc.AddElement("TypeID", type);
-    doc.SelectElement("PortInfo");
-    doc.AddElement("PortID", port);
-    doc.MoveToRoot();
-    return doc;
 }
 
 inline XMLWrapper newDoc(std::int32_t kind) {
@@ -82,14 +48,46 @@ inline XMLWrapper newDoc(std::int32_t kind) {
     return doc;
 }
 
+inline XMLWrapper connectionDoc(const std::string& ports, const std::string& kind = "COM") {
+    XMLWrapper doc = newDoc(doc_kind::connection_info);
+    doc.SelectElement("Ports");
+    doc.AddElement(kind);
+    doc.AddChildElement("PortsToSearch", "", ports);
+    return doc;
+}
+
+inline XMLWrapper deviceDoc(const std::string& port, const std::string& sn, const std::string& type) {
+    XMLWrapper doc = newDoc(doc_kind::device_info);
+    doc.SelectElement("DeviceInfo");
+    doc.AddElement("SN", sn);
+    doc.AddElement("TypeID", type);
+    doc.SelectElement("PortInfo");
+    doc.AddElement("PortID", port);
+    return doc;
+}
+
+// Runs a request (or a routine, with the trace started afresh) that must
+// fail unexpectedly; the error's number and trace.
+template <class F>
+std::string unexpectedTrace(F&& request) {
+    detail::errPropagator().reset();
+    try {
+        request();
+    } catch (const ComponentError& e) {
+        return std::to_string(e.number()) + " " + e.description();
+    }
+    return "no error";
+}
+
 struct WrapperTest : ::testing::Test {
     std::shared_ptr<ManualClock> clock = std::make_shared<ManualClock>(1000);
     std::unique_ptr<DllWrapper> wrapper;
     METER_REC rec{};
     XMLWrapper status = newDoc(doc_kind::status);
-    XMLWrapper device = newDoc(doc_kind::device_info);
+    XMLWrapper device;
     std::vector<int> progress;
     int completions = 0;
+    int closedBefore = 0;
 
     void SetUp() override {
         setThreadClock(clock);
@@ -105,21 +103,22 @@ struct WrapperTest : ::testing::Test {
         sim::reset();
         setThreadClock(nullptr);
     }
-
     // Attaches the default meter of a type and discovers it on its port.
     void discover(int type) {
         sim::selectType(type);
-        discoverLoaded();
-    }
-    void discoverLoaded() {
         device = newDoc(doc_kind::device_info);
         XMLWrapper conn = connectionDoc(std::to_string(sim::meter().port));
         ASSERT_EQ(wrapper->discoverDevice(rec, device, conn, status), ME_SUCCESS);
+        fresh();
+    }
+    // A new status document, and counting of events and closes from now on.
+    void fresh() {
         status = newDoc(doc_kind::status);
         progress.clear();
         completions = 0;
+        closedBefore = sim::callCount("close_meter");
     }
-    int closes() const { return sim::callCount("close_meter"); }
+    bool closed() const { return sim::callCount("close_meter") > closedBefore; }
 };
 
 }  // namespace varnel::test
