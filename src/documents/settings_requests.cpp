@@ -19,11 +19,6 @@ std::int32_t notAvailable(DllWrapper::Impl& owner, const char* traceName, METER_
 
 }  // namespace
 
-std::int32_t getDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper&, XMLWrapper&, bool,
-                               XMLWrapper& status, bool&) {
-    return notAvailable(owner, "getDeviceSettings", udtMeterRec, status);
-}
-
 std::int32_t getDeviceCaps(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper&, XMLWrapper&, bool,
                            XMLWrapper& status, bool&) {
     return notAvailable(owner, "getDeviceCaps", udtMeterRec, status);
