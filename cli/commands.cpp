@@ -12,17 +12,6 @@
 
 namespace varnel::cli {
 
-namespace {
-
-// Options of the meter commands; one command runs per invocation, so they share one set.
-struct CommandLine {
-    MeterOptions meter;
-    std::string output;
-    bool csv = false;
-    bool clearAfter = false;
-    bool yes = false;
-};
-
 void addMeterOptions(CLI::App* cmd, MeterOptions& o) {
     cmd->add_option("--port", o.port, "Serial port to search for the meter")->capture_default_str();
     cmd->add_option("--transport", o.transport, "Transport library to load instead of the simulated one")
@@ -43,7 +32,6 @@ CLI::Option* addOutputOption(CLI::App* cmd, std::string& output) {
     return cmd->add_option("-o,--output", output, "Write to FILE instead of standard output")->type_name("FILE");
 }
 
-// Writes a command's result; a failure ends the run without touching the meter again.
 void emit(const std::string& path, const std::string& text) {
     try {
         writeOutput(path, text);
@@ -58,6 +46,17 @@ std::string xmlText(const XMLWrapper& doc) {
     if (text.back() != '\n') text += '\n';
     return text;
 }
+
+namespace {
+
+// Options of the meter commands; one command runs per invocation, so they share one set.
+struct CommandLine {
+    MeterOptions meter;
+    std::string output;
+    bool csv = false;
+    bool clearAfter = false;
+    bool yes = false;
+};
 
 void readings(MeterSession& s, const CommandLine& cl) {
     XMLWrapper datalog = emptyDocument(doc_kind::datalog);

@@ -6,7 +6,18 @@
 
 #include <string>
 
+#include "session.h"
+#include "varnel/xml_wrapper.h"
+
 namespace varnel::cli {
+
+// The options every meter command takes.
+void addMeterOptions(CLI::App* cmd, MeterOptions& o);
+CLI::Option* addOutputOption(CLI::App* cmd, std::string& output);
+// Writes a command's result; a failure ends the run without touching the meter again.
+void emit(const std::string& path, const std::string& text);
+// A document as the text of an XML file.
+std::string xmlText(const XMLWrapper& doc);
 
 // What `varnel --help` says about exit statuses.
 std::string exitStatusHelp();
