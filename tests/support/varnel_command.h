@@ -1,0 +1,100 @@
+// The varnel command run as a user runs it, as a process, on a small simulated meter.
+#pragma once
+
+#include <gtest/gtest.h>
+#include <pugixml.hpp>
+#include <fcntl.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+#include <string>
+#include <vector>
+
+extern char** environ;
+
+namespace varnel::test {
+
+namespace fs = std::filesystem;
+
+struct Outcome {
+    int status = -1;
+    std::string out, err;
+};
+
+inline std::string slurp(const fs::path& p) {
+    std::ifstream in(p, std::ios::binary);
+    return {std::istreambuf_iterator<char>(in), {}};
+}
+
+inline std::vector<std::string> lines(const std::string& text) {
+    std::vector<std::string> result;
+    std::istringstream in(text);
+    for (std::string line; std::getline(in, line);) result.push_back(line);
+    return result;
+}
+
+class VarnelCommand : public ::testing::Test {
+protected:
+    fs::path dir;
+    fs::path meter;  // a type-7 meter with a short log, so each run stays quick
+    static constexpr int kRecords = 12;
+
+    void SetUp() override {
+        char tmpl[] = "/tmp/varnel-cli-XXXXXX";
+        ASSERT_NE(::mkdtemp(tmpl), nullptr);
+        dir = tmpl;
+        meter = dir / "meter.xml";
+        pugi::xml_document profile;
+        ASSERT_TRUE(profile.load_file(VARNEL_SOURCE_DIR "/sim/profiles/type7.xml"));
+        pugi::xml_node log = profile.child("meter").child("binaryDatalog");
+        int kept = 0;
+        for (pugi::xml_node r = log.first_child(); r;) {
+            pugi::xml_node next = r.next_sibling();
+            if (++kept > kRecords) log.remove_child(r);
+            r = next;
+        }
+        ASSERT_TRUE(profile.save_file(meter.c_str()));
+    }
+    void TearDown() override { fs::remove_all(dir); }
+
+    Outcome varnel(std::vector<std::string> args) const {
+        args.insert(args.begin(), VARNEL_CLI_PATH);
+        std::vector<char*> argv;
+        for (std::string& a : args) argv.push_back(a.data());
+        argv.push_back(nullptr);
+        const fs::path out = dir / "stdout", err = dir / "stderr";
+        posix_spawn_file_actions_t actions;
+        posix_spawn_file_actions_init(&actions);
+        posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
+        posix_spawn_file_actions_addopen(&actions, 1, out.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+        posix_spawn_file_actions_addopen(&actions, 2, err.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+        pid_t pid = 0;
+        Outcome run;
+        if (posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ) == 0) {
+            int wstatus = 0;
+            ::waitpid(pid, &wstatus, 0);
+            run.status = WIFEXITED(wstatus) ? WEXITSTATUS(wstatus) : 128 + WTERMSIG(wstatus);
+        }
+        posix_spawn_file_actions_destroy(&actions);
+        run.out = slurp(out);
+        run.err = slurp(err);
+        return run;
+    }
+
+    // A readings run on the test meter, its datalog parsed.
+    pugi::xml_node readings(pugi::xml_document& doc, std::vector<std::string> more = {}) const {
+        std::vector<std::string> args{"readings", "-q", "--sim-profile", meter.string()};
+        args.insert(args.end(), more.begin(), more.end());
+        const Outcome r = varnel(args);
+        EXPECT_EQ(r.status, 0) << r.err;
+        EXPECT_TRUE(doc.load_string(r.out.c_str())) << r.out;
+        return doc.child("Datalog");
+    }
+};
+
+}  // namespace varnel::test
