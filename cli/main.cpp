@@ -5,6 +5,7 @@
 
 #include "commands.h"
 #include "session.h"
+#include "settings_commands.h"
 
 int main(int argc, char** argv) {
     using namespace varnel::cli;
@@ -14,6 +15,7 @@ int main(int argc, char** argv) {
     int status = exit_status::success;
     addCodesCommand(app, status);
     addMeterCommands(app, status);
+    addSettingsCommands(app, status);
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError& e) {
