@@ -3,6 +3,7 @@
 
 #include <exception>
 
+#include "caps_command.h"
 #include "commands.h"
 #include "session.h"
 #include "settings_commands.h"
@@ -15,6 +16,7 @@ int main(int argc, char** argv) {
     int status = exit_status::success;
     addCodesCommand(app, status);
     addMeterCommands(app, status);
+    addCapsCommand(app, status);
     addSettingsCommands(app, status);
     try {
         app.parse(argc, argv);

@@ -184,13 +184,13 @@ bool settingNamed(const SettingRow& row, std::string_view name) {
 
 // Walks the children of the current element, flagging the names the type
 // has and noting the others.
-template <class Row, std::size_t N, class Has>
-void walkListing(XMLWrapper& caps, const Row (&rows)[N], std::array<bool, N>& flags, Wanted& w, Has has) {
+template <class Row, std::size_t N, class Accepts>
+void walkListing(XMLWrapper& caps, const Row (&rows)[N], std::array<bool, N>& flags, Wanted& w, Accepts accepts) {
     for (std::int32_t i = 0, n = caps.GetChildCount(); i < n; ++i) {
         const std::string name = caps.GetChildName(i);
         bool found = false;
         for (std::size_t r = 0; r < N && !found; ++r) {
-            if (has(rows[r], name)) {
+            if (accepts(rows[r], name)) {
                 flags[r] = found = true;
                 w.accepted = true;
                 ++w.count;
