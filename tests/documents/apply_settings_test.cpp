@@ -1,5 +1,7 @@
 #include <gtest/gtest.h>
 
+#include <sstream>
+
 #include "support/wrapper_fixture.h"
 
 using namespace varnel;
@@ -284,3 +286,42 @@ TEST_F(ApplySettings, AMissingElementEndsTheRequestAfterTheEarlierWrites) {
 }
 
 }  // namespace
+
+TEST_F(ApplySettings, ARoundTripChangesExactlyWhatTheClientEdited) {
+    discover(eMorvex);
+    const auto read = [&] {
+        XMLWrapper cfg = newDoc(doc_kind::device_settings);
+        bool checked = false;
+        fresh();
+        EXPECT_EQ(wrapper->getDeviceSettings(rec, device, cfg, true, status, checked), ME_SUCCESS);
+        return parsed(cfg);
+    };
+    auto edited = read();
+    pugi::xml_node settings = edited->document_element().child("Settings");
+    pugi::xml_node beep = settings.child("Beep");
+    ASSERT_STREQ(beep.text().get(), "1");
+    beep.text().set("0");
+    beep.attribute("Txt").set_value("Off");
+    pugi::xml_node named = settings.child("Insulins").child("Custom").first_child().next_sibling();
+    ASSERT_STREQ(named.text().get(), "12");
+    named.attribute("Txt").set_value("Rapid2");
+    pugi::xml_node favourite = settings.child("Insulins").child("Favorite").first_child().next_sibling();
+    ASSERT_TRUE(favourite);
+    favourite.text().set("12");
+    favourite.attribute("Txt").set_value("Rapid2");
+    settings.child("Schedule").child("PreB").attribute("m").set_value("45");
+    settings.child("Targets").child("PreMealLow").text().set("75");
+
+    std::ostringstream text;
+    edited->save(text);
+    XMLWrapper cfg;
+    ASSERT_TRUE(cfg.LoadXML(text.str()));
+    ASSERT_EQ(apply(cfg), ME_SUCCESS);
+    EXPECT_EQ(report(), summary("-31", "Partial success;GlucRange value is read only;GlucErrRange value is read only;"
+                                       "GlucCalib value is read only;"));
+
+    std::ostringstream expected, again;
+    settings.print(expected);
+    read()->document_element().child("Settings").print(again);
+    EXPECT_EQ(again.str(), expected.str());
+}
