@@ -51,6 +51,13 @@ inline constexpr std::array<OptionElementRow, 19> kOptionElements{{
     {"PumpUse", eInsulinPumpUse, OptionMapping::inverted, {"No", "Yes"}},
 }};
 
+constexpr bool indexedByOption() {
+    for (std::size_t i = 0; i < kOptionElements.size(); ++i)
+        if (kOptionElements[i].option != static_cast<MeterOptions_Enum>(i)) return false;
+    return true;
+}
+static_assert(indexedByOption(), "kOptionElements rows must follow MeterOptions_Enum");
+
 // Event averaging as type 7 offers it: an averaging period instead of on/off.
 inline constexpr OptionElementRow kEvtAvgDurnElement{
     "EvtAvgDurn", eEvevtAveraging, OptionMapping::raw, {"7 Days", "14 Days", "30 Days", "60 Days", "90 Days"}};

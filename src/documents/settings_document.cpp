@@ -508,7 +508,6 @@ std::int32_t SettingsRequest::run(bool& blnCheckMeter) {
 
     cfg_.InitDocument(doc_kind::device_settings);
     writeDeviceDescription(cfg_, session);
-    cfg_.MoveToRoot();
     if (!meter_) {
         req_.fail(ME_FAIL);
         return closeAndEnd(ME_FAIL);

