@@ -75,13 +75,25 @@ void readings(MeterSession& s, const CommandLine& cl) {
 
 }  // namespace
 
+std::string examplesHelp() {
+    return "Examples:\n"
+           "  varnel discover --sim-type 4            describe the simulated type-4 meter\n"
+           "  varnel readings --csv -o readings.csv   the readings, one CSV line each\n"
+           "  varnel caps --item Clock --record Gluc  the clock range and glucose limits\n"
+           "  varnel settings --sim-type 3            the settings document of the simulated type-3 meter\n"
+           "  varnel clock                            the meter clock beside the computer clock\n"
+           "  varnel set cfg.xml                      write an edited settings document back to the meter\n"
+           "  varnel clock --sync --sim-type 5        set the meter clock to the computer clock\n\n";
+}
+
 std::string exitStatusHelp() {
     return "Exit status:\n"
            "  0       success\n"
            "  1-62    a request failed: its return code made positive (-13 exits with 13);\n"
            "          'varnel codes' lists the codes, and each status description is printed\n"
            "          on standard error as one line 'varnel: <text>'\n"
-           "  2       also a wrong command line, or 'clear' without --yes\n"
+           "  2       also a wrong command line, 'clear' without --yes, or 'set' with a FILE\n"
+           "          that is not an XML document\n"
            "  63      a request failed with a code outside -1..-62\n"
            "  64      varnel itself failed: the simulated meter could not be set up, or the\n"
            "          output could not be written (the meter is then not erased)\n"

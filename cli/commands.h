@@ -19,6 +19,8 @@ void emit(const std::string& path, const std::string& text);
 // A document as the text of an XML file.
 std::string xmlText(const XMLWrapper& doc);
 
+// What `varnel --help` shows as examples.
+std::string examplesHelp();
 // What `varnel --help` says about exit statuses.
 std::string exitStatusHelp();
 

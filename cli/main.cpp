@@ -6,18 +6,20 @@
 #include "caps_command.h"
 #include "commands.h"
 #include "session.h"
+#include "set_commands.h"
 #include "settings_commands.h"
 
 int main(int argc, char** argv) {
     using namespace varnel::cli;
     CLI::App app{"varnel: talk to a meter of the Corvia family (simulated by default)"};
-    app.footer(exitStatusHelp());
+    app.footer(examplesHelp() + exitStatusHelp());
     app.require_subcommand(1);
     int status = exit_status::success;
     addCodesCommand(app, status);
     addMeterCommands(app, status);
     addCapsCommand(app, status);
-    addSettingsCommands(app, status);
+    addSetCommand(app, status);
+    addSettingsCommands(app, status, syncMeterClock);
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError& e) {
