@@ -506,19 +506,21 @@ VX_API std::int16_t GetMeterDatalog(METER_REC* rec, METER_BIN_DATALOG* datalog, 
         if (std::int16_t c = reach(s, r)) return c;
         const MeterProfile& m = s.meter();
         if (!m.usesBinaryDatalog()) return ME_NOT_SUPPORTED;
-        // The records from the start time on, keeping which of them are damaged.
+        // The records from the start time on. Records the meter knows to be damaged
+        // are not sent, only counted: recordCount holds the records delivered.
         std::vector<RECORD_DATA> sent;
-        std::vector<int> damaged;
+        std::int16_t damaged = 0;
         for (std::size_t i = 0; i < m.binaryDatalog.size(); ++i) {
             if (m.binaryDatalog[i].timeStamp < startSeconds) continue;
             if (std::find(m.corruptedRecords.begin(), m.corruptedRecords.end(), int(i)) !=
-                m.corruptedRecords.end())
-                damaged.push_back(int(sent.size()));
+                m.corruptedRecords.end()) {
+                ++damaged;
+                continue;
+            }
             sent.push_back(m.binaryDatalog[i]);
         }
         auto image = std::make_unique<METER_BIN_DATALOG>();
         encodeBinaryDatalog(sent, *image);
-        for (int i : damaged) corruptBinaryRecord(*image, i);
         // Where each record ends in binBuf, to count the records received so far.
         const std::size_t header = encodedSize({});
         std::vector<std::size_t> ends;
@@ -528,7 +530,7 @@ VX_API std::int16_t GetMeterDatalog(METER_REC* rec, METER_BIN_DATALOG* datalog, 
 
         std::memset(datalog, 0, sizeof *datalog);
         datalog->maxRecordsForMeter = m.maxRecords;
-        datalog->corruptedCount = static_cast<std::int16_t>(damaged.size());
+        datalog->corruptedCount = damaged;
         std::size_t copied = 0;
         s.transfer(r, kFrameBytes + size, 0, [&](double fraction) {
             const auto upTo = static_cast<std::size_t>(fraction * double(size));

@@ -104,6 +104,18 @@ TEST_F(Readings, BinaryDatalogWithOrdinalsAndEveryUnit) {
     EXPECT_EQ(summary().back(), "InsUnit=Units");
 }
 
+TEST_F(Readings, BinaryTotalsCountDamagedRecordsOnce) {
+    discover(eMorvex);
+    sim::MeterProfile meter = sim::meter();
+    meter.corruptedRecords = {3, 50, 100};
+    sim::loadProfile(meter);
+    ASSERT_EQ(read(), ME_SUCCESS);
+    const auto held = meter.binaryDatalog.size();
+    const std::vector<std::string> all = summary();
+    const std::vector<std::string> counts(all.begin(), all.begin() + 3);
+    EXPECT_EQ(counts, (std::vector<std::string>{std::to_string(held), std::to_string(held - 3), "3"}));
+}
+
 TEST_F(Readings, UploadReportsTheFirstHalfAndConversionTheSecond) {
     discover(eDunmark);
     ASSERT_EQ(read(), ME_SUCCESS);
