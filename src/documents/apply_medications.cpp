@@ -5,6 +5,7 @@
 
 #include "component/err_propagator.h"
 #include "documents/apply_settings.h"
+#include "documents/option_tables.h"
 #include "settings/medication_groups.h"
 #include "settings/schedule_group.h"
 #include "settings/targets_group.h"
@@ -128,28 +129,7 @@ MissingElement applyMedications(ApplyContext& ctx, const MedicationList& list) {
     return {};
 }
 
-constexpr const char* kMealSegments[] = {"PreB", "PostB", "PreL", "PostL", "PreD", "PostD", "Night"};
-
-struct TargetLimit {
-    const char* element;
-    std::int16_t Group_targets::*limit;
-    bool mustBePositive;
-};
-
-constexpr TargetLimit kTargetLimits[] = {
-    {"PreMealLow", &Group_targets::BefMealLowLimit, false},
-    {"PreMealHigh", &Group_targets::BefMealHighLimit, false},
-    {"PostMealLow", &Group_targets::AftMealLowLimit, false},
-    {"PostMealHigh", &Group_targets::AftMealHighLimit, false},
-    {"Hypo", &Group_targets::HypoLevel, true},
-};
-
 }  // namespace
-
-const char* mealSegmentElement(std::int32_t segment) {
-    return segment >= 1 && segment <= static_cast<std::int32_t>(std::size(kMealSegments)) ? kMealSegments[segment - 1]
-                                                                                           : nullptr;
-}
 
 MissingElement applyInsulins(ApplyContext& ctx) { return applyMedications(ctx, kInsulinList); }
 
@@ -177,7 +157,7 @@ MissingElement applySchedule(ApplyContext& ctx) {
     }
     if (group->ScheduleType != 0) {
         for (std::int32_t s = 1; s <= group->Count(); ++s) {
-            const char* name = mealSegmentElement(s);
+            const char* name = kMealSegments.at(static_cast<std::size_t>(s - 1));
             cfg.SelectElement("Settings");
             cfg.MoveToChild("Schedule");
             if (cfg.CountElements(name) != 1) return name;
@@ -207,13 +187,14 @@ MissingElement applyTargets(ApplyContext& ctx) {
     cfg.SelectElement("Settings");
     if (cfg.CountElements("Targets") != 1) return "Targets";
     cfg.MoveToChild("Targets");
-    std::array<std::optional<std::int16_t>, std::size(kTargetLimits)> accepted;
+    std::array<std::optional<std::int16_t>, kTargetElements.size()> accepted;
     bool anyRefused = false;
-    for (std::size_t i = 0; i < std::size(kTargetLimits); ++i) {
-        const TargetLimit& t = kTargetLimits[i];
+    for (std::size_t i = 0; i < kTargetElements.size(); ++i) {
+        const TargetElement& t = kTargetElements[i];
         if (cfg.CountElements(t.element) != 1) return t.element;
         const double v = ToNumber(cfg.GetChildValue(t.element));
-        if (t.mustBePositive ? v > 0 : v >= 0) {
+        // The limits may be 0; a hypo level may not.
+        if (t.limit == &Group_targets::HypoLevel ? v > 0 : v >= 0) {
             accepted[i] = roundToInt16(v);
         } else {
             ctx.outcome.refuse(std::string("Invalid Targets ") + t.element + " value ; ");
@@ -225,8 +206,8 @@ MissingElement applyTargets(ApplyContext& ctx) {
         ctx.outcome.refuse("Invalid Targets value ; ");
         return {};
     }
-    for (std::size_t i = 0; i < std::size(kTargetLimits); ++i)
-        if (accepted[i]) (*group).*kTargetLimits[i].limit = *accepted[i];
+    for (std::size_t i = 0; i < kTargetElements.size(); ++i)
+        if (accepted[i]) (*group).*kTargetElements[i].limit = *accepted[i];
     save(ctx, *group, "Invalid Targets value ; ");
     return {};
 }

@@ -24,9 +24,6 @@ struct ApplyContext {
 // when the step ran to its end. Value refusals only go into the outcome.
 using MissingElement = std::optional<std::string>;
 
-// Element of meal segment 1-7 ("PreB" ... "Night"); null for any other segment.
-const char* mealSegmentElement(std::int32_t segment);
-
 // Each fills its group from the document and saves it once; a model without
 // the group makes the step do nothing.
 MissingElement applyInsulins(ApplyContext& ctx);

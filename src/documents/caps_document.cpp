@@ -148,11 +148,6 @@ constexpr MedicationCaps kInsulinCaps{"10", "11", "3"};
 constexpr MedicationCaps kPillCaps{"5", "10", "5"};
 constexpr const char* kCustomNameLength = "8";
 
-constexpr Part kTargetParts[] = {
-    {"PreMealLow", {"60", "200"}},  {"PreMealHigh", {"60", "200"}}, {"PostMealLow", {"60", "200"}},
-    {"PostMealHigh", {"60", "200"}}, {"Hypo", {"50", "90"}},
-};
-
 // The highest glucose a meter type reads; type 3 stops lower than the others.
 const char* glucoseCeiling(std::int16_t meterType) { return meterType == eDunmark ? "768" : "1023"; }
 
@@ -414,9 +409,9 @@ private:
         caps_.SetAttribute("Mode", "1");
         caps_.SetAttribute("Unit", "0");
         caps_.SetAttribute("UTxt", "mg/dL");
-        for (const Part& part : kTargetParts) {
-            caps_.AddChildElement(part.name);
-            setLimits(caps_, part.limits, type_, true);
+        for (const TargetElement& target : kTargetElements) {
+            caps_.AddChildElement(target.element);
+            setLimits(caps_, {target.min, target.max}, type_, true);
         }
     }
 

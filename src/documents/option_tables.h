@@ -1,11 +1,13 @@
 // The words of the settings documents: how each general option of a meter
-// appears as an element (name, value mapping, value words) and the language
-// words. Shared by the settings and the capabilities documents.
+// appears as an element (name, value mapping, value words), the language
+// words, the schedule's segments and the targets. Shared by the settings,
+// capabilities and configuration documents.
 #pragma once
 
 #include <array>
 #include <cstdint>
 
+#include "settings/targets_group.h"
 #include "varnel/records.h"
 
 namespace varnel::detail {
@@ -108,5 +110,25 @@ constexpr const char* languageWord(std::int32_t code) {
 constexpr const char* modeText(std::int16_t availability) {
     return availability == 1 ? "0" : availability == 2 ? "1" : nullptr;
 }
+
+// Schedule segment elements, by segment number 1-7 (segment s at s - 1).
+inline constexpr std::array<const char*, 7> kMealSegments{"PreB", "PostB", "PreL", "PostL", "PreD", "PostD", "Night"};
+
+// A glucose target as an element: the limit of the targets group it holds and the range documents show.
+struct TargetElement {
+    const char* element;
+    std::int16_t Group_targets::*limit;
+    const char* min;
+    const char* max;
+};
+
+// The targets in document order.
+inline constexpr std::array<TargetElement, 5> kTargetElements{{
+    {"PreMealLow", &Group_targets::BefMealLowLimit, "60", "200"},
+    {"PreMealHigh", &Group_targets::BefMealHighLimit, "60", "200"},
+    {"PostMealLow", &Group_targets::AftMealLowLimit, "60", "200"},
+    {"PostMealHigh", &Group_targets::AftMealHighLimit, "60", "200"},
+    {"Hypo", &Group_targets::HypoLevel, "50", "90"},
+}};
 
 }  // namespace varnel::detail

@@ -130,24 +130,6 @@ bool offers(const TypeItems* row, std::size_t item) {
     return false;
 }
 
-// Schedule segment elements, by segment number 1-7.
-constexpr const char* kSegmentNames[] = {"PreB", "PostB", "PreL", "PostL", "PreD", "PostD", "Night"};
-
-struct TargetLimit {
-    const char* element;
-    std::int16_t Group_targets::*limit;
-    const char* min;
-    const char* max;
-};
-
-constexpr TargetLimit kTargetLimits[] = {
-    {"PreMealLow", &Group_targets::BefMealLowLimit, "60", "200"},
-    {"PreMealHigh", &Group_targets::BefMealHighLimit, "60", "200"},
-    {"PostMealLow", &Group_targets::AftMealLowLimit, "60", "200"},
-    {"PostMealHigh", &Group_targets::AftMealHighLimit, "60", "200"},
-    {"Hypo", &Group_targets::HypoLevel, "50", "90"},
-};
-
 // How one medication table appears in the document.
 template <class G>
 struct MedicationItem {
@@ -395,7 +377,7 @@ SettingsRequest::Exit SettingsRequest::writeSchedule() {
     cfg_.SetAttribute("Mode", "1");
     for (std::int32_t s = 1; s <= schedule->Count(); ++s) {
         const DateTime start = schedule->ScheduleTime(s);
-        cfg_.AddChildElement(kSegmentNames[s - 1]);
+        cfg_.AddChildElement(kMealSegments[static_cast<std::size_t>(s - 1)]);
         cfg_.SetChildAttribute("h", std::to_string(start.hour()));
         cfg_.SetChildAttribute("m", std::to_string(start.minute()));
     }
@@ -418,7 +400,7 @@ SettingsRequest::Exit SettingsRequest::writeTargets() {
     const bool mmol = record_.Setting.nValue[eUnits] != 0;
     cfg_.SetAttribute("Unit", mmol ? "1" : "0");
     cfg_.SetAttribute("UTxt", kOptionElements[eUnits].words[mmol ? 1 : 0]);
-    for (const TargetLimit& limit : kTargetLimits) {
+    for (const TargetElement& limit : kTargetElements) {
         cfg_.AddChildElement(limit.element, "", std::to_string(targets->*limit.limit));
         cfg_.SetChildAttribute("Min", limit.min);
         cfg_.SetChildAttribute("Max", limit.max);
