@@ -15,18 +15,6 @@ namespace varnel::detail {
 
 namespace {
 
-std::string trimmed(const std::string& s) {
-    const auto first = s.find_first_not_of(' ');
-    if (first == std::string::npos) return {};
-    return s.substr(first, s.find_last_not_of(' ') - first + 1);
-}
-
-std::string lowerCase(std::string s) {
-    for (char& c : s)
-        if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-    return s;
-}
-
 template <class G>
 std::shared_ptr<G> groupOf(ApplyContext& ctx, std::int32_t number) {
     auto group = std::dynamic_pointer_cast<G>(ctx.meter.Settings().Item(number));
@@ -91,7 +79,7 @@ MissingElement applyMedications(ApplyContext& ctx, const MedicationList& list) {
     cfg.MoveToChild("Custom");
     std::array<std::int16_t, kCustomEntries> named{};
     for (std::int32_t i = 0, n = cfg.GetChildCount(); i < n; ++i) {
-        const std::string v = trimmed(cfg.GetChildValueAt(i));
+        const std::string v = Trim(cfg.GetChildValueAt(i));
         const double position = ToNumber(v);
         if (position < list.firstCustom || position > list.lastCustom) {
             outcome.refuse(list.customRefused + v + " ;");
@@ -100,7 +88,7 @@ MissingElement applyMedications(ApplyContext& ctx, const MedicationList& list) {
         if (static_cast<std::size_t>(i) >= named.size())
             raise(errc::subscript_out_of_range, std::string("More than 13 entries in ") + list.element + "/Custom");
         named[static_cast<std::size_t>(i)] = roundToInt16(position);
-        list.setName(*group, named[static_cast<std::size_t>(i)], trimmed(cfg.GetChildAttributeAt(i, "Txt")));
+        list.setName(*group, named[static_cast<std::size_t>(i)], Trim(cfg.GetChildAttributeAt(i, "Txt")));
     }
 
     cfg.SelectElement("Settings");
@@ -109,7 +97,7 @@ MissingElement applyMedications(ApplyContext& ctx, const MedicationList& list) {
     cfg.MoveToChild("Favorite");
     std::int32_t slot = 1;
     for (std::int32_t j = 0, n = cfg.GetChildCount(); j < n; ++j) {
-        const std::string v = trimmed(cfg.GetChildValueAt(j));
+        const std::string v = Trim(cfg.GetChildValueAt(j));
         if (v.empty()) continue;
         const double position = ToNumber(v);
         const bool fixed = position > 0 && position <= list.lastFixed;
@@ -142,7 +130,7 @@ MissingElement applySchedule(ApplyContext& ctx) {
 
     cfg.SelectElement("Settings");
     if (cfg.CountElements("Schedule") != 1) return "Schedule";
-    const std::string custom = lowerCase(trimmed(cfg.GetChildAttribute("Schedule", "Custom")));
+    const std::string custom = LowerCase(Trim(cfg.GetChildAttribute("Schedule", "Custom")));
     if (custom == "true") {
         group->ScheduleType = 1;
     } else if (custom == "false") {

@@ -84,18 +84,6 @@ constexpr SettingsItem kItems[] = {
 // Elements the client may send back as it read them, which are never written.
 constexpr const char* kReadOnlyItems[] = {"GlucErrRange", "GlucRange", "GlucCalib"};
 
-std::string trimmed(const std::string& s) {
-    const auto first = s.find_first_not_of(' ');
-    if (first == std::string::npos) return {};
-    return s.substr(first, s.find_last_not_of(' ') - first + 1);
-}
-
-std::string lowerCase(std::string s) {
-    for (char& c : s)
-        if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-    return s;
-}
-
 bool validType(const std::string& text) {
     const double type = ToNumber(text);
     return type > 0 && type <= 8;
@@ -114,7 +102,7 @@ MissingElement applyClock(ApplyContext& ctx, bool& written) {
     cfg.SelectElement("Settings");
     if (cfg.CountElements("Clock") != 1) return "Clock";
     cfg.MoveToChild("Clock");
-    const auto part = [&](const char* name) { return trimmed(cfg.GetChildAttribute("Val", name)); };
+    const auto part = [&](const char* name) { return Trim(cfg.GetChildAttribute("Val", name)); };
     const std::string day = part("D"), month = part("MM"), year = part("Y");
     const std::string h = part("h"), m = part("m"), s = part("s");
 
@@ -148,7 +136,7 @@ MissingElement applyClock(ApplyContext& ctx, bool& written) {
 // The meter's initialised flag, 0 or 1.
 void applyDevInit(ApplyContext& ctx) {
     ctx.deviceCfg.SelectElement("Settings");
-    const std::string v = trimmed(ctx.deviceCfg.GetChildValue("DevInit"));
+    const std::string v = Trim(ctx.deviceCfg.GetChildValue("DevInit"));
     const double flag = ToNumber(v);
     // An empty element is no value, not 0.
     if (v.empty() || (flag != 0 && flag != 1)) {
@@ -213,7 +201,7 @@ std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, 
         if (const std::int32_t c = session.checkmeter(udtMeterRec)) return stop(ME_FAIL, c, ErrorDescription(c));
 
         const std::string meterSerial = session.LastMeterSerialNo();
-        if (lowerCase(meterSerial) != lowerCase(cfgSerial))
+        if (LowerCase(meterSerial) != LowerCase(cfgSerial))
             return different(" ; Device SN from Device settings XML - " + cfgSerial + " Device SN from device - " +
                              meterSerial + " do not match");
         const std::int16_t meterType = session.storedRecord().M_Type;
@@ -223,7 +211,7 @@ std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, 
         if (ToNumber(infoType) != meterType)
             return different(" ; Device Type from Device Info XML - " + infoType + " Device Type from device - " +
                              std::to_string(meterType) + " do not match");
-        if (lowerCase(meterSerial) != lowerCase(infoSerial))
+        if (LowerCase(meterSerial) != LowerCase(infoSerial))
             return different(" ; Device SN from Device Info XML - " + infoSerial + " Device SN from device - " +
                              meterSerial + " do not match");
 

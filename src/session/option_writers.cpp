@@ -68,12 +68,6 @@ const OptionWriter& writerFor(MeterOptions_Enum option) {
     return kWriters[option];
 }
 
-std::string trimmed(const std::string& s) {
-    const auto first = s.find_first_not_of(' ');
-    if (first == std::string::npos) return {};
-    return s.substr(first, s.find_last_not_of(' ') - first + 1);
-}
-
 // The document's text as the meter takes it: a document 1 of an inverted option
 // is written as 0 and 0 as 1, the baud codes "0"-"3" run the other way; any
 // other text goes as it is.
@@ -126,7 +120,7 @@ std::int16_t writeOption(MeterDll& session, MeterOptions_Enum option, XMLWrapper
                 text = deviceCfg.GetChildAttribute(element, "Val");
             else if (!element.empty())
                 text = deviceCfg.GetChildValue(element);
-            text = trimmed(text);
+            text = Trim(text);
             // No value stays no value, whatever the mapping would make of it.
             if (text.empty()) {
                 outcome.refuse(w.emptyValue + ErrorDescription(ME_FAIL) + ";");

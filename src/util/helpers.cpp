@@ -140,6 +140,14 @@ thread_local bool continueFlag = true;
 
 }  // namespace
 
+std::string Trim(std::string_view text) { return std::string(trim(text)); }
+
+std::string LowerCase(std::string_view text) {
+    std::string s(text);
+    std::transform(s.begin(), s.end(), s.begin(), lowerAscii);
+    return s;
+}
+
 bool IsNumeric(std::string_view text) { return parseNumber(text).has_value(); }
 
 double ToNumber(std::string_view text) { return parseNumber(text).value_or(0.0); }

@@ -23,6 +23,11 @@ bool IsNumeric(std::string_view text);
 // The value of a numeric text (see IsNumeric); 0 for any other text.
 double ToNumber(std::string_view text);
 
+// The text without the blanks (spaces, tabs, line ends) at either end.
+std::string Trim(std::string_view text);
+// The text with its ASCII capitals in lower case.
+std::string LowerCase(std::string_view text);
+
 // The text in the first count bytes, ending early at the first zero byte;
 // never reads past the array, whatever count says.
 std::string BytesToText(std::span<const std::uint8_t> bytes, int count);
