@@ -16,13 +16,6 @@ int windowedYear(int year) {
 
 }  // namespace
 
-bool Group_Clock::initialise(clsMeterFns& meterFns) {
-    return guarded(kClass, "initialise", [&] {
-        takeSession(meterFns);
-        return false;
-    });
-}
-
 std::int16_t Group_Clock::readFromMeter() {
     return guarded(kClass, "readFromMeter", [&]() -> std::int16_t {
         std::int32_t seconds = 0;

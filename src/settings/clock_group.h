@@ -13,7 +13,6 @@ public:
     // The meter's clock as the transport counts it (local meter time).
     std::int32_t ClockInSeconds = 0;
 
-    bool initialise(clsMeterFns& meterFns) override;
     std::int16_t readFromMeter() override;
     std::int16_t saveToMeter() override;
     const char* className() const override { return "Group_Clock"; }

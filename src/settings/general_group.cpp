@@ -35,13 +35,6 @@ double numericValue(const Variant& value) {
 
 }  // namespace
 
-bool Group_General::initialise(clsMeterFns& meterFns) {
-    return guarded(kClass, "initialise", [&] {
-        takeSession(meterFns);
-        return false;
-    });
-}
-
 std::int16_t Group_General::readFromMeter() {
     return guarded(kClass, "readFromMeter", [&]() -> std::int16_t {
         if (std::int16_t code = outcome(transport().vb_Read_Meter_Options(rec_))) return code;

@@ -12,7 +12,6 @@ namespace varnel::detail {
 
 class Group_General : public ISetupGroup {
 public:
-    bool initialise(clsMeterFns& meterFns) override;
     // Replaces the options with those the meter offers; a failed read keeps the old ones.
     std::int16_t readFromMeter() override;
     // Writes every modified writable option; options with setting type 1 are

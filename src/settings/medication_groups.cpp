@@ -66,26 +66,18 @@ std::size_t slotOf(std::int32_t position, std::int32_t count) {
 
 }  // namespace
 
-MedicationGroup::MedicationGroup(const MedicationTable& table) : table_(table) { clear(); }
+MedicationGroup::MedicationGroup(const MedicationTable& table) : table_(table) { clearValues(); }
 
 Group_Insulins::Group_Insulins() : MedicationGroup(kInsulins) {}
 Group_OralMeds::Group_OralMeds() : MedicationGroup(kOralMeds) {}
 
-void MedicationGroup::clear() {
+void MedicationGroup::clearValues() {
     // One spare slot beyond the last position, as the arrays handed out show.
     const auto slots = static_cast<std::size_t>(table_.count) + 1;
     names_.assign(slots, std::string());
     notChangeable_.assign(slots, 0);
     changed_.assign(slots, false);
     favourites_.assign(static_cast<std::size_t>(table_.favouriteCount) + 1, 0);
-}
-
-bool MedicationGroup::initialise(clsMeterFns& meterFns) {
-    return guarded(table_.className, "initialise", [&] {
-        takeSession(meterFns);
-        clear();
-        return false;
-    });
 }
 
 std::int16_t MedicationGroup::readFromMeter() {

@@ -33,7 +33,6 @@ struct MedicationTable {
 class MedicationGroup : public ISetupGroup {
 public:
     // Also empties the table: no names, zero codes and favourites, no changes.
-    bool initialise(clsMeterFns& meterFns) override;
     // Reads every name, then the favourites; stops early, returning 0, when the
     // continue flag is cleared.
     std::int16_t readFromMeter() override;
@@ -59,7 +58,7 @@ protected:
     std::vector<std::int16_t> favourites() const { return favourites_; }
 
 private:
-    void clear();
+    void clearValues() override;
 
     const MedicationTable& table_;
     std::vector<std::string> names_;

@@ -21,13 +21,6 @@ std::size_t slotOf(std::int32_t segment) {
 
 }  // namespace
 
-bool Group_Schedule::initialise(clsMeterFns& meterFns) {
-    return guarded(kClass, "initialise", [&] {
-        takeSession(meterFns);
-        return false;
-    });
-}
-
 std::int16_t Group_Schedule::readFromMeter() {
     return guarded(kClass, "readFromMeter", [&]() -> std::int16_t {
         std::int16_t selection = 0;

@@ -14,7 +14,6 @@ public:
     // The meter's schedule selection; 0 means no segment times are written.
     std::int32_t ScheduleType = 0;
 
-    bool initialise(clsMeterFns& meterFns) override;
     std::int16_t readFromMeter() override;
     std::int16_t readScheduleFromMeter();
     // Writes the selection, then (unless it is 0) the changed segments, 0 for the others.

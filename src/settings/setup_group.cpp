@@ -17,9 +17,13 @@ bool ISetupGroup::ISetupGroup_saveToMeter() {
     return guarded(className(), "ISetupGroup_saveToMeter", [&] { return saveToMeter() != 0; });
 }
 
-void ISetupGroup::takeSession(clsMeterFns& meterFns) {
-    rec_ = meterFns.MeterRec;
-    transport_ = meterFns.transport;
+bool ISetupGroup::initialise(clsMeterFns& meterFns) {
+    return guarded(className(), "initialise", [&] {
+        rec_ = meterFns.MeterRec;
+        transport_ = meterFns.transport;
+        clearValues();
+        return false;
+    });
 }
 
 Transport& ISetupGroup::transport() {

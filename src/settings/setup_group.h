@@ -28,8 +28,9 @@ class ISetupGroup {
 public:
     virtual ~ISetupGroup() = default;
 
-    // Takes a copy of the session's meter record; the copy is not refreshed afterwards.
-    virtual bool initialise(clsMeterFns& meterFns) = 0;
+    // Takes a copy of the session's meter record (not refreshed afterwards) and
+    // starts the group's values afresh; always false.
+    bool initialise(clsMeterFns& meterFns);
     // 0, or the record copy's Error_code when the transport failed.
     virtual std::int16_t readFromMeter() = 0;
     virtual std::int16_t saveToMeter() = 0;
@@ -46,8 +47,8 @@ public:
     const METER_REC& meterRec() const { return rec_; }
 
 protected:
-    // Copies the session's record and transport; the common part of every initialise.
-    void takeSession(clsMeterFns& meterFns);
+    // What a group clears when it is initialised, beyond taking the record.
+    virtual void clearValues() {}
     // The transport taken by initialise; a missing-object error before that.
     Transport& transport();
     // 0 for a transport success, otherwise the record copy's Error_code (the

@@ -8,13 +8,6 @@ namespace {
 constexpr const char* kClass = "Group_Targets";
 }  // namespace
 
-bool Group_targets::initialise(clsMeterFns& meterFns) {
-    return guarded(kClass, "initialise", [&] {
-        takeSession(meterFns);
-        return false;
-    });
-}
-
 std::int16_t Group_targets::readFromMeter() {
     return guarded(kClass, "readFromMeter", [&]() -> std::int16_t {
         std::int16_t befLow = 0, befHigh = 0, aftLow = 0, aftHigh = 0, hypo = 0;

@@ -15,7 +15,6 @@ public:
     std::int16_t BefMealHighLimit = 0;
     std::int16_t HypoLevel = 0;
 
-    bool initialise(clsMeterFns& meterFns) override;
     // A failed read keeps the old limits.
     std::int16_t readFromMeter() override;
     std::int16_t saveToMeter() override;
