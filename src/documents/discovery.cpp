@@ -28,18 +28,12 @@ constexpr const char* kDisplayNames[] = {
 constexpr int kFirmwareBytes = 20;
 constexpr double kPortLimit = 256;
 
-std::string trimmed(std::string_view s) {
-    const auto first = s.find_first_not_of(' ');
-    if (first == std::string_view::npos) return {};
-    return std::string(s.substr(first, s.find_last_not_of(' ') - first + 1));
-}
-
 // Text up to the next "/" of rest, which then starts after it.
 std::string takeDatePart(std::string_view& rest, const std::string& firmware) {
     const auto slash = rest.find('/');
     if (slash == std::string_view::npos)
         raise(errc::internal, "The firmware text \"" + firmware + "\" has no month/day/year date");
-    std::string part = trimmed(rest.substr(0, slash));
+    std::string part = Trim(rest.substr(0, slash));
     rest.remove_prefix(slash + 1);
     return part;
 }
@@ -71,7 +65,7 @@ FirmwareText splitFirmware(const std::string& firmware) {
     if (blank != std::string::npos) rest.remove_prefix(blank + 1);
     const std::string month = takeDatePart(rest, firmware);
     out.day = takeDatePart(rest, firmware);
-    const std::string year = trimmed(rest);
+    const std::string year = Trim(rest);
     if (!year.empty()) {
         const double y = ToNumber(year);
         if (y >= 90 && y <= 99)

@@ -13,12 +13,6 @@ constexpr int kSerialBytes = 20;
 
 std::string serialText(const METER_REC& rec) { return BytesToText(rec.Serial_number, kSerialBytes); }
 
-std::string trimmed(const std::string& s) {
-    const auto first = s.find_first_not_of(' ');
-    if (first == std::string::npos) return {};
-    return s.substr(first, s.find_last_not_of(' ') - first + 1);
-}
-
 }  // namespace
 
 MeterDll::MeterDll(std::shared_ptr<Transport> transport)
@@ -90,7 +84,7 @@ void MeterDll::AssignMeter() {
 
 void MeterDll::MeterSerialNumberFix() {
     guarded(kClass, "MeterSerialNumberFix", [&] {
-        const std::string serial = trimmed(LastMeterSerialNo_);
+        const std::string serial = Trim(LastMeterSerialNo_);
         if (!serial.empty() && serial != "00") return;
         // Some meters only tell their serial number with an upload.
         if (!Meter_) raise(errc::missing_object, "The session has no meter model");
