@@ -47,15 +47,22 @@ TEST_F(ClearClose, FailedEraseClosesUnlessToldToKeepTheMeter) {
     EXPECT_FALSE(sim::meter().datalog.empty());
 }
 
-TEST_F(ClearClose, FailedEraseWithoutACodeIsStillAFailure) {
+TEST_F(ClearClose, ErasesThatFailWithoutACodeOrRaiseAreFailures) {
     auto fake = std::make_shared<FakeTransport>();
+    fake->does("vb_Chk4Meter", [](FakeArgs& a) { a.rec->M_Type = 3; });
     fake->returns("vb_Clear_Meter_Datalog", {ME_FAIL});  // Error_code stays 0
     DllWrapper own(fake);
     rec.Serial_number[0] = 'S';
-    XMLWrapper doc = deviceDoc("1", "S", "7");
-    rec.M_Type = 7;
+    XMLWrapper doc = deviceDoc("1", "S", "3");
     EXPECT_EQ(own.clearMeter(rec, doc, status), ME_FAIL);
     EXPECT_EQ(statusGroups(status), std::vector<std::string>{"-17/-17/Operation failed"});
+
+    // An error below the request keeps its chain of routines.
+    fresh();
+    fake->does("vb_Clear_Meter_Datalog", [](FakeArgs&) { detail::raise(errc::overflow, "Overflow"); });
+    EXPECT_EQ(unexpectedTrace([&] { own.clearMeter(rec, doc, status); }), "6 doAction --> clearMeter --> ");
+    EXPECT_EQ(statusGroups(status),
+              std::vector<std::string>{"-17/-16/Unknown status;Error number = 6 Error description = clearMeter --> /0"});
 }
 
 TEST_F(ClearClose, CloseReleasesThePortQuietly) {
@@ -74,7 +81,7 @@ TEST_F(ClearClose, CloseReleasesThePortQuietly) {
     rec.Error_code = -50;  // closeMeter closes whatever the record says
     EXPECT_EQ(unexpectedTrace([&] { own.closeMeter(rec); }), "51 doAction --> MeterClose --> ");
     EXPECT_EQ(completions, 1);
-    EXPECT_EQ(fake->count("close_meter"), 2);
+    EXPECT_EQ(std::ranges::count(fake->names(), "close_meter"), 2);  // tried again by the handler
 }
 
 }  // namespace

@@ -21,8 +21,6 @@ struct Discovery : WrapperTest {
         if (!firmware.empty()) p.firmware = firmware;
         sim::loadProfile(p);
     }
-    pugi::xml_node info() { return (doc = parsed(device))->document_element().child("DeviceInfo"); }
-    std::shared_ptr<pugi::xml_document> doc;
 };
 
 TEST_F(Discovery, FoundMeterIsDescribedAndItsRecordFilled) {
@@ -46,27 +44,41 @@ TEST_F(Discovery, FoundMeterIsDescribedAndItsRecordFilled) {
     EXPECT_EQ(rec.M_Type, eCVPellis);
     EXPECT_TRUE(statusGroups(status).empty());
     EXPECT_EQ(completions, 0);
-
-    for (int type : {4, 6, 8, 5}) {
-        meterWith(type, 1);
-        ASSERT_EQ(discoverOn("1"), ME_SUCCESS);
-        EXPECT_STREQ(info().child_value("CommState"), type == 5 ? "1" : "0");
-        EXPECT_STREQ(info().child("CommState").attribute("Txt").value(), type == 5 ? "On" : "Off");
-    }
     EXPECT_STREQ(detail::meterDisplayName(9), "Old Meter");
+}
+
+TEST_F(Discovery, FirmwareVersionDateAndCommState) {
+    struct Case {
+        int type;
+        const char *firmware, *version, *d, *mm, *y;
+    };
+    for (Case c : {Case{4, "2.3 11/05/03", "2.3", "05", "11", "2003"}, Case{6, "V1 1/2/99", "V1", "2", "01", "1999"},
+                   Case{8, "V1 12/31/00", "V1", "31", "12", "2000"}, Case{5, "V1 12/31/89", "V1", "31", "12", "2089"},
+                   Case{3, "V1 12/31/2003", "V1", "", "", ""}}) {
+        meterWith(c.type, 1, c.firmware);
+        ASSERT_EQ(discoverOn("1"), ME_SUCCESS) << c.firmware;
+        auto doc = parsed(device);
+        pugi::xml_node info = doc->document_element().child("DeviceInfo"), version = info.child("MasterSWVer");
+        EXPECT_EQ(std::string(version.child_value()) + "|" + version.attribute("D").value() + "|" +
+                      version.attribute("MM").value() + "|" + version.attribute("Y").value(),
+                  std::string(c.version) + "|" + c.d + "|" + c.mm + "|" + c.y);
+        // Types 4, 6 and 8 talk while switched off.
+        const bool off = c.type % 2 == 0;
+        EXPECT_EQ(std::string(info.child_value("CommState")) + info.child("CommState").attribute("Txt").value(),
+                  off ? "0Off" : "1On") << c.type;
+    }
 }
 
 TEST_F(Discovery, PortsToSearch) {
     meterWith(eDunmark, 4);
     const std::string none = "-17/-13/No device found ; No meter detected on port ";
     struct Case {
-        const char* ports;
-        const char* kind;
+        const char *ports, *kind;
         std::int32_t result;
         std::string group;
     };
     for (const Case& c : {Case{"3,4,5", "COM", ME_NO_DEVICE, none + "3"}, Case{"7", "COM", ME_NO_DEVICE, none + "7"},
-                          Case{"abc", "COM", ME_NO_DEVICE, none + "abc"}, Case{"", "COM", ME_NO_DEVICE, none},
+                          Case{"abc", "COM", ME_NO_DEVICE, none + "abc"},
                           Case{"256", "COM", ME_INVALID_XMLWRAPPOBJ, "-17/-33/256 is not a valid port"},
                           Case{"-1", "COM", ME_INVALID_XMLWRAPPOBJ, "-17/-33/-1 is not a valid port"},
                           Case{"4", "usb", ME_UNSUPPORTED_PORTS, "-11/-25/usb is Unsupported"},
@@ -85,22 +97,6 @@ TEST_F(Discovery, PortsToSearch) {
     EXPECT_TRUE(detail::GetContinueFlag());
 }
 
-TEST_F(Discovery, FirmwareVersionAndDate) {
-    struct Case {
-        const char *firmware, *version, *d, *mm, *y;
-    };
-    for (Case c : {Case{"2.3 11/05/03", "2.3", "05", "11", "2003"}, Case{"V1 1/2/99", "V1", "2", "01", "1999"},
-                   Case{"V1 12/31/00", "V1", "31", "12", "2000"}, Case{"V1 12/31/89", "V1", "31", "12", "2089"},
-                   Case{"V1 12/31/2003", "V1", "", "", ""}}) {
-        meterWith(eDunmark, 1, c.firmware);
-        ASSERT_EQ(discoverOn("1"), ME_SUCCESS) << c.firmware;
-        pugi::xml_node version = info().child("MasterSWVer");
-        EXPECT_EQ(std::string(version.child_value()) + "|" + version.attribute("D").value() + "|" +
-                      version.attribute("MM").value() + "|" + version.attribute("Y").value(),
-                  std::string(c.version) + "|" + c.d + "|" + c.mm + "|" + c.y);
-    }
-}
-
 TEST_F(Discovery, MalformedInputFailsThroughTheErrorHandler) {
     meterWith(eDunmark, 1, "V1.0");  // no date
     for (bool noPorts : {false, true}) {
@@ -110,7 +106,7 @@ TEST_F(Discovery, MalformedInputFailsThroughTheErrorHandler) {
         EXPECT_EQ(unexpectedTrace([&] { wrapper->discoverDevice(rec, device, conn, status); }),
                   std::string(noPorts ? "9" : "51") + " discoverDevice --> ");
         ASSERT_EQ(statusGroups(status).size(), 1u);
-        EXPECT_EQ(statusGroups(status)[0].rfind("-17/-16/", 0), 0u);
+        EXPECT_TRUE(statusGroups(status)[0].starts_with("-17/-16/"));
         EXPECT_EQ(completions, 1);
     }
 }

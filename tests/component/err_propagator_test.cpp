@@ -1,5 +1,8 @@
 #include <gtest/gtest.h>
 
+#include <cmath>
+#include <stdexcept>
+
 #include "component/err_propagator.h"
 
 using namespace varnel;
@@ -7,67 +10,48 @@ using namespace varnel::detail;
 
 namespace {
 
-struct ErrPropagatorTest : ::testing::Test {
-    void SetUp() override { errPropagator().reset(); }
-};
-
-void innermost() { raise(errc::missing_object, "Object variable not set"); }
-void middle() { guarded("MeterDll", "findmeter", [] { innermost(); }); }
+// The number and trace of the error a routine raised.
+template <class F>
+std::string failure(F&& routine) {
+    try {
+        routine();
+    } catch (const ComponentError& e) {
+        return std::to_string(e.number()) + " " + e.description();
+    }
+    return "no error";
+}
 
 }  // namespace
 
-TEST_F(ErrPropagatorTest, TraceGrowsOutermostFirstAndKeepsNumber) {
-    try {
-        guarded("DllWrapper", "discoverDevice", [] { middle(); });
-        FAIL() << "no error";
-    } catch (const ComponentError& e) {
-        EXPECT_EQ(e.number(), errc::missing_object);
-        EXPECT_EQ(e.description(), "discoverDevice --> findmeter --> ");
-    }
-    const IError& e = errPropagator().error();
-    EXPECT_EQ(e.ErrorDesc, "findmeter --> ");
-    EXPECT_EQ(e.FunctionName, "discoverDevice");
-    EXPECT_TRUE(e.ClassName.empty());
-}
-
-TEST_F(ErrPropagatorTest, ThreeLevelsAndCleanupSeesTheError) {
-    std::string seen;
-    try {
-        guarded("A", "outer", [] {
-            guarded("B", "mid", [] { guarded("C", "inner", [] { throw std::out_of_range("x"); }); });
-        }, [&](const IError& e) { seen = e.ErrorTrace; });
-    } catch (const ComponentError& e) {
-        EXPECT_EQ(e.number(), errc::subscript_out_of_range);
-        EXPECT_EQ(e.description(), "outer --> mid --> inner --> ");
-    }
-    EXPECT_EQ(seen, "outer --> mid --> inner --> ");
-}
-
-TEST_F(ErrPropagatorTest, ResetStartsTheTraceAfresh) {
-    auto fail = [](const char* routine) {
-        try {
-            guarded("X", routine, [] { raise(5, "boom"); });
-        } catch (const ComponentError&) {
-        }
-    };
-    fail("discoverDevice");
-    fail("getReadings");
-    EXPECT_EQ(errPropagator().error().ErrorTrace, "getReadings --> discoverDevice --> ");
+TEST(ErrPropagator, TraceGrowsOutermostFirstAndCleanupSeesIt) {
     errPropagator().reset();
-    fail("getReadings");
-    EXPECT_EQ(errPropagator().error().ErrorTrace, "getReadings --> ");
+    std::string seen;
+    const std::string trace = failure([&] {
+        guarded("A", "outer", [&] {
+            guarded("B", "mid", [] { guarded("C", "inner", [] { throw std::out_of_range("x"); }); },
+                    [&](const IError& e) { seen = e.ErrorTrace; });
+        });
+    });
+    EXPECT_EQ(trace, std::to_string(errc::subscript_out_of_range) + " outer --> mid --> inner --> ");
+    EXPECT_EQ(seen, "mid --> inner --> ");
+    // The shared error holds the latest routine, with the inner trace as its description.
+    const IError& e = errPropagator().error();
+    EXPECT_EQ(e.ErrorDesc, "mid --> inner --> ");
+    EXPECT_EQ(e.FunctionName, "outer");
+    EXPECT_TRUE(e.ClassName.empty());
+
+    // Without a reset the next request's trace would carry this one.
+    errPropagator().reset();
+    EXPECT_EQ(failure([] { guarded("X", "getReadings", [] { raise(errc::missing_object, "boom"); }); }),
+              std::to_string(errc::missing_object) + " getReadings --> ");
 }
 
 TEST(Rounding, HalvesToEvenAndOverflowRaises) {
-    EXPECT_EQ(roundToInt16(12.5), 12);
-    EXPECT_EQ(roundToInt16(13.5), 14);
-    EXPECT_EQ(roundToInt16(-2.5), -2);
-    EXPECT_EQ(roundToInt16(32767.4), 32767);
-    EXPECT_THROW(roundToInt16(32767.5), ComponentError);
-    EXPECT_THROW(toInt16(-32769), ComponentError);
-    try {
-        toInt16(40000);
-    } catch (const ComponentError& e) {
-        EXPECT_EQ(e.number(), errc::overflow);
-    }
+    for (auto [value, rounded] : {std::pair{12.5, 12}, {13.5, 14}, {-2.5, -2}, {32767.4, 32767}, {-32768.5, -32768}})
+        EXPECT_EQ(roundToInt16(value), rounded) << value;
+    EXPECT_EQ(roundToInt32(2147483647.4), 2147483647);
+    const std::string overflow = std::to_string(errc::overflow) + " Overflow";
+    for (auto raises : {+[] { roundToInt16(32767.5); }, +[] { roundToInt16(NAN); }, +[] { toInt16(-32769); },
+                        +[] { toInt16(40000); }, +[] { roundToInt32(2147483647.5); }})
+        EXPECT_EQ(failure(raises), overflow);
 }

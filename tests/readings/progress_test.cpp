@@ -32,9 +32,9 @@ struct Progress : ::testing::Test {
     // The transport fills the binary datalog in ten steps, pumping messages as it goes.
     void uploadInSteps(std::int16_t capacity) {
         fake->does("GetMeterDatalog", [this, capacity](test::FakeArgs& a) {
-            a.binDatalog->maxRecordsForMeter = capacity;
+            a.ref<METER_BIN_DATALOG>().maxRecordsForMeter = capacity;
             for (std::int16_t k = 1; k <= 10; ++k) {
-                a.binDatalog->recordCount = static_cast<std::int16_t>(k * 10);
+                a.ref<METER_BIN_DATALOG>().recordCount = static_cast<std::int16_t>(k * 10);
                 clock->advance(400);
                 doEvents();
             }
@@ -53,7 +53,7 @@ struct Progress : ::testing::Test {
 
 TEST_F(Progress, UploadsStartIn2000AndNeverReportFailureAsSuccess) {
     fake->does("convert_to_seconds", [](test::FakeArgs& a) {
-        const TIME_REC& t = *a.time;
+        const TIME_REC& t = a.ref<TIME_REC>();
         EXPECT_EQ(std::vector<int>({t.sec, t.min, t.hour, t.mday, t.mon, t.year, t.wday, t.yday, t.isdst}),
                   std::vector<int>({0, 0, 0, 1, 1, 2000, 0, 0, 0}));
     });

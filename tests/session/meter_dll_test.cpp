@@ -23,6 +23,7 @@ struct Session : ::testing::Test {
     MeterDll session{fake};
     METER_REC rec{};
     std::vector<int> raised;
+    std::vector<std::int16_t> ports;  // what find_meter was asked to search
 
     void SetUp() override {
         setThreadClock(clock);
@@ -37,18 +38,16 @@ struct Session : ::testing::Test {
             putSerial(*a.rec, serial);
             a.rec->port.com_number = 3;
         };
-        fake->does("find_meter", identify).does("vb_Chk4Meter", identify);
+        fake->does("vb_Chk4Meter", identify).does("find_meter", [=, this](FakeArgs& a) {
+            ports.assign(&a.ref<std::int16_t>(), &a.ref<std::int16_t>() + 11);
+            identify(a);
+        });
         fake->does("vb_Get_Meter_Firmware", [](FakeArgs& a) { a.rec->Firmware_number[0] = 'F'; });
     }
 };
 
 TEST_F(Session, FindSearchesThePreferredPortAndKeepsTheLastMeterOnFailure) {
     meterAnswers(eDunmark, "DNM42");
-    std::vector<std::int16_t> ports;
-    fake->does("find_meter", [&, answer = fake->on("find_meter").effect](FakeArgs& a) {
-        ports.assign(a.ports, a.ports + 11);
-        answer(a);
-    });
     session.setCOMPort_Pref(3);
     EXPECT_EQ(session.findmeter(rec), 0);
     EXPECT_EQ(ports, (std::vector<std::int16_t>{3, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0}));
@@ -82,18 +81,7 @@ TEST_F(Session, CheckWaitsBeforeAskingAndInitReturnsTheFirmwareCode) {
     }
 }
 
-TEST_F(Session, CloseActsOnTheCallersRecordWithItsWaits) {
-    session.initMeter(rec);
-    EXPECT_TRUE(session.MeterClose(rec));
-    EXPECT_EQ(rec.Error_code, ME_QUIT);
-    EXPECT_EQ(fake->calls().end()[-2].rec->Error_code, ME_QUIT);  // the tickle before the close
-    EXPECT_EQ(clock->tickCount(), 8000u);
-    EXPECT_FALSE(session.Meter());
-    EXPECT_FALSE(session.isInitialised());
-    EXPECT_EQ(session.storedRecord().Error_code, 0);
-}
-
-TEST_F(Session, ValuesHandleAndFlagsComeFromTheStoredRecord) {
+TEST_F(Session, ValuesHandleAndFlagsComeFromTheStoredRecordAndCloseActsOnTheCallers) {
     rec.Plasma_cal_flag = 1;
     rec.Checkstrip_range_upper_limit = 137;
     putSerial(rec, "A1");
@@ -106,12 +94,21 @@ TEST_F(Session, ValuesHandleAndFlagsComeFromTheStoredRecord) {
         session.GetHandle(h);
         EXPECT_EQ(h, handle);
     }
-    fake->does("GetInitializedFlag", [](FakeArgs& a) { *a.value = a.rec->Error_code = 1; });
+    fake->does("GetInitializedFlag", [](FakeArgs& a) { a.ref<std::int16_t>() = a.rec->Error_code = 1; });
     EXPECT_EQ(session.DevInitialised(), 1);
     EXPECT_EQ(session.storedRecord().Error_code, 0);
     // The same meter is the one with exactly the same serial number.
     fake->does("vb_Chk4Meter", [](FakeArgs& a) { putSerial(*a.rec, "a1"); });
     EXPECT_FALSE(session.isSameMeterConnected());
+
+    const std::uint32_t start = clock->tickCount();
+    EXPECT_TRUE(session.MeterClose(rec));
+    EXPECT_EQ(rec.Error_code, ME_QUIT);
+    EXPECT_EQ(fake->calls().end()[-2].rec->Error_code, ME_QUIT);  // the tickle before the close
+    EXPECT_EQ(clock->tickCount() - start, 3000u);
+    EXPECT_FALSE(session.Meter());
+    EXPECT_FALSE(session.isInitialised());
+    EXPECT_EQ(session.storedRecord().Error_code, 0);
 }
 
 TEST_F(Session, EraseRelaysTheWorkingRecordsProgressAndStopsTheTimerOnEveryExit) {

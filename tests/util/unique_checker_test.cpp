@@ -6,14 +6,9 @@ using varnel::UniqueChecker;
 
 TEST(UniqueChecker, FoldsAsciiCaseKeepsOrderAndClears) {
     UniqueChecker checker;
-    EXPECT_TRUE(checker.AddValue("abc"));
-    EXPECT_FALSE(checker.AddValue("ABC"));
-    EXPECT_FALSE(checker.AddValue("aBc"));
-    EXPECT_TRUE(checker.AddValue("abc "));  // blanks count
-    EXPECT_TRUE(checker.AddValue("\xC3\xA9"));
-    EXPECT_TRUE(checker.AddValue("\xC3\x89"));  // bytes beyond ASCII compare exactly
-    EXPECT_TRUE(checker.AddValue(""));
-    EXPECT_FALSE(checker.AddValue(""));
+    for (auto [text, added] : {std::pair{"abc", true}, {"ABC", false}, {"aBc", false}, {"abc ", true},
+                               {"\xC3\xA9", true}, {"\xC3\x89", true}, {"", true}, {"", false}})
+        EXPECT_EQ(checker.AddValue(text), added) << text;  // bytes beyond ASCII compare exactly
     EXPECT_EQ(checker.Values(), (std::vector<std::string>{"abc", "abc ", "\xC3\xA9", "\xC3\x89", ""}));
 
     checker.Clear();
