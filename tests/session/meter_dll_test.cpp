@@ -1,7 +1,5 @@
 #include <gtest/gtest.h>
 
-#include <cstring>
-
 #include "session/meter_dll.h"
 #include "support/fake_transport.h"
 #include "support/wrapper_fixture.h"
@@ -12,30 +10,20 @@ using test::FakeArgs;
 
 namespace {
 
-void putSerial(METER_REC& rec, const char* text) {
-    std::memset(rec.Serial_number, 0, sizeof rec.Serial_number);
-    std::memcpy(rec.Serial_number, text, std::strlen(text));
-}
-
 struct Session : ::testing::Test {
     std::shared_ptr<ManualClock> clock = std::make_shared<ManualClock>(5000);
     std::shared_ptr<test::FakeTransport> fake = std::make_shared<test::FakeTransport>();
     MeterDll session{fake};
     METER_REC rec{};
-    std::vector<int> raised;
     std::vector<std::int16_t> ports;  // what find_meter was asked to search
 
-    void SetUp() override {
-        setThreadClock(clock);
-        SetContinueFlag(true);
-        session.onProgress = [this](std::int16_t& p) { raised.push_back(p); };
-    }
+    void SetUp() override { setThreadClock(clock); }
     void TearDown() override { setThreadClock(nullptr); }
     // The meter on port 3 identifies itself with this type and serial number.
     void meterAnswers(std::int16_t type, const char* serial) {
         auto identify = [=](FakeArgs& a) {
             a.rec->M_Type = type;
-            putSerial(*a.rec, serial);
+            TextToBytes(a.rec->Serial_number, serial);
             a.rec->port.com_number = 3;
         };
         fake->does("vb_Chk4Meter", identify).does("find_meter", [=, this](FakeArgs& a) {
@@ -74,31 +62,25 @@ TEST_F(Session, CheckWaitsBeforeAskingAndInitReturnsTheFirmwareCode) {
     EXPECT_EQ(clock->tickCount(), 5100u);
 
     fake->returns("vb_Get_Meter_Firmware", {ME_TIME_OUT});
-    for (int type : {8, 0, 9}) {
-        rec.M_Type = static_cast<std::int16_t>(type);
-        EXPECT_EQ(session.initMeter(rec), type == 8 ? ME_TIME_OUT : 0);
-        EXPECT_STREQ(session.Meter()->className(), type == 8 ? "clsParvix" : "clsCVMorvex");
-    }
+    rec.M_Type = eParvix;
+    EXPECT_EQ(session.initMeter(rec), ME_TIME_OUT);
+    EXPECT_STREQ(session.Meter()->className(), "clsParvix");
 }
 
-TEST_F(Session, ValuesHandleAndFlagsComeFromTheStoredRecordAndCloseActsOnTheCallers) {
-    rec.Plasma_cal_flag = 1;
-    rec.Checkstrip_range_upper_limit = 137;
-    putSerial(rec, "A1");
+TEST_F(Session, HandleAndFlagsComeFromTheStoredRecordAndCloseActsOnTheCallers) {
+    TextToBytes(rec.Serial_number, "A1");
     session.initMeter(rec);
-    EXPECT_EQ(session.Calibration(), 1);
-    EXPECT_EQ(session.CheckStripHigh(), 137);
-    for (auto [id, handle] : {std::pair{0, 0}, {-1, 0}, {0x4003, 0x4003}}) {
-        session.meterFns().MeterRec.port.Id = id;
+    for (auto [id, handle] : {std::pair{0, 0}, {-1, 0}, {1, 1}, {0x4003, 0x4003}}) {
         std::int32_t h = 99;
+        session.meterFns().MeterRec.port.Id = id;
         session.GetHandle(h);
-        EXPECT_EQ(h, handle);
+        EXPECT_EQ(h, handle) << id;
     }
     fake->does("GetInitializedFlag", [](FakeArgs& a) { a.ref<std::int16_t>() = a.rec->Error_code = 1; });
     EXPECT_EQ(session.DevInitialised(), 1);
     EXPECT_EQ(session.storedRecord().Error_code, 0);
     // The same meter is the one with exactly the same serial number.
-    fake->does("vb_Chk4Meter", [](FakeArgs& a) { putSerial(*a.rec, "a1"); });
+    fake->does("vb_Chk4Meter", [](FakeArgs& a) { TextToBytes(a.rec->Serial_number, "a1"); });
     EXPECT_FALSE(session.isSameMeterConnected());
 
     const std::uint32_t start = clock->tickCount();
@@ -112,6 +94,8 @@ TEST_F(Session, ValuesHandleAndFlagsComeFromTheStoredRecordAndCloseActsOnTheCall
 }
 
 TEST_F(Session, EraseRelaysTheWorkingRecordsProgressAndStopsTheTimerOnEveryExit) {
+    std::vector<int> raised;
+    session.onProgress = [&](std::int16_t& p) { raised.push_back(p); };
     fake->does("vb_Clear_Meter_Datalog", [&](FakeArgs& a) {
         for (std::int16_t p : {30, 60, 100}) {
             a.rec->Percent_done = p;

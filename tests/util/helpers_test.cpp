@@ -5,6 +5,7 @@
 #include <thread>
 
 #include "util/helpers.h"
+#include "varnel/unique_checker.h"
 
 using namespace varnel::detail;
 
@@ -24,11 +25,10 @@ TEST(ToNumber, CDecimalSyntaxWithBlanksAroundAndNothingElse) {
 TEST(ByteTexts, ReadStopsAtZeroOrCountAndWritesStopTwoShortOfTheEnd) {
     const std::uint8_t abc[] = {'A', 'B', 0, 'C'};
     EXPECT_EQ(BytesToText(abc, 4), "AB");
-    const std::uint8_t full[20] = {'0', '1', '2', '3', '4', '5', '6', '7', '8', '9',
-                                   'a', 'b', 'c', 'd', 'e', 'f', 'g', 'h', 'i', 'j'};
-    EXPECT_EQ(BytesToText(full, 20), "0123456789abcdefghij");
+    const std::uint8_t full[] = {'0', '1', '2', '3', '4'};  // no zero byte at all
+    EXPECT_EQ(BytesToText(full, 5), "01234");
     EXPECT_EQ(BytesToText(full, 3), "012");
-    EXPECT_EQ(BytesToText(std::span(full).first(5), 20), "01234");  // count beyond the array
+    EXPECT_EQ(BytesToText(full, 20), "01234");  // count beyond the array
     EXPECT_EQ(BytesToText(full, -1), "");
 
     std::uint8_t name[10];
@@ -104,4 +104,18 @@ TEST(MinMaxDates, RangesByMeterType) {
         EXPECT_EQ(lo, y0 ? DateTime::fromParts(y0, 1, 1)->dayNumber() : 7) << type;
         EXPECT_EQ(hi, y1 ? DateTime::fromParts(y1, 12, 31)->dayNumber() : 8) << type;
     }
+}
+
+TEST(UniqueChecker, FoldsAsciiCaseKeepsOrderAndClears) {
+    varnel::UniqueChecker checker;
+    for (auto [text, added] : {std::pair{"abc", true}, {"ABC", false}, {"aBc", false}, {"abc ", true},
+                               {"\xC3\xA9", true}, {"\xC3\x89", true}, {"", true}, {"", false}})
+        EXPECT_EQ(checker.AddValue(text), added) << text;  // bytes beyond ASCII compare exactly
+    EXPECT_EQ(checker.Values(), (std::vector<std::string>{"abc", "abc ", "\xC3\xA9", "\xC3\x89", ""}));
+
+    checker.Clear();
+    EXPECT_EQ(checker.Count(), 0u);
+    EXPECT_TRUE(checker.AddValue("ABC"));
+    EXPECT_FALSE(checker.AddValue("abc"));
+    EXPECT_EQ(checker.Values(), std::vector<std::string>{"ABC"});
 }

@@ -1,10 +1,46 @@
 #include <gtest/gtest.h>
 
+#include <cmath>
 #include <map>
+#include <stdexcept>
 
+#include "component/err_propagator.h"
 #include "component/error_description.h"
+#include "support/wrapper_fixture.h"
 
-using varnel::detail::ErrorDescription;
+using namespace varnel;
+using namespace varnel::detail;
+
+TEST(ErrPropagator, TraceGrowsOutermostFirstAndCleanupSeesIt) {
+    std::string seen;
+    const std::string trace = test::unexpectedTrace([&] {
+        guarded("A", "outer", [&] {
+            guarded("B", "mid", [] { guarded("C", "inner", [] { throw std::out_of_range("x"); }); },
+                    [&](const IError& e) { seen = e.ErrorTrace; });
+        });
+    });
+    EXPECT_EQ(trace, std::to_string(errc::subscript_out_of_range) + " outer --> mid --> inner --> ");
+    EXPECT_EQ(seen, "mid --> inner --> ");
+    // The shared error holds the latest routine, with the inner trace as its description.
+    const IError& e = errPropagator().error();
+    EXPECT_EQ(e.ErrorDesc, "mid --> inner --> ");
+    EXPECT_EQ(e.FunctionName, "outer");
+    EXPECT_TRUE(e.ClassName.empty());
+
+    // Started afresh, the next trace does not carry this one.
+    EXPECT_EQ(test::unexpectedTrace([] { guarded("X", "getReadings", [] { raise(errc::missing_object, "boom"); }); }),
+              std::to_string(errc::missing_object) + " getReadings --> ");
+}
+
+TEST(Rounding, HalvesToEvenAndOverflowRaises) {
+    for (auto [value, rounded] : {std::pair{12.5, 12}, {13.5, 14}, {-2.5, -2}, {32767.4, 32767}, {-32768.5, -32768}})
+        EXPECT_EQ(roundToInt16(value), rounded) << value;
+    EXPECT_EQ(roundToInt32(2147483647.4), 2147483647);
+    const std::string overflow = std::to_string(errc::overflow) + " Overflow";
+    for (auto raises : {+[] { roundToInt16(32767.5); }, +[] { roundToInt16(NAN); }, +[] { toInt16(-32769); },
+                        +[] { toInt16(40000); }, +[] { roundToInt32(2147483647.5); }})
+        EXPECT_EQ(test::unexpectedTrace(raises), overflow);
+}
 
 TEST(ErrorDescription, EveryListedCodeHasItsTextAndNoOtherCodeHasOne) {
     const std::map<long long, const char*> texts = {

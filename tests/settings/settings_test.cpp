@@ -1,10 +1,15 @@
 #include <gtest/gtest.h>
 
+#include <map>
+
 #include "component/err_propagator.h"
 #include "settings/clock_group.h"
 #include "settings/general_group.h"
 #include "settings/medication_groups.h"
+#include "settings/meter_settings.h"
 #include "settings/schedule_group.h"
+#include "settings/setup_option.h"
+#include "settings/targets_group.h"
 #include "support/fake_transport.h"
 #include "support/sim_session.h"
 #include "support/wrapper_fixture.h"
@@ -17,6 +22,12 @@ namespace {
 using Groups = test::SimSession;
 
 DateTime at(int y, int mo, int d, int h = 0, int mi = 0, int s = 0) { return *DateTime::fromParts(y, mo, d, h, mi, s); }
+
+// The number and trace of the error a call raised, and the class its handler named.
+template <class F>
+std::string failure(F&& call) {
+    return test::unexpectedTrace(call) + " in " + errPropagator().ClassName;
+}
 
 template <class G>
 G initialised(clsMeterFns& fns) {
@@ -45,38 +56,7 @@ TEST_F(Groups, ClockSavesReadsAndWindowsTheYear) {
     EXPECT_EQ(clock.ClockInSeconds, 1);
 }
 
-TEST_F(Groups, GeneralOptionsComeFromTheMeterAndValuesAreRoundedHalfToEven) {
-    sim::MeterProfile p = sim::defaultProfile(eMorvex);
-    p.options[eStripCalCode] = {2, 5, 0, 50};
-    p.options[eLanguage] = {};
-    connect(p);
-    auto general = initialised<Group_General>(*fns);
-    ASSERT_EQ(general.readFromMeter(), 0);
-    EXPECT_EQ(general.OptionByKey(eLanguage), nullptr);
-    int offered = 0;
-    for (const sim::OptionEntry& o : p.options) offered += o.availability != 0;
-    ASSERT_EQ(general.Count(), offered);
-    auto code = general.OptionByIndex(1);
-    EXPECT_EQ(code, general.OptionByKey(eStripCalCode));
-    EXPECT_EQ(std::get<std::int32_t>(code->Value()), 5);
-    EXPECT_TRUE(code->isModified);
-
-    // Everything just read is written back unchanged.
-    ASSERT_EQ(general.saveToMeter(), 0);
-    EXPECT_EQ(sim::meter().options, p.options);
-    for (auto [text, sent] : {std::pair{"12.5", 12}, {" 13.5 ", 14}, {"abc", 0}}) {
-        code->setValue(std::string(text));
-        ASSERT_EQ(general.saveToMeter(), 0) << text;
-        EXPECT_EQ(sim::meter().options[eStripCalCode].value, sent) << text;
-    }
-
-    sim::injectFault("vb_Read_Meter_Options", 1, ME_COM_ERROR, false);
-    EXPECT_EQ(general.readFromMeter(), ME_COM_ERROR);
-    EXPECT_EQ(general.Count(), offered);
-    EXPECT_EQ(general.OptionByKey(eStripCalCode), code);
-}
-
-TEST(GeneralGroup, AvailabilityCodesSentFollowTheOptions) {
+TEST(GeneralGroup, OptionsComeFromTheMeterAndWritesFollowTheirCodes) {
     auto fake = std::make_shared<test::FakeTransport>();
     clsMeterFns fns(fake);
     fake->does("vb_Read_Meter_Options", [](test::FakeArgs& a) {
@@ -84,22 +64,38 @@ TEST(GeneralGroup, AvailabilityCodesSentFollowTheOptions) {
         s = SETTINGS_REC{};
         s.Availability[1] = 1, s.nValue[1] = 4;
         s.Availability[2] = 2, s.nValue[2] = 1;
-        s.Availability[5] = 2, s.nValue[5] = 0;
+        s.Availability[5] = 2, s.nValue[5] = 3;
         s.Availability[20] = 2;  // beyond the nineteen options
     });
-    SETTINGS_REC sent{};
-    fake->does("vb_Set_Meter_Options", [&](test::FakeArgs& a) { sent = a.ref<SETTINGS_REC>(); });
+    using Sent = std::map<int, std::pair<int, int>>;  // option: availability code and value, when either is set
+    Sent sent;
+    fake->does("vb_Set_Meter_Options", [&](test::FakeArgs& a) {
+        const SETTINGS_REC& s = a.ref<SETTINGS_REC>();
+        sent.clear();
+        for (int i = 0; i < 22; ++i)
+            if (s.Availability[i] || s.nValue[i]) sent[i] = {s.Availability[i], s.nValue[i]};
+    });
     auto general = initialised<Group_General>(fns);
     ASSERT_EQ(general.readFromMeter(), 0);
     ASSERT_EQ(general.Count(), 3);
-    general.OptionByKey(2)->isModified = false;
-    general.OptionByKey(5)->setValue(-2.5);
+    EXPECT_EQ(general.OptionByIndex(3), general.OptionByKey(5));
+    // What was just read counts as modified: a save writes it back as it is.
     ASSERT_EQ(general.saveToMeter(), 0);
-    std::vector<int> codes(sent.Availability, sent.Availability + 22), values(sent.nValue, sent.nValue + 22);
-    std::vector<int> wantCodes(22, 0), wantValues(22, 0);
-    wantCodes[1] = 1, wantCodes[5] = 2, wantValues[5] = -2;
-    EXPECT_EQ(codes, wantCodes);
-    EXPECT_EQ(values, wantValues);
+    EXPECT_EQ(sent, (Sent{{1, {1, 0}}, {2, {2, 1}}, {5, {2, 3}}}));
+
+    general.OptionByKey(2)->isModified = false;
+    for (auto [value, written] : {std::pair{Variant(-2.5), -2}, {Variant(std::string(" 13.5 ")), 14},
+                                  {Variant(std::string("abc")), 0}}) {
+        general.OptionByKey(5)->setValue(value);
+        ASSERT_EQ(general.saveToMeter(), 0);
+        EXPECT_EQ(sent, (Sent{{1, {1, 0}}, {5, {2, written}}})) << written;
+    }
+
+    const auto kept = general.OptionByKey(5);
+    fake->returns("vb_Read_Meter_Options", {ME_COM_ERROR});
+    EXPECT_EQ(general.readFromMeter(), ME_COM_ERROR);
+    EXPECT_EQ(general.Count(), 3);
+    EXPECT_EQ(general.OptionByKey(5), kept);
 }
 
 TEST_F(Groups, MedicationNamesRoundTripAndOnlyCustomChangesAreSent) {
@@ -111,7 +107,6 @@ TEST_F(Groups, MedicationNamesRoundTripAndOnlyCustomChangesAreSent) {
     ASSERT_EQ(insulins.readFromMeter(), 0);
     ASSERT_EQ(oralMeds.readFromMeter(), 0);
     EXPECT_EQ(insulins.InsulinName(13), "ABCDEFGHI");
-    EXPECT_EQ(oralMeds.OralMedName(6), p.oralMedNames[5].bytes);
 
     insulins.setInsulinName(12, "Twelve chars");
     insulins.setInsulinName(5, "Never");
@@ -166,15 +161,10 @@ TEST(TableGroups, PositionsOutsideTheTablesReadEmptyAndFailToWrite) {
     EXPECT_FALSE(oralMeds.OralMedNameChanged(16));
     EXPECT_EQ(insulins.FavInsulin(4), 0);
     EXPECT_EQ(schedule.ScheduleTime(8), DateTime::fromSerial(-36522));
-    for (auto [call, className, trace] :
-         {std::tuple<std::function<void()>, const char*, const char*>{
-              [&] { insulins.setInsulinName(22, "x"); }, "Group_Insulins", "InsulinName --> "},
-          {[&] { insulins.setFavInsulin(4, 1); }, "Group_Insulins", "FavInsulin --> "},
-          {[&] { oralMeds.isOralMedChangeable(16); }, "Group_OralMeds", "isOralMedChangeable --> "},
-          {[&] { schedule.setScheduleTime(8, DateTime()); }, "Group_Schedule", "ScheduleTime --> "}}) {
-        EXPECT_EQ(test::unexpectedTrace(call), std::to_string(errc::subscript_out_of_range) + " " + trace);
-        EXPECT_EQ(errPropagator().ClassName, className);
-    }
+    EXPECT_EQ(failure([&] { insulins.setInsulinName(22, "x"); }), "9 InsulinName -->  in Group_Insulins");
+    EXPECT_EQ(failure([&] { insulins.setFavInsulin(4, 1); }), "9 FavInsulin -->  in Group_Insulins");
+    EXPECT_EQ(failure([&] { oralMeds.isOralMedChangeable(16); }), "9 isOralMedChangeable -->  in Group_OralMeds");
+    EXPECT_EQ(failure([&] { schedule.setScheduleTime(8, DateTime()); }), "9 ScheduleTime -->  in Group_Schedule");
 }
 
 TEST(ScheduleGroup, KeepsQuarterHoursAndSendsZeroForUnchangedSegmentsAndOnlyTheSelectionForTypeZero) {
@@ -193,4 +183,53 @@ TEST(ScheduleGroup, KeepsQuarterHoursAndSendsZeroForUnchangedSegmentsAndOnlyTheS
     ASSERT_EQ(schedule.saveToMeter(), 0);
     EXPECT_EQ(fake->calls()[1].values, (std::vector<std::int32_t>{1}));
     EXPECT_EQ(std::vector<int>(sent.mealSegments, sent.mealSegments + 7), (std::vector<int>{0, 0, 30, 0, 0, 0, 0}));
+}
+
+TEST(SetupOption, NamesFollowTheOptionCodes) {
+    SetupOption o;
+    for (auto [key, name] : {std::pair{0, "StripCalCode"}, {11, "Insulinprompt"}, {16, "BOW"}, {18, "Pumpuse"},
+                             {19, ""}, {-1, ""}}) {
+        o.Key = key;
+        EXPECT_EQ(o.KeyName(), name) << key;
+    }
+}
+
+TEST(MeterSettings, KeepsInsertionOrderAndRefusesADuplicateGroup) {
+    MeterSettings settings;
+    auto targets = std::make_shared<Group_targets>();
+    EXPECT_EQ(settings.AddGroup(5, targets), targets);
+    settings.AddGroup(0, std::make_shared<Group_targets>());
+    EXPECT_EQ(settings.Item(1), nullptr);
+    std::vector<int> order;
+    for (const auto& [number, group] : settings) order.push_back(number);
+    EXPECT_EQ(order, (std::vector<int>{5, 0}));
+
+    EXPECT_EQ(failure([&] { settings.AddGroup(5, std::make_shared<Group_targets>()); }),
+              "51 AddGroup -->  in MeterSettings");
+    EXPECT_EQ(settings.Count(), 2);
+    EXPECT_EQ(settings.Item(5), targets);
+}
+
+TEST(SetupGroup, InterfaceReportsFailureAsTrueAndReturnsTheRecordsCode) {
+    Group_targets group;
+    EXPECT_EQ(failure([&] { group.ISetupGroup_saveToMeter(); }),
+              "91 ISetupGroup_saveToMeter --> saveToMeter -->  in Group_Targets");
+
+    auto fake = std::make_shared<test::FakeTransport>();
+    clsMeterFns fns(fake);
+    fns.MeterRec.port.com_number = 3;
+    EXPECT_FALSE(group.ISetupGroup_initialise(fns));
+    EXPECT_EQ(group.meterRec().port.com_number, 3);
+    EXPECT_FALSE(group.ISetupGroup_readFromMeter());
+    // A transport that fails without filling Error_code is still a failure.
+    fake->returns("SetTargetRange", {ME_COM_ERROR});
+    EXPECT_EQ(group.saveToMeter(), ME_COM_ERROR);
+
+    // A failed read gives the record's code and keeps the old limits.
+    fake->does("GetTargetRange", [](test::FakeArgs& a) { a.rec->Error_code = ME_TIME_OUT, a.ref<std::int16_t>(1) = 99; });
+    fake->returns("GetTargetRange", {ME_FAIL, ME_FAIL});
+    group.BefMealHighLimit = 140;
+    EXPECT_EQ(group.readFromMeter(), ME_TIME_OUT);
+    EXPECT_EQ(group.BefMealHighLimit, 140);
+    EXPECT_TRUE(group.ISetupGroup_readFromMeter());
 }

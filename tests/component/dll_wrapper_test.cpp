@@ -1,0 +1,154 @@
+#include <gtest/gtest.h>
+
+#include <algorithm>
+
+#include "component/dll_impl.h"
+#include "support/fake_transport.h"
+#include "support/wrapper_fixture.h"
+
+using namespace varnel;
+using namespace varnel::test;
+
+namespace {
+
+TEST(ProgressStage, StagesHalvesToEvenAndDroppedEvents) {
+    DllWrapper::Impl impl{std::make_shared<FakeTransport>()};
+    std::vector<int> raised;
+    impl.onProgress = [&](std::int16_t& p) { raised.push_back(p); };
+    auto raise = [&](std::initializer_list<std::int16_t> values) {
+        raised.clear();
+        for (std::int16_t v : values) impl.RaiseProgress(v);
+        return raised;
+    };
+    impl.PercentLimit(0);  // changes nothing
+    EXPECT_EQ(impl.PercentLimit(), 100);
+    impl.resetPercentage();
+    impl.PercentLimit(25);
+    EXPECT_EQ(raise({50, 54, 0, -5}), (std::vector<int>{12, 14}));
+    impl.PercentLimit(100);
+    EXPECT_EQ(raise({1, 50, 100}), (std::vector<int>{26, 63, 100}));
+    impl.resetPercentage();
+    impl.PercentLimit(100);
+    EXPECT_EQ(raise({327, 328}), std::vector<int>{327});  // 100 x 328 overflows 16 bits
+    impl.onProgress = [](std::int16_t&) { throw std::runtime_error("client"); };
+    EXPECT_NO_THROW(impl.RaiseProgress(10));
+}
+
+struct Requests : WrapperTest {
+    // clearMeter with the device information given; the meter's own serial number and type where left empty.
+    std::int32_t clear(const std::string& port = "1", std::string sn = "", std::string type = "") {
+        XMLWrapper doc = deviceDoc(port, sn.empty() ? sim::meter().serial : sn,
+                                   type.empty() ? std::to_string(sim::meter().type) : type);
+        return wrapper->clearMeter(rec, doc, status);
+    }
+};
+
+TEST_F(Requests, EraseEmptiesTheMeterReportingItsOwnStage) {
+    discover(eCVPellis);
+    EXPECT_EQ(clear(), ME_SUCCESS);
+    EXPECT_TRUE(sim::meter().datalog.empty());
+    EXPECT_TRUE(statusGroups(status).empty());
+    EXPECT_EQ(completions, 1);
+    EXPECT_FALSE(closed());
+    EXPECT_FALSE(detail::frmTimer().tmrStatus().enabled());
+    // 1.5 s of erasing, ticks every 0.4 s; a fresh DllWrapper's first stage starts at 0.
+    ASSERT_GE(progress.size(), 3u);
+    EXPECT_TRUE(std::is_sorted(progress.begin(), progress.end()));
+    EXPECT_GT(progress.front(), 0);
+    EXPECT_LT(progress.front(), 50);
+}
+
+TEST_F(Requests, FailedEraseClosesUnlessToldToKeepTheMeter) {
+    discover(eDunmark);
+    for (std::int16_t keep : {0, -50}) {
+        sim::injectFault("vb_Clear_Meter_Datalog", 1, ME_TIME_OUT, false);
+        fresh();
+        rec.Error_code = keep;
+        EXPECT_EQ(clear(), ME_TIME_OUT);
+        EXPECT_EQ(statusGroups(status), std::vector<std::string>{"-17/-2/Timeout error"});
+        EXPECT_EQ(completions, 1);
+        EXPECT_EQ(closed(), keep != -50);
+        EXPECT_FALSE(detail::frmTimer().tmrStatus().enabled());
+    }
+    EXPECT_FALSE(sim::meter().datalog.empty());
+}
+
+TEST_F(Requests, ErasesThatFailWithoutACodeOrRaiseAreFailures) {
+    auto fake = std::make_shared<FakeTransport>();
+    fake->does("vb_Chk4Meter", [](FakeArgs& a) { a.rec->M_Type = 3; });
+    fake->returns("vb_Clear_Meter_Datalog", {ME_FAIL});  // Error_code stays 0
+    DllWrapper own(fake);
+    rec.Serial_number[0] = 'S';
+    XMLWrapper doc = deviceDoc("1", "S", "3");
+    EXPECT_EQ(own.clearMeter(rec, doc, status), ME_FAIL);
+    EXPECT_EQ(statusGroups(status), std::vector<std::string>{"-17/-17/Operation failed"});
+
+    // An error below the request keeps its chain of routines.
+    fresh();
+    fake->does("vb_Clear_Meter_Datalog", [](FakeArgs&) { detail::raise(errc::overflow, "Overflow"); });
+    EXPECT_EQ(unexpectedTrace([&] { own.clearMeter(rec, doc, status); }), "6 doAction --> clearMeter --> ");
+    EXPECT_EQ(statusGroups(status),
+              std::vector<std::string>{"-17/-16/Unknown status;Error number = 6 Error description = clearMeter --> /0"});
+}
+
+TEST_F(Requests, CloseReleasesThePortQuietly) {
+    discover(eCorviaZenta);
+    EXPECT_EQ(wrapper->closeMeter(rec), ME_SUCCESS);
+    EXPECT_FALSE(sim::portOpen());
+    EXPECT_EQ(completions, 0);
+
+    auto fake = std::make_shared<FakeTransport>();
+    fake->does("close_meter", [](FakeArgs&) { detail::raise(errc::internal, "port stuck"); });
+    DllWrapper own(fake);
+    own.setOnComplete([this] { ++completions; });
+    rec.Error_code = -50;  // closeMeter closes whatever the record says
+    EXPECT_EQ(unexpectedTrace([&] { own.closeMeter(rec); }), "51 doAction --> MeterClose --> ");
+    EXPECT_EQ(completions, 1);
+    EXPECT_EQ(std::ranges::count(fake->names(), "close_meter"), 2);  // tried again by the handler
+}
+
+// The checks every request makes on the device information, through clearMeter.
+TEST_F(Requests, DeviceInformationChecksAndUnexpectedErrors) {
+    discover(eDunmark);
+    const std::string bad = "-17/-19/Bad parameter passed to the function ; ";
+    struct Case {
+        std::string port, sn, type;
+        std::int32_t result;
+        std::string group;  // "" for none
+    };
+    for (const Case& c : {
+             Case{"abc", "dnm3001296", "3.0", 0, ""},  // a port that is no number is port 0; case is ignored
+             Case{"1", "", "0", ME_BAD_PARAMETER, bad + "Device Type from Device Info XML is invalid"},
+             // A type that is no whole number is compared as it is, not rounded.
+             Case{"1", "", "3.5", ME_FAIL, "-8/-8/Different device detected ; Device Type from Device Info XML - 3.5 "
+                                           "Device Type from device - 3 do not match"},
+         }) {
+        SCOPED_TRACE(c.port + "|" + c.sn + "|" + c.type);
+        fresh();
+        EXPECT_EQ(clear(c.port, c.sn, c.type), c.result);
+        EXPECT_EQ(statusGroups(status), c.group.empty() ? std::vector<std::string>{} : std::vector{c.group});
+        EXPECT_EQ(completions, 1);
+        EXPECT_FALSE(closed());
+    }
+    // A meter that does not answer ends the request without onComplete.
+    sim::detach();
+    fresh();
+    EXPECT_EQ(clear(), ME_NO_DEVICE);
+    EXPECT_EQ(statusGroups(status), std::vector<std::string>{"-17/-13/No device found"});
+    EXPECT_EQ(completions, 0);
+
+    // Unexpected errors are reported, close, complete and reach the client.
+    XMLWrapper noPortInfo = newDoc(doc_kind::status);
+    for (std::int16_t keep : {0, -50}) {
+        fresh();
+        rec.Error_code = keep;
+        EXPECT_EQ(unexpectedTrace([&] { wrapper->clearMeter(rec, noPortInfo, status); }), "91 doAction --> ");
+        ASSERT_EQ(statusGroups(status).size(), 1u);
+        EXPECT_TRUE(statusGroups(status)[0].starts_with("-17/-16/Unknown status;Error number = 91 Error description = "));
+        EXPECT_TRUE(statusGroups(status)[0].ends_with("/0"));
+        EXPECT_EQ(completions, 1);
+        EXPECT_EQ(closed(), keep != -50);
+    }
+}
+
+}  // namespace
