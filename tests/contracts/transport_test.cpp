@@ -1,12 +1,16 @@
+// Calling through a transport library loaded by path: every function with its
+// arguments, what is missing, and the caller's messages while the library yields.
 #include <gtest/gtest.h>
 
 #include <dlfcn.h>
 
 #include <algorithm>
-#include <cstring>
+#include <array>
 #include <functional>
+#include <initializer_list>
 #include <stdexcept>
 #include <string>
+#include <vector>
 
 #include "contracts/transport.h"
 #include "platform/message_pump.h"
@@ -24,21 +28,19 @@ namespace {
 struct Recorder {
     void* handle = dlopen(RECORDING_TRANSPORT_FULL, RTLD_NOW);
     ~Recorder() { dlclose(handle); }
-    std::string lastName() const {
-        return reinterpret_cast<const char* (*)()>(dlsym(handle, "recording_transport_last_name"))();
-    }
-    std::int32_t lastValue(int i) const {
-        return reinterpret_cast<std::int32_t (*)(int)>(dlsym(handle, "recording_transport_last_value"))(i);
-    }
+    const char* const& name = *static_cast<const char**>(dlsym(handle, "last_name"));
+    const std::int32_t* values = static_cast<const std::int32_t*>(dlsym(handle, "last_values"));
 };
 
-ComponentError failureOf(const std::function<void()>& call) {
+// Expects `call` to raise transport_unavailable with a description naming each of `mentions`.
+void expectUnavailable(const std::function<void()>& call, std::initializer_list<std::string> mentions) {
     try {
         call();
+        ADD_FAILURE() << "no error";
     } catch (const ComponentError& e) {
-        return e;
+        EXPECT_EQ(e.number(), errc::transport_unavailable);
+        for (const std::string& m : mentions) EXPECT_NE(e.description().find(m), std::string::npos) << e.description();
     }
-    throw std::logic_error("no error raised");
 }
 
 TEST(TransportLoading, EveryFunctionIsReachedByNameWithItsArguments) {
@@ -55,72 +57,67 @@ TEST(TransportLoading, EveryFunctionIsReachedByNameWithItsArguments) {
     RECORD_DATA data{};
     static METER_DATALOG datalog{};
     std::int32_t found[11]{}, seconds = 0;
-    std::int16_t ports[11]{3}, flag = 0, t1 = 0, t2 = 0, t3 = 0, t4 = 0, t5 = 0;
+    std::int16_t ports[11]{3, 4}, flag = 0, selection = 0;
+    std::array<std::int16_t, 5> range{};
+    time.sec = 7, time.min = 8, name.index = 6;  // for the library to read
 
+    // In the library's order, so the codes run from -101 down.
     struct Case {
         const char* name;
         std::function<std::int32_t()> call;
+        std::array<std::int32_t, 5> args;
     };
     const Case cases[] = {
-        {"initialize_meter_structure", [&] { return t->initialize_meter_structure(rec); }},
-        {"find_meter", [&] { return t->find_meter(rec, found, ports); }},
-        {"initialize_meter_type_structure", [&] { return t->initialize_meter_type_structure(rec, 7); }},
-        {"vb_Chk4Meter", [&] { return t->vb_Chk4Meter(rec); }},
-        {"vb_Get_Meter_Firmware", [&] { return t->vb_Get_Meter_Firmware(rec); }},
-        {"vb_Tickle_Meter", [&] { return t->vb_Tickle_Meter(rec); }},
-        {"close_meter", [&] { return t->close_meter(rec); }},
-        {"vb_Clear_Meter_Datalog", [&] { return t->vb_Clear_Meter_Datalog(rec); }},
-        {"vb_Read_Meter_Options", [&] { return t->vb_Read_Meter_Options(rec); }},
-        {"vb_Read_Meter_Option", [&] { return t->vb_Read_Meter_Option(rec, 4); }},
-        {"vb_Set_Meter_Option", [&] { return t->vb_Set_Meter_Option(rec, 4, 9); }},
-        {"vb_Set_Meter_Options", [&] { return t->vb_Set_Meter_Options(rec, settings); }},
-        {"vb_Read_Meter_Clock", [&] { return t->vb_Read_Meter_Clock(rec, seconds); }},
-        {"vb_Set_Meter_Clock", [&] { return t->vb_Set_Meter_Clock(rec, 86400); }},
-        {"convert_to_seconds", [&] { return t->convert_to_seconds(time); }},
-        {"convert_from_seconds", [&] { return t->convert_from_seconds(125, time); }},
-        {"GetInitializedFlag", [&] { return t->GetInitializedFlag(rec, flag); }},
-        {"SetInitializedFlag", [&] { return t->SetInitializedFlag(rec, 1); }},
-        {"GetInsulinName", [&] { return t->GetInsulinName(rec, name); }},
-        {"SetInsulinName", [&] { return t->SetInsulinName(rec, name); }},
-        {"GetOralMedicationName", [&] { return t->GetOralMedicationName(rec, name); }},
-        {"SetOralMedicationName", [&] { return t->SetOralMedicationName(rec, name); }},
-        {"GetPredefinedInsulins", [&] { return t->GetPredefinedInsulins(rec, insulins); }},
-        {"SetPredefinedInsulins", [&] { return t->SetPredefinedInsulins(rec, insulins); }},
-        {"GetPredefinedOralMeds", [&] { return t->GetPredefinedOralMeds(rec, meds); }},
-        {"SetPredefinedOralMeds", [&] { return t->SetPredefinedOralMeds(rec, meds); }},
-        {"GetMealSegments", [&] { return t->GetMealSegments(rec, segments); }},
-        {"SetMealSegments", [&] { return t->SetMealSegments(rec, segments); }},
-        {"GetScheduleSelection", [&] { return t->GetScheduleSelection(rec, flag); }},
-        {"SetScheduleSelection", [&] { return t->SetScheduleSelection(rec, 2); }},
-        {"GetTargetRange", [&] { return t->GetTargetRange(rec, t1, t2, t3, t4, t5); }},
-        {"SetTargetRange", [&] { return t->SetTargetRange(rec, 70, 140, 80, 180, 60); }},
-        {"GetMeterDatalog", [&] { return t->GetMeterDatalog(rec, bin, 5000); }},
-        {"GetMeterDatalogRecordData", [&] { return t->GetMeterDatalogRecordData(bin, 12, data); }},
-        {"vb_Upload_Meter_Datalog", [&] { return t->vb_Upload_Meter_Datalog(rec, datalog); }},
+        {"initialize_meter_structure", [&] { return t->initialize_meter_structure(rec); }, {}},
+        {"find_meter", [&] { return t->find_meter(rec, found, ports); }, {3, 4}},
+        {"initialize_meter_type_structure", [&] { return t->initialize_meter_type_structure(rec, 7); }, {7}},
+        {"vb_Chk4Meter", [&] { return t->vb_Chk4Meter(rec); }, {}},
+        {"vb_Get_Meter_Firmware", [&] { return t->vb_Get_Meter_Firmware(rec); }, {}},
+        {"vb_Tickle_Meter", [&] { return t->vb_Tickle_Meter(rec); }, {}},
+        {"close_meter", [&] { return t->close_meter(rec); }, {}},
+        {"vb_Clear_Meter_Datalog", [&] { return t->vb_Clear_Meter_Datalog(rec); }, {}},
+        {"vb_Read_Meter_Options", [&] { return t->vb_Read_Meter_Options(rec); }, {}},
+        {"vb_Read_Meter_Option", [&] { return t->vb_Read_Meter_Option(rec, 4); }, {4}},
+        {"vb_Set_Meter_Option", [&] { return t->vb_Set_Meter_Option(rec, 4, 9); }, {4, 9}},
+        {"vb_Set_Meter_Options", [&] { return t->vb_Set_Meter_Options(rec, settings); }, {}},
+        {"vb_Read_Meter_Clock", [&] { return t->vb_Read_Meter_Clock(rec, seconds); }, {}},
+        {"vb_Set_Meter_Clock", [&] { return t->vb_Set_Meter_Clock(rec, 86400); }, {86400}},
+        {"convert_to_seconds", [&] { return t->convert_to_seconds(time); }, {7, 8}},
+        {"convert_from_seconds", [&] { return t->convert_from_seconds(125, time); }, {125}},
+        {"GetInitializedFlag", [&] { return t->GetInitializedFlag(rec, flag); }, {}},
+        {"SetInitializedFlag", [&] { return t->SetInitializedFlag(rec, 5); }, {5}},
+        {"GetInsulinName", [&] { return t->GetInsulinName(rec, name); }, {}},
+        {"SetInsulinName", [&] { return t->SetInsulinName(rec, name); }, {6}},
+        {"GetOralMedicationName", [&] { return t->GetOralMedicationName(rec, name); }, {}},
+        {"SetOralMedicationName", [&] { return t->SetOralMedicationName(rec, name); }, {6}},
+        {"GetPredefinedInsulins", [&] { return t->GetPredefinedInsulins(rec, insulins); }, {}},
+        {"SetPredefinedInsulins", [&] { return t->SetPredefinedInsulins(rec, insulins); }, {}},
+        {"GetPredefinedOralMeds", [&] { return t->GetPredefinedOralMeds(rec, meds); }, {}},
+        {"SetPredefinedOralMeds", [&] { return t->SetPredefinedOralMeds(rec, meds); }, {}},
+        {"GetMealSegments", [&] { return t->GetMealSegments(rec, segments); }, {}},
+        {"SetMealSegments", [&] { return t->SetMealSegments(rec, segments); }, {}},
+        {"GetScheduleSelection", [&] { return t->GetScheduleSelection(rec, selection); }, {}},
+        {"SetScheduleSelection", [&] { return t->SetScheduleSelection(rec, 3); }, {3}},
+        {"GetTargetRange",
+         [&] { return t->GetTargetRange(rec, range[0], range[1], range[2], range[3], range[4]); }, {}},
+        {"SetTargetRange", [&] { return t->SetTargetRange(rec, 70, 140, 80, 180, 60); }, {70, 140, 80, 180, 60}},
+        {"GetMeterDatalog", [&] { return t->GetMeterDatalog(rec, bin, 5000); }, {5000}},
+        {"GetMeterDatalogRecordData", [&] { return t->GetMeterDatalogRecordData(bin, 12, data); }, {12}},
+        {"vb_Upload_Meter_Datalog", [&] { return t->vb_Upload_Meter_Datalog(rec, datalog); }, {}},
     };
     std::int32_t code = -101;
     for (const Case& c : cases) {
-        const std::int32_t result = c.call();
-        EXPECT_EQ(recorder.lastName(), c.name);
-        if (std::strcmp(c.name, "convert_to_seconds") == 0)
-            EXPECT_EQ(result, 100000 + time.sec);
-        else
-            EXPECT_EQ(result, code) << c.name;
-        --code;
+        SCOPED_TRACE(c.name);
+        EXPECT_EQ(c.call(), code--);
+        EXPECT_STREQ(recorder.name, c.name);
+        for (int i = 0; i < 5; ++i) EXPECT_EQ(recorder.values[i], c.args[i]) << "argument " << i;
     }
-    // Arguments arrive in order and results come back through the references.
-    cases[33].call();
-    EXPECT_EQ(recorder.lastValue(0), 12);
-    cases[1].call();
-    EXPECT_EQ(recorder.lastValue(0), 3);
-    cases[10].call();
-    EXPECT_EQ(recorder.lastValue(1), 9);
-    cases[31].call();
-    EXPECT_EQ(recorder.lastValue(3), 180);
-    EXPECT_EQ(recorder.lastValue(4), 60);
+    // Results come back through the references.
     EXPECT_EQ(seconds, 123456789);
     EXPECT_EQ(time.sec, 5);
-    EXPECT_EQ(t5, 5);
+    EXPECT_EQ(flag, 1);
+    EXPECT_EQ(selection, 2);
+    EXPECT_EQ(range, (std::array<std::int16_t, 5>{1, 2, 3, 4, 5}));
     EXPECT_STREQ(reinterpret_cast<const char*>(name.nameStr), "Rapid");
 }
 
@@ -128,31 +125,30 @@ TEST(TransportLoading, WhatIsMissingIsNamedOnFirstUse) {
     const std::string nowhere = "/nonexistent/libvantrix_nowhere.so";
     auto absent = loadTransport(nowhere);  // nothing is opened yet
     METER_REC rec{};
-    for (int attempt = 0; attempt < 2; ++attempt) {
-        ComponentError e = failureOf([&] { absent->vb_Chk4Meter(rec); });
-        EXPECT_EQ(e.number(), errc::transport_unavailable);
-        EXPECT_NE(e.description().find(nowhere), std::string::npos) << e.description();
-        EXPECT_NE(e.description().find("No such file"), std::string::npos) << e.description();
-    }
-
+    for (int attempt = 0; attempt < 2; ++attempt)  // a failed load is tried again
+        expectUnavailable([&] { absent->vb_Chk4Meter(rec); }, {nowhere, "No such file"});
     auto partial = loadTransport(RECORDING_TRANSPORT_NO_CHK4METER);
-    ComponentError e = failureOf([&] { partial->close_meter(rec); });
-    EXPECT_EQ(e.number(), errc::transport_unavailable);
-    EXPECT_NE(e.description().find("\"vb_Chk4Meter\""), std::string::npos) << e.description();
-
+    expectUnavailable([&] { partial->close_meter(rec); }, {RECORDING_TRANSPORT_NO_CHK4METER, "\"vb_Chk4Meter\""});
     TransportFunctions table{};
     table.initialize_meter_structure = [](METER_REC*) -> std::int16_t { return 0; };
-    e = failureOf([&] { makeTransport(table)->initialize_meter_structure(rec); });
-    EXPECT_NE(e.description().find("\"find_meter\""), std::string::npos) << e.description();
-
+    expectUnavailable([&] { makeTransport(table)->initialize_meter_structure(rec); }, {"\"find_meter\""});
     auto hookless = loadTransport(RECORDING_TRANSPORT_NO_YIELD_HOOK);  // the hook is optional
     EXPECT_EQ(hookless->vb_Clear_Meter_Datalog(rec), -108);
 }
 
+// A virtual clock, and Percent_done as each tick of the progress timer saw it.
 struct TransportYield : ::testing::Test {
     std::shared_ptr<ManualClock> clock = std::make_shared<ManualClock>();
-    void SetUp() override { setThreadClock(clock); }
+    METER_REC rec{};
+    std::vector<int> seen;
+    TimerConnection noting = frmTimer().tmrStatus().onTick([this] { seen.push_back(rec.Percent_done); });
+    void SetUp() override {
+        setThreadClock(clock);
+        varnel::sim::reset();
+    }
     void TearDown() override {
+        vx_set_yield_hook(nullptr, nullptr);  // the simulator's
+        varnel::sim::reset();
         frmTimer().disableTimer();
         setThreadClock(nullptr);
     }
@@ -160,9 +156,6 @@ struct TransportYield : ::testing::Test {
 
 TEST_F(TransportYield, DueTicksRunWhileTheLibraryYieldsAndTheirErrorsFollowTheCall) {
     auto t = loadTransport(RECORDING_TRANSPORT_FULL);
-    METER_REC rec{};
-    std::vector<int> seen;  // Percent_done as each tick saw it
-    auto connection = frmTimer().tmrStatus().onTick([&] { seen.push_back(rec.Percent_done); });
     frmTimer().enableTimer();
     clock->advance(500);
     EXPECT_EQ(t->vb_Clear_Meter_Datalog(rec), -108);
@@ -178,20 +171,13 @@ TEST_F(TransportYield, DueTicksRunWhileTheLibraryYieldsAndTheirErrorsFollowTheCa
     EXPECT_EQ(t->vb_Clear_Meter_Datalog(rec), -108);  // the error was reported once
 }
 
-}  // namespace
-
 TEST_F(TransportYield, TheSimulatorsLongOperationsDriveTheTimerThroughTheHook) {
-    varnel::sim::reset();
     varnel::sim::selectType(7);
     auto t = test::simTransport();
-    METER_REC rec{};
     std::int32_t found[11]{};
     std::int16_t ports[11]{1};
     t->initialize_meter_structure(rec);
     ASSERT_EQ(t->find_meter(rec, found, ports), ME_SUCCESS);
-
-    std::vector<int> seen;
-    auto connection = frmTimer().tmrStatus().onTick([&] { seen.push_back(rec.Percent_done); });
     frmTimer().enableTimer();
     const std::uint32_t start = clock->tickCount();
     METER_BIN_DATALOG datalog{};
@@ -200,6 +186,6 @@ TEST_F(TransportYield, TheSimulatorsLongOperationsDriveTheTimerThroughTheHook) {
     ASSERT_GE(took, 800u);
     EXPECT_NEAR(double(seen.size()), took / 400.0, 1.0);
     EXPECT_TRUE(std::is_sorted(seen.begin(), seen.end()));
-    vx_set_yield_hook(nullptr, nullptr);
-    varnel::sim::reset();
 }
+
+}  // namespace
