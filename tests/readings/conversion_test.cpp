@@ -3,27 +3,16 @@
 #include "component/err_propagator.h"
 #include "readings/meter_fns.h"
 #include "simulator.h"
-#include "support/fake_transport.h"
+#include "support/sim_transport.h"
 
 using namespace varnel;
 using namespace varnel::detail;
 
 namespace {
 
-// Meter time and binary records as the simulated meter encodes them.
-struct SimDecoding : test::FakeTransport {
-    std::int16_t convert_from_seconds(std::int32_t seconds, TIME_REC& time) override {
-        sim::fromSeconds(seconds, time);
-        return 0;
-    }
-    std::int16_t GetMeterDatalogRecordData(METER_BIN_DATALOG& log, std::int16_t i, RECORD_DATA& r) override {
-        return sim::decodeBinaryRecord(log, i, r);
-    }
-};
-
+// Conversions over the simulated meter's time conversion and binary record decoding.
 struct Conversion : ::testing::Test {
-    std::shared_ptr<SimDecoding> transport = std::make_shared<SimDecoding>();
-    clsMeterFns fns{transport};
+    clsMeterFns fns{test::simTransport()};
     ResultCollection results;
     std::string serial;
     std::int16_t type = 7;
@@ -34,8 +23,7 @@ struct Conversion : ::testing::Test {
 
     void add(std::int16_t recType, int day, auto fill) {
         RECORD_DATA& r = records.emplace_back();
-        r.recType = recType;
-        r.timeStamp = sim::secondsOf(2004, 3, day, 8, 30, 15);
+        r.recType = recType, r.timeStamp = sim::secondsOf(2004, 3, day, 8, 30, 15);
         r.Ordinal = static_cast<std::int16_t>(records.size());
         fill(r);
     }
@@ -44,20 +32,24 @@ struct Conversion : ::testing::Test {
         return fns.Fastmeterupload(serial, type, results, oralMeds, insulins);
     }
     template <class R>
-    R& at(int i) {
-        return dynamic_cast<R&>(*results.Item(i));
-    }
-    std::vector<std::int32_t> types() {
+    R& at(int i) { return dynamic_cast<R&>(*results.Item(i)); }
+    // One property of every result, in order.
+    std::vector<std::int32_t> column(std::int32_t (IResult::*property)() const = nullptr) {
         std::vector<std::int32_t> out;
-        for (const auto& r : results) out.push_back(dynamic_cast<Result&>(*r).ResultType());
-        return out;
-    }
-    std::vector<std::int32_t> groups() {
-        std::vector<std::int32_t> out;
-        for (const auto& r : results) out.push_back(r->GroupId());
+        for (const auto& r : results)
+            out.push_back(property ? ((*r).*property)() : dynamic_cast<Result&>(*r).ResultType());
         return out;
     }
 };
+
+using Types = std::vector<std::int32_t>;
+
+data_rec entry(std::int16_t dType, std::int16_t tType, std::int16_t flags = 0, double medication = 0) {
+    data_rec r{};
+    r.D_Type = dType, r.D_Time = sim::secondsOf(2005, 6, 7, 21, 5, 9);
+    r.Test.T_Type = tType, r.Test.Flags = flags, r.Test.Result = 111, r.Test.Medication = medication;
+    return r;
+}
 
 }  // namespace
 
@@ -72,26 +64,24 @@ TEST_F(Conversion, BinaryRecordTypes) {
     add(32, 1, [](auto& r) { r.microalbumin = -2; });
     add(45, 1, [](auto& r) { r.ExerciseLevel = 1, r.exerciseDuration = 135; });
     add(52, 1, [](auto& r) { r.oldCalCode = 12, r.newCalCode = 7; });
+    add(31, 1, [](auto& r) { r.hbA1C = 6.8; });
+    add(20, 1, [](auto& r) { r.mealSegment = 4; });
     ASSERT_TRUE(convertBinary());
-    EXPECT_EQ(types(), (std::vector<std::int32_t>{11, 21, 70, 30, 41, 0, 122, 61, 2}));
+    EXPECT_EQ(column(), (Types{11, 21, 70, 30, 41, 0, 122, 61, 2, 80, 54}));
 
     auto& site = at<Glucose>(1);
-    EXPECT_EQ(site.Calibration(), 2);
-    EXPECT_EQ(site.Slot(), 3);
-    EXPECT_EQ(site.Value(), 123);
+    EXPECT_EQ(std::tuple(site.Calibration(), site.Slot(), site.Value()), std::tuple(2, 3, 123.0));
     EXPECT_EQ(site.DateTime(), *DateTime::fromParts(2004, 3, 1, 8, 30, 15));
     std::vector<std::int32_t> codes;
     for (const auto& c : *site.Comments()) codes.push_back(c->Id());
-    EXPECT_EQ(codes, (std::vector<std::int32_t>{10, 17, 15}));
+    EXPECT_EQ(codes, (Types{10, 17, 15}));
     EXPECT_EQ(at<Glucose>(2).Calibration(), 1);
-    EXPECT_EQ(at<OralMeds>(3).OralMedsName(), "Glipizide");
-    EXPECT_EQ(at<OralMeds>(3).Value(), 2.5);
+    EXPECT_EQ(std::tuple(at<OralMeds>(3).OralMedsName(), at<OralMeds>(3).Value()), std::tuple("Glipizide", 2.5));
     EXPECT_EQ(at<InsulinInjection>(4).InsulinName(), "Humalog");
-    EXPECT_EQ(at<Exercise>(8).Hours(), 2);
-    EXPECT_EQ(at<Exercise>(8).Minutes(), 15);
-    EXPECT_EQ(at<CalCode>(9).FromValue(), "12");
-    EXPECT_EQ(at<CalCode>(9).ToValue(), "7");
-    EXPECT_EQ(at<CalCode>(9).Ordinal(), 9);
+    EXPECT_EQ(std::tuple(at<Exercise>(8).Hours(), at<Exercise>(8).Minutes()), std::tuple(2, 15));
+    auto& code = at<CalCode>(9);
+    EXPECT_EQ(std::tuple(code.FromValue(), code.ToValue(), code.Ordinal()), std::tuple("12", "7", 9));
+    EXPECT_EQ(at<hbA1C>(10).Value(), 6.8);
 }
 
 TEST_F(Conversion, MissingValuesSnacksAndRanges) {
@@ -101,12 +91,11 @@ TEST_F(Conversion, MissingValuesSnacksAndRanges) {
     add(36, 1, [](auto& r) { r.weight = -1.0, r.height = 170.5; });
     add(34, 1, [](auto& r) { r.cholesterolTotal = 1001, r.cholesterolTriglyceride = 3000; });
     ASSERT_TRUE(convertBinary());
-    EXPECT_EQ(types(), (std::vector<std::int32_t>{50, 55, 57, 58, 101, 140, 150}));
-    EXPECT_EQ(at<Food>(1).MealSlot(), 3);
-    EXPECT_EQ(at<Food>(2).MealSlot(), 0);
+    EXPECT_EQ(column(), (Types{50, 55, 57, 58, 101, 140, 150}));
+    EXPECT_EQ(std::tuple(at<Food>(1).MealSlot(), at<Food>(2).MealSlot()), std::tuple(3, 0));
     EXPECT_EQ(at<BodyDimensions>(5).Value(), 170.5);
-    EXPECT_EQ(at<Cholestrol>(6).ValueInMeterRange(), 1);
-    EXPECT_EQ(at<Cholestrol>(7).ValueInMeterRange(), 3);
+    EXPECT_EQ(std::tuple(at<Cholestrol>(6).ValueInMeterRange(), at<Cholestrol>(7).ValueInMeterRange()),
+              std::tuple(1, 3));
 }
 
 TEST_F(Conversion, MealsAndCholesterolOfOneDateShareAGroup) {
@@ -122,11 +111,9 @@ TEST_F(Conversion, MealsAndCholesterolOfOneDateShareAGroup) {
     add(20, 7, [](auto& r) { r.carbs = 5, r.fats = -1; });
     add(21, 7, [](auto& r) { r.mealSegment = 4; });
     ASSERT_TRUE(convertBinary());
-    EXPECT_EQ(groups(), (std::vector<std::int32_t>{1, 1, 1, 1, 2, 2, 3, 3, 4, 4, 5, 5, 6, 6, 7, 7, 8}));
-    EXPECT_EQ(results.Item(2)->MeterGroupId(), 1);
-    EXPECT_EQ(results.Item(3)->MeterGroupId(), 2);
+    EXPECT_EQ(column(&IResult::GroupId), (Types{1, 1, 1, 1, 2, 2, 3, 3, 4, 4, 5, 5, 6, 6, 7, 7, 8}));
+    EXPECT_EQ(column(&IResult::MeterGroupId), (Types{1, 1, 2, 2, 3, 3, 4, 4, 5, 5, 6, 6, 7, 7, 8, 8, 9}));
     EXPECT_EQ(at<HealthNotes>(16).ResultType(), 172);
-    EXPECT_EQ(at<HealthNotes>(16).MeterGroupId(), 8);
     EXPECT_EQ(fns.unmatchedCount(), 1);
 }
 
@@ -138,9 +125,7 @@ TEST_F(Conversion, UndecodableRecordStopsWithEarlierResultsKept) {
     fns.binaryDatalog().maxRecordsForMeter = 500;
     EXPECT_FALSE(fns.Fastmeterupload(serial, type, results, oralMeds, insulins));
     EXPECT_EQ(results.Count(), 2);
-    EXPECT_EQ(fns.recordCount(), 4);
-    EXPECT_EQ(fns.corruptedCount(), 0);
-    EXPECT_EQ(fns.maxRecordsForMeter(), 500);
+    EXPECT_EQ(std::tuple(fns.recordCount(), fns.corruptedCount(), fns.maxRecordsForMeter()), std::tuple(4, 0, 500));
 }
 
 TEST_F(Conversion, MedicationOutsideTheNamesRaisesWithEarlierResultsKept) {
@@ -152,26 +137,11 @@ TEST_F(Conversion, MedicationOutsideTheNamesRaisesWithEarlierResultsKept) {
     EXPECT_EQ(results.Count(), 1);
 }
 
-namespace {
-
-data_rec entry(std::int16_t dType, std::int16_t tType, std::int16_t flags = 0, double medication = 0) {
-    data_rec r{};
-    r.D_Type = dType;
-    r.D_Time = sim::secondsOf(2005, 6, 7, 21, 5, 9);
-    r.Test.T_Type = tType;
-    r.Test.Flags = flags;
-    r.Test.Result = 111;
-    r.Test.Medication = medication;
-    return r;
-}
-
-}  // namespace
-
 TEST_F(Conversion, RecordDatalogRows) {
     METER_DATALOG& log = fns.recordDatalog();
-    data_rec rows[] = {entry(1, 9, 3),  entry(1, 2, 1),        entry(1, 0, 2),       entry(1, 5),
+    data_rec rows[] = {entry(1, 9, 3),        entry(1, 2, 1),        entry(1, 0, 2),     entry(1, 5),
                        entry(2, 13, 0, 12.5), entry(2, 12, 0, 3.25), entry(2, 4, 0, 6), entry(2, 4, 0, 0),
-                       entry(2, 15, 0, 5), entry(3, 0),        entry(1, 0)};
+                       entry(2, 15, 0, 5),    entry(3, 0),           entry(1, 0)};
     rows[2].Test.Sample_detected = 1;
     rows[2].Test.Event_code = 8;
     rows[10].Valid = 1;
@@ -179,16 +149,13 @@ TEST_F(Conversion, RecordDatalogRows) {
     log.recordCount = 11;
     log.ValidRecordCount = 10;
     ASSERT_TRUE(fns.NonFastmeterUpload(serial, type, results));
-    EXPECT_EQ(types(), (std::vector<std::int32_t>{0, 20, 10, 21, 50, 41, 30}));
-    EXPECT_EQ(fns.recordCount(), 11);
-    EXPECT_EQ(fns.corruptedCount(), 1);
+    EXPECT_EQ(column(), (Types{0, 20, 10, 21, 50, 41, 30}));
+    EXPECT_EQ(std::tuple(fns.recordCount(), fns.corruptedCount()), std::tuple(11, 1));
     EXPECT_EQ(at<Error>(1).Value(), 111);
     EXPECT_EQ(at<CheckStrip>(2).ValueInMeterRange(), 1);
     auto& glucose = at<Glucose>(3);
-    EXPECT_EQ(glucose.ValueInMeterRange(), 2);
-    EXPECT_EQ(glucose.Calibration(), 2);
+    EXPECT_EQ(std::tuple(glucose.ValueInMeterRange(), glucose.Calibration()), std::tuple(2, 2));
     EXPECT_NE(glucose.Comments()->Item("8"), nullptr);
-    EXPECT_EQ(glucose.DateTime(), *DateTime::fromParts(2005, 6, 7, 21, 5, 9));
     EXPECT_EQ(at<Food>(5).Value(), 12);
     EXPECT_EQ(at<InsulinPump>(6).Value(), 3.25);
     EXPECT_EQ(at<InsulinInjection>(7).InsulinName(), "Ultralente");
@@ -197,7 +164,7 @@ TEST_F(Conversion, RecordDatalogRows) {
 TEST_F(Conversion, RecordDatalogNeverReadsPastItsBuffer) {
     METER_DATALOG& log = fns.recordDatalog();
     std::fill(std::begin(log.DataLog), std::end(log.DataLog), entry(1, 0));
-    log.DataLog[3] = entry(1, 16);
+    log.DataLog[3] = entry(1, 16);  // a test type beyond the table
     log.recordCount = 5;
     EXPECT_THROW(fns.NonFastmeterUpload(serial, type, results), ComponentError);
     EXPECT_EQ(results.Count(), 3);
@@ -218,11 +185,9 @@ TEST_F(Conversion, RecordDatalogNeverReadsPastItsBuffer) {
 
 TEST_F(Conversion, TwoDigitYearWindow) {
     METER_DATALOG& log = fns.recordDatalog();
-    int years[] = {2029, 2030, 1999};
-    for (int i = 0; i < 3; ++i) {
-        log.DataLog[i] = entry(1, 0);
-        log.DataLog[i].D_Time = sim::secondsOf(years[i], 12, 31, 23, 58, 59);
-    }
+    const int years[] = {2029, 2030, 1999};
+    for (int i = 0; i < 3; ++i)
+        log.DataLog[i] = entry(1, 0), log.DataLog[i].D_Time = sim::secondsOf(years[i], 12, 31, 23, 58, 59);
     log.recordCount = 3;
     ASSERT_TRUE(fns.NonFastmeterUpload(serial, type, results));
     for (int i = 0; i < 3; ++i)

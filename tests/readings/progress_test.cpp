@@ -17,6 +17,8 @@ struct Progress : ::testing::Test {
     std::shared_ptr<test::FakeTransport> fake = std::make_shared<test::FakeTransport>();
     clsMeterFns fns{fake};
     std::vector<int> raised;
+    std::string serial;
+    std::int16_t type = 1;
 
     void SetUp() override {
         setThreadClock(clock);
@@ -43,30 +45,19 @@ struct Progress : ::testing::Test {
     void convert(std::int16_t records) {
         fns.recordDatalog().recordCount = records;
         ResultCollection out;
-        std::string serial;
-        std::int16_t type = 1;
         ASSERT_TRUE(fns.NonFastmeterUpload(serial, type, out));
     }
 };
 
 }  // namespace
 
-TEST_F(Progress, UploadsStartIn2000AndNeverReportFailureAsSuccess) {
-    fake->does("convert_to_seconds", [](test::FakeArgs& a) {
-        const TIME_REC& t = a.ref<TIME_REC>();
-        EXPECT_EQ(std::vector<int>({t.sec, t.min, t.hour, t.mday, t.mon, t.year, t.wday, t.yday, t.isdst}),
-                  std::vector<int>({0, 0, 0, 1, 1, 2000, 0, 0, 0}));
-    });
-    fake->returns("convert_to_seconds", {946684800});
+TEST_F(Progress, UploadFailuresNeverReadAsSuccessAndAStopMakesNoCall) {
     std::int16_t errorCode = -2;
     fake->does("GetMeterDatalog", [&](test::FakeArgs& a) { a.rec->Error_code = errorCode; });
-    fake->returns("GetMeterDatalog", {0, -2, -3});
-    EXPECT_EQ(fns.GetFastmeterReading(), 0);
-    EXPECT_EQ(fake->calls().back().values, std::vector<std::int32_t>{946684800});
+    fake->returns("GetMeterDatalog", {-2, -3});
     EXPECT_EQ(fns.GetFastmeterReading(), -2);
     errorCode = 0;
     EXPECT_EQ(fns.GetFastmeterReading(), -3);
-
     fake->does("vb_Upload_Meter_Datalog", [](test::FakeArgs& a) { a.rec->Error_code = -13; });
     fake->returns("vb_Upload_Meter_Datalog", {-1});
     EXPECT_EQ(fns.GetNonFastMeterReading(), -13);
@@ -78,25 +69,19 @@ TEST_F(Progress, UploadsStartIn2000AndNeverReportFailureAsSuccess) {
     EXPECT_TRUE(fake->calls().empty());
 }
 
-TEST_F(Progress, TimerProgressOfASessionNeverRepeats) {
-    uploadInSteps(100);
-    EXPECT_EQ(fns.GetFastmeterReading(), 0);
-    EXPECT_EQ(raised, (std::vector<int>{10, 20, 30, 40, 50, 60, 70, 80, 90, 100}));
-    raised.clear();
+TEST_F(Progress, TimerReportsTenPercentStepsAboveWhatTheSessionReached) {
+    uploadInSteps(0);  // a datalog without a capacity makes no measurable progress
     EXPECT_EQ(fns.GetFastmeterReading(), 0);
     EXPECT_TRUE(raised.empty());
-}
-
-TEST_F(Progress, TimerOutsideUploadsAndWithoutCapacity) {
-    uploadInSteps(0);
-    EXPECT_EQ(fns.GetFastmeterReading(), 0);
-    EXPECT_TRUE(raised.empty());
-    fns.MeterRec.Percent_done = 35;
+    fns.MeterRec.Percent_done = 35;  // outside uploads the timer follows the record
     clock->advance(400);
     doEvents();
-    fns.updateProgress(0);  // model set-up reports only values above 0
+    uploadInSteps(100);
+    EXPECT_EQ(fns.GetFastmeterReading(), 0);
+    EXPECT_EQ(fns.GetFastmeterReading(), 0);  // a second upload of the session reports nothing
+    fns.updateProgress(0);                     // model set-up reports only values above 0
     fns.updateProgress(50);
-    EXPECT_EQ(raised, (std::vector<int>{35, 50}));
+    EXPECT_EQ(raised, (std::vector<int>{35, 50, 60, 70, 80, 90, 100, 50}));
 }
 
 TEST_F(Progress, ConversionReportsEveryTenPercentAndPumps) {
@@ -116,26 +101,19 @@ TEST_F(Progress, ConversionReportsEveryTenPercentAndPumps) {
     EXPECT_EQ(raised, (std::vector<int>{10, 20, 30, 40, 50, 60, 70, 80, 90, 100}));
 }
 
-TEST_F(Progress, SimulatedMeterUploadOnTheManualClock) {
+TEST_F(Progress, SimulatedMeterUploadFrom2000OnTheManualClock) {
     sim::MeterProfile meter = sim::defaultProfile(eMorvex);
-    meter.binaryDatalog.assign(200, RECORD_DATA{});
+    meter.binaryDatalog.assign(201, RECORD_DATA{});
     for (auto& r : meter.binaryDatalog) r.timeStamp = sim::secondsOf(2004, 5, 6), r.reading = 101;
-    meter.maxRecords = 200;
+    meter.binaryDatalog[0].timeStamp = sim::secondsOf(1999, 12, 31, 23, 59, 59);  // before the upload's start
+    meter.binaryDatalog[1].timeStamp = sim::secondsOf(2000, 1, 1);
+    meter.maxRecords = 201;
     sim::loadProfile(meter);
     clsMeterFns session(test::simTransport());
     session.MeterRec.port.com_number = meter.port;
     session.onProgress = fns.onProgress;
-
     ASSERT_EQ(session.GetFastmeterReading(), 0);
+    EXPECT_EQ(session.binaryDatalog().recordCount, 200);
     ASSERT_GE(raised.size(), 3u);
     for (std::size_t i = 1; i < raised.size(); ++i) EXPECT_GE(raised[i], raised[i - 1] + 10);
-    EXPECT_EQ(session.binaryDatalog().recordCount, 200);
-    clock->advance(400);  // after the upload the timer follows the record's percentage
-    doEvents();
-    EXPECT_EQ(raised.back(), 100);
-
-    sim::loadProfile(meter);
-    raised.clear();
-    ASSERT_EQ(session.GetFastmeterReading(), 0);
-    EXPECT_EQ(raised, (std::vector<int>{}));
 }

@@ -3,35 +3,21 @@
 #include <dlfcn.h>
 
 #include <cstdio>
-#include <cstring>
 #include <fstream>
-#include <functional>
 
 #include "fixture.h"
 #include "vxsim.h"
 
 using namespace varnel::sim;
 using simtest::SimTest;
+using simtest::text;
 
 namespace {
-
-// The meter's data without its running clock.
-MeterProfile held() {
-    MeterProfile p = meter();
-    p.clock = 0;
-    return p;
-}
-
-std::string profilePath(int type) {
-    return std::string(VARNEL_SOURCE_DIR) + "/sim/profiles/type" + std::to_string(type) + ".xml";
-}
 
 struct TempFile {
     std::string path = ::testing::TempDir() + "vxsim_" +
                        ::testing::UnitTest::GetInstance()->current_test_info()->name() + ".xml";
-    explicit TempFile(const std::string& content = "") {
-        if (!content.empty()) std::ofstream(path) << content;
-    }
+    explicit TempFile(const std::string& content = "") { if (!content.empty()) std::ofstream(path) << content; }
     ~TempFile() { std::remove(path.c_str()); }
 };
 
@@ -63,65 +49,53 @@ TEST_F(Faults, EveryInjectedFaultSurfacesWithErrorCodeAndChangesNothing) {
         {"GetMeterDatalog", [&] { return GetMeterDatalog(&rec, bin.get(), 0); }},
     };
     connect(7);
-    const MeterProfile before = held();
+    const MeterProfile before = meter();
     for (const auto& [function, run] : calls) {
         SCOPED_TRACE(function);
         injectFault(function, 1, ME_TIME_OUT, false);
         rec.Error_code = 0;
         bin->recordCount = 77;
-        EXPECT_EQ(run(), ME_TIME_OUT);
-        EXPECT_EQ(rec.Error_code, ME_TIME_OUT);
-        EXPECT_EQ(held(), before);
-        EXPECT_EQ(bin->recordCount, 77);
+        const std::int16_t code = run();
+        EXPECT_EQ(std::tuple(code, rec.Error_code, bin->recordCount), std::tuple(ME_TIME_OUT, ME_TIME_OUT, 77));
+        EXPECT_EQ(meter(), before);
     }
     // Without faults the same calls do change the meter.
     for (const auto& [function, run] : calls) EXPECT_EQ(run(), ME_SUCCESS) << function;
-    EXPECT_NE(held(), before);
+    EXPECT_NE(meter(), before);
 }
 
-TEST_F(Faults, NthCallFailsOnceOrFromThenOn) {
+TEST_F(Faults, NthCallFailsOnceOrFromThenOnAndBadRequestsAreRefused) {
     connect(1);
     injectFault("vb_Chk4Meter", 2, ME_COM_ERROR, false);
-    EXPECT_EQ(vb_Chk4Meter(&rec), ME_SUCCESS);
-    EXPECT_EQ(vb_Chk4Meter(&rec), ME_COM_ERROR);
-    EXPECT_EQ(vb_Chk4Meter(&rec), ME_SUCCESS);
-
     injectFault("vb_Read_Meter_Options", 2, ME_CHKSUM_ERROR, true);
-    EXPECT_EQ(vb_Read_Meter_Options(&rec), ME_SUCCESS);
-    EXPECT_EQ(vb_Read_Meter_Options(&rec), ME_CHKSUM_ERROR);
-    EXPECT_EQ(vb_Read_Meter_Options(&rec), ME_CHKSUM_ERROR);
+    std::vector<int> once, persistent;
+    for (int i = 0; i < 3; ++i) once.push_back(vb_Chk4Meter(&rec)), persistent.push_back(vb_Read_Meter_Options(&rec));
+    EXPECT_EQ(once, (std::vector<int>{0, ME_COM_ERROR, 0}));
+    EXPECT_EQ(persistent, (std::vector<int>{0, ME_CHKSUM_ERROR, ME_CHKSUM_ERROR}));
     EXPECT_EQ(callCount("vb_Read_Meter_Options"), 3);
     clearFaults();
     EXPECT_EQ(vb_Read_Meter_Options(&rec), ME_SUCCESS);
 
-    // A failed find leaves the record and the port as they were.
-    injectFault("find_meter", 1, ME_NO_DEVICE, false);
-    close_meter(&rec);
-    METER_REC empty{};
-    std::int32_t found[11] = {};
-    std::int16_t ports[11] = {1};
-    EXPECT_EQ(find_meter(&empty, found, ports), ME_NO_DEVICE);
-    EXPECT_EQ(empty.M_Type, 0);
-    EXPECT_FALSE(portOpen());
-
+    // Calls without a meter record fail too.
     injectFault("convert_from_seconds", 1, ME_FAIL, false);
     injectFault("GetMeterDatalogRecordData", 1, ME_COMP_FAIL, false);
     TIME_REC t{};
     RECORD_DATA r{};
     EXPECT_EQ(convert_from_seconds(0, &t), ME_FAIL);
     EXPECT_EQ(GetMeterDatalogRecordData(nullptr, 0, &r), ME_COMP_FAIL);
-    EXPECT_THROW(injectFault("convert_to_seconds", 1, ME_FAIL, false), std::invalid_argument);
-    EXPECT_THROW(injectFault("vb_Chk4Meter", 0, ME_FAIL, false), std::invalid_argument);
-    EXPECT_THROW(injectFault("vb_Chk4Meter", 1, 0, false), std::invalid_argument);
+    // Only functions that report a status fail, from the first call on, with a negative code.
+    for (auto [function, nth, code] :
+         {std::tuple{"convert_to_seconds", 1, -17}, {"vb_Chk4Meter", 0, -17}, {"vb_Chk4Meter", 1, 0}})
+        EXPECT_THROW(injectFault(function, nth, std::int16_t(code), false), std::invalid_argument) << function << nth;
 }
 
 using Profiles = SimTest;
 
-TEST_F(Profiles, ShippedFilesAreTheDefaultMeters) {
-    for (int type = 1; type <= 8; ++type) EXPECT_EQ(readProfileFile(profilePath(type)), defaultProfile(type)) << type;
-}
-
-TEST_F(Profiles, WrittenProfileReadsBackEqual) {
+TEST_F(Profiles, ShippedFilesAreTheDefaultMetersAndWrittenOnesReadBackEqual) {
+    for (int type = 1; type <= 8; ++type) {
+        const std::string path = std::string(VARNEL_SOURCE_DIR) + "/sim/profiles/type" + std::to_string(type) + ".xml";
+        EXPECT_EQ(readProfileFile(path), defaultProfile(type)) << type;
+    }
     MeterProfile p = defaultProfile(7);
     p.port = 3;
     p.identitySerial = "00";
@@ -132,13 +106,13 @@ TEST_F(Profiles, WrittenProfileReadsBackEqual) {
     p.binaryDatalog[3] = RECORD_DATA{};
     p.binaryDatalog[3].recType = 77;  // a type the conversion does not know
     p.binaryDatalog[3].timeStamp = p.binaryDatalog[2].timeStamp;
-    TempFile file;
-    writeProfileFile(p, file.path);
-    EXPECT_EQ(readProfileFile(file.path), p);
     MeterProfile records = defaultProfile(2);
     records.datalog[0].Test.Medication = 0.1;
-    writeProfileFile(records, file.path);
-    EXPECT_EQ(readProfileFile(file.path), records);
+    for (const MeterProfile& written : {p, records}) {
+        TempFile file;
+        writeProfileFile(written, file.path);
+        EXPECT_EQ(readProfileFile(file.path), written) << written.type;
+    }
 }
 
 TEST_F(Profiles, BadFilesNameTheFileTheLineAndTheProblemAndLeaveTheMeter) {
@@ -176,22 +150,18 @@ TEST_F(Profiles, BadFilesNameTheFileTheLineAndTheProblemAndLeaveTheMeter) {
 
 using Controls = SimTest;
 
-TEST_F(Controls, CControlsSelectAttachAndRenameTheMeter) {
+TEST_F(Controls, CControlsSelectAttachRenameFailAndReload) {
     EXPECT_EQ(vxsim_select_type(9), ME_BAD_PARAMETER);
-    EXPECT_NE(std::string(vxsim_last_error()).find("9"), std::string::npos);
     ASSERT_EQ(vxsim_select_type(4), ME_SUCCESS);
     EXPECT_EQ(meter().type, eQuillaandBremo);
+    for (const char* bad : {"", "ABCDEFGHIJKLMNOPQRSTU"}) EXPECT_EQ(vxsim_set_serial(bad), ME_BAD_PARAMETER) << bad;
     EXPECT_EQ(vxsim_set_serial("QLB40088300"), ME_SUCCESS);
-    EXPECT_EQ(vxsim_set_serial(""), ME_BAD_PARAMETER);
-    EXPECT_EQ(vxsim_set_serial("ABCDEFGHIJKLMNOPQRSTU"), ME_BAD_PARAMETER);
 
-    std::int32_t found[11] = {};
-    std::int16_t ports[11] = {1};
     ASSERT_EQ(vxsim_detach(), ME_SUCCESS);
     EXPECT_EQ(find_meter(&rec, found, ports), ME_NO_DEVICE);
     ASSERT_EQ(vxsim_attach(), ME_SUCCESS);
     ASSERT_EQ(find_meter(&rec, found, ports), ME_SUCCESS);
-    EXPECT_STREQ(reinterpret_cast<const char*>(rec.Serial_number), "QLB40088300");
+    EXPECT_EQ(text(rec.Serial_number), "QLB40088300");
 
     EXPECT_EQ(vxsim_fail_call("vb_Nothing", 1, -3, 0), ME_BAD_PARAMETER);
     EXPECT_NE(std::string(vxsim_last_error()).find("vb_Nothing"), std::string::npos);
@@ -204,29 +174,22 @@ TEST_F(Controls, CControlsSelectAttachAndRenameTheMeter) {
     ASSERT_EQ(vxsim_save_profile(saved.path.c_str()), ME_SUCCESS);
     ASSERT_EQ(vxsim_reset(), ME_SUCCESS);
     EXPECT_EQ(meter().type, eMorvex);
-    EXPECT_EQ(meter().port, 1);
     ASSERT_EQ(vxsim_load_profile(saved.path.c_str()), ME_SUCCESS);
     EXPECT_EQ(meter().serial, "QLB40088300");
 }
 
-TEST(SharedLibrary, ExportsTheTransportAndItsOwnSimulator) {
+TEST_F(Controls, SharedLibraryExportsTheTransportAndHasItsOwnSimulator) {
     void* lib = dlopen(VARNEL_TEST_TRANSPORT_PATH, RTLD_NOW | RTLD_LOCAL);
     ASSERT_NE(lib, nullptr) << dlerror();
-    auto select = reinterpret_cast<int (*)(int)>(dlsym(lib, "vxsim_select_type"));
-    auto find = reinterpret_cast<decltype(&find_meter)>(dlsym(lib, "find_meter"));
-    auto hook = dlsym(lib, "vx_set_yield_hook");
-    ASSERT_TRUE(select && find && hook);
     for (const char* f : {"initialize_meter_structure", "GetMeterDatalogRecordData", "SetTargetRange",
-                          "vb_Upload_Meter_Datalog", "convert_to_seconds", "vxsim_last_error"})
+                          "vb_Upload_Meter_Datalog", "convert_to_seconds", "vxsim_last_error", "vx_set_yield_hook"})
         EXPECT_NE(dlsym(lib, f), nullptr) << f;
-
+    auto select = reinterpret_cast<decltype(&vxsim_select_type)>(dlsym(lib, "vxsim_select_type"));
+    auto find = reinterpret_cast<decltype(&find_meter)>(dlsym(lib, "find_meter"));
+    ASSERT_TRUE(select && find);
     ASSERT_EQ(select(3), 0);
-    METER_REC r{};
-    std::int32_t found[11] = {};
-    std::int16_t ports[11] = {1};
-    ASSERT_EQ(find(&r, found, ports), ME_SUCCESS);
-    EXPECT_EQ(r.M_Type, eDunmark);
+    ASSERT_EQ(find(&rec, found, ports), ME_SUCCESS);
+    EXPECT_EQ(rec.M_Type, eDunmark);
     EXPECT_EQ(meter().type, eMorvex);  // the library's meter is not this program's
-    select(7);
     dlclose(lib);
 }

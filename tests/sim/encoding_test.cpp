@@ -1,57 +1,47 @@
 // Time conversion and the binary datalog encoding.
-#include <cstring>
+#include <gmock/gmock.h>
+
 #include <set>
 
 #include "fixture.h"
 
 using namespace varnel::sim;
+using ::testing::AllOf;
+using ::testing::HasSubstr;
 
 namespace {
 
 TIME_REC timeRec(int y, int mo, int d, int h = 0, int mi = 0, int s = 0) {
-    TIME_REC t{};
-    t.year = std::int16_t(y), t.mon = std::int16_t(mo), t.mday = std::int16_t(d);
-    t.hour = std::int16_t(h), t.min = std::int16_t(mi), t.sec = std::int16_t(s);
-    return t;
+    using I = std::int16_t;
+    return TIME_REC{I(s), I(mi), I(h), I(d), I(mo), I(y), 0, 0, 0};
 }
 
-bool sameRecord(const RECORD_DATA& a, const RECORD_DATA& b) { return std::memcmp(&a, &b, sizeof a) == 0; }
+bool same(const RECORD_DATA& a, const RECORD_DATA& b) { return std::memcmp(&a, &b, sizeof a) == 0; }
 
 RECORD_DATA glucose(std::int16_t reading, std::int16_t ordinal) {
     RECORD_DATA r{};
-    r.timeStamp = secondsOf(2008, 1, 1) + ordinal;
-    r.Ordinal = ordinal;
-    r.reading = reading;
+    r.timeStamp = secondsOf(2008, 1, 1) + ordinal, r.Ordinal = ordinal, r.reading = reading;
     return r;
 }
 
 }  // namespace
 
-TEST(TimeConversion, ExactInversesAcrossTheMetersRange) {
-    std::int32_t previous = -1;
+TEST(TimeConversion, ExactInversesWithWeekdayAndYearDayWithinTheValidRange) {
     for (std::int32_t s = secondsOf(1990, 1, 1); s <= secondsOf(2026, 12, 31, 23, 59, 59); s += 86400 / 4 + 7) {
         TIME_REC t{};
         ASSERT_EQ(convert_from_seconds(s, &t), ME_SUCCESS);
         ASSERT_EQ(convert_to_seconds(&t), s);
-        ASSERT_GT(s, previous);
-        previous = s;
     }
-}
+    const std::tuple<TIME_REC, int, int> days[] = {{timeRec(2000, 1, 1), 6, 0},  // a Saturday
+                                                   {timeRec(2004, 12, 31, 23, 59, 59), 5, 365}};
+    for (auto [t, wday, yday] : days) {
+        TIME_REC back{};
+        back.isdst = 1;
+        ASSERT_EQ(convert_from_seconds(convert_to_seconds(&t), &back), ME_SUCCESS);
+        EXPECT_EQ(std::tuple(back.wday, back.yday, back.isdst), std::tuple(wday, yday, 0)) << t.year;
+    }
 
-TEST(TimeConversion, FillsWeekdayAndYearDay) {
-    TIME_REC t = timeRec(2000, 1, 1);
-    ASSERT_EQ(convert_from_seconds(convert_to_seconds(&t), &t), ME_SUCCESS);
-    EXPECT_EQ(t.wday, 6);  // a Saturday
-    EXPECT_EQ(t.yday, 0);
-    t = timeRec(2004, 12, 31, 23, 59, 59);
-    ASSERT_EQ(convert_from_seconds(convert_to_seconds(&t), &t), ME_SUCCESS);
-    EXPECT_EQ(t.yday, 365);  // leap year
-    EXPECT_EQ(t.wday, 5);
-    EXPECT_EQ(t.hour, 23);
-    EXPECT_EQ(t.isdst, 0);
-}
-
-TEST(TimeConversion, RejectsInvalidRecordsAndNegativeSeconds) {
+    // Invalid records and negative seconds are refused.
     for (TIME_REC t : {timeRec(2005, 2, 29), timeRec(2005, 13, 1), timeRec(2005, 1, 1, 24),
                        timeRec(2005, 1, 1, 0, 60), timeRec(1969, 12, 31), timeRec(2038, 12, 31)})
         EXPECT_EQ(convert_to_seconds(&t), -1) << t.year << "-" << t.mon << "-" << t.mday;
@@ -70,7 +60,7 @@ TEST(BinaryDatalog, DefaultMeterLogDecodesRecordByRecordWithEveryKnownType) {
     for (int i = 0; i < log->recordCount; ++i) {
         RECORD_DATA r{};
         ASSERT_EQ(GetMeterDatalogRecordData(log.get(), std::int16_t(i), &r), ME_SUCCESS) << i;
-        ASSERT_TRUE(sameRecord(r, p.binaryDatalog[std::size_t(i)])) << "record " << i;
+        ASSERT_TRUE(same(r, p.binaryDatalog[std::size_t(i)])) << "record " << i;
         types.insert(r.recType);
         if (r.recType == 20 && r.mealSegment == 4) types.insert(-4);  // alcohol
         if (r.recType == 36 && r.height == -1.0) types.insert(-36);   // missing height
@@ -80,39 +70,30 @@ TEST(BinaryDatalog, DefaultMeterLogDecodesRecordByRecordWithEveryKnownType) {
 
 TEST(BinaryDatalog, FillsTheWholeBufferAndRefusesOneRecordMore) {
     std::vector<RECORD_DATA> records;
-    while (encodedSize(records) + encodedSize({glucose(0, 0)}) - encodedSize({}) <= sizeof(METER_BIN_DATALOG::binBuf))
+    const std::size_t one = encodedSize({glucose(0, 0)}) - encodedSize({});
+    while (encodedSize(records) + one <= sizeof(METER_BIN_DATALOG::binBuf))
         records.push_back(glucose(std::int16_t(40 + records.size() % 500), std::int16_t(records.size())));
     auto log = std::make_unique<METER_BIN_DATALOG>();
     encodeBinaryDatalog(records, *log);
-    EXPECT_GT(encodedSize(records), sizeof(log->binBuf) - 30);
     RECORD_DATA last{};
     ASSERT_EQ(decodeBinaryRecord(*log, log->recordCount - 1, last), ME_SUCCESS);
-    EXPECT_TRUE(sameRecord(last, records.back()));
-
+    EXPECT_TRUE(same(last, records.back()));
     records.push_back(glucose(99, 0));
     EXPECT_THROW(encodeBinaryDatalog(records, *log), std::length_error);
 }
 
-TEST(BinaryDatalog, RefusesValuesItCannotHoldExactly) {
-    RECORD_DATA flagged = glucose(100, 1);
-    flagged.stressFlag = 300;
-    RECORD_DATA dose{};
-    dose.recType = 11;
-    dose.insulinDosage = 2.125;
+TEST(BinaryDatalog, RefusesValuesItCannotHoldExactlyAndNamesTheRecord) {
+    RECORD_DATA flagged = glucose(100, 1), fraction{}, foreign{}, missing{};
+    flagged.stressFlag = 300;                                // beyond one byte
+    fraction.recType = 11, fraction.insulinDosage = 2.125;   // more than two decimals
+    foreign.recType = 11, foreign.carbs = 5;                 // not carried by this type
+    missing.recType = 11, missing.insulinDosage = -1.0;      // held: a missing value
     auto log = std::make_unique<METER_BIN_DATALOG>();
-    try {
-        encodeBinaryDatalog({glucose(1, 1), flagged}, *log);
-        FAIL();
-    } catch (const std::invalid_argument& e) {
-        EXPECT_NE(std::string(e.what()).find("record 1"), std::string::npos) << e.what();
-        EXPECT_NE(std::string(e.what()).find("stressFlag"), std::string::npos) << e.what();
-    }
-    EXPECT_THROW(encodeBinaryDatalog({dose}, *log), std::invalid_argument);
-    dose.insulinDosage = -1.0;  // a missing value is held
-    dose.carbs = 5;             // but not a value the type does not carry
-    EXPECT_THROW(encodeBinaryDatalog({dose}, *log), std::invalid_argument);
-    dose.carbs = 0;
-    EXPECT_NO_THROW(encodeBinaryDatalog({dose}, *log));
+    for (const RECORD_DATA& r : {fraction, foreign})
+        EXPECT_THROW(encodeBinaryDatalog({r}, *log), std::invalid_argument);
+    EXPECT_THAT([&] { encodeBinaryDatalog({glucose(1, 1), flagged}, *log); },
+                ::testing::ThrowsMessage<std::invalid_argument>(AllOf(HasSubstr("record 1"), HasSubstr("stressFlag"))));
+    EXPECT_NO_THROW(encodeBinaryDatalog({missing}, *log));
 }
 
 TEST(BinaryDatalog, CorruptedRecordFailsAloneAndBadIndexesAreRefused) {
@@ -120,7 +101,7 @@ TEST(BinaryDatalog, CorruptedRecordFailsAloneAndBadIndexesAreRefused) {
     unknown.recType = 99;  // a type the table does not know keeps its time and ordinal
     unknown.timeStamp = 123456;
     unknown.Ordinal = 4;
-    std::vector<RECORD_DATA> records{glucose(101, 1), glucose(102, 2), glucose(103, 3), unknown};
+    const std::vector<RECORD_DATA> records{glucose(101, 1), glucose(102, 2), glucose(103, 3), unknown};
     auto log = std::make_unique<METER_BIN_DATALOG>();
     encodeBinaryDatalog(records, *log);
     corruptBinaryRecord(*log, 1);
@@ -130,13 +111,12 @@ TEST(BinaryDatalog, CorruptedRecordFailsAloneAndBadIndexesAreRefused) {
     EXPECT_EQ(r.reading, 777);  // nothing decoded
     for (int i : {0, 2, 3}) {
         ASSERT_EQ(decodeBinaryRecord(*log, i, r), ME_SUCCESS);
-        EXPECT_TRUE(sameRecord(r, records[std::size_t(i)]));
+        EXPECT_TRUE(same(r, records[std::size_t(i)])) << i;
     }
-    EXPECT_EQ(decodeBinaryRecord(*log, 4, r), ME_BAD_PARAMETER);
-    EXPECT_EQ(decodeBinaryRecord(*log, -1, r), ME_BAD_PARAMETER);
+    for (int i : {4, -1}) EXPECT_EQ(decodeBinaryRecord(*log, i, r), ME_BAD_PARAMETER) << i;
     EXPECT_EQ(GetMeterDatalogRecordData(nullptr, 0, &r), ME_BAD_PARAMETER);
 
-    // An offset pointing at another sound record is caught too.
+    // An offset pointing at another sound record is caught too, and so is a buffer without a header.
     std::swap(log->binBuf[4], log->binBuf[8]);
     std::swap(log->binBuf[5], log->binBuf[9]);
     EXPECT_EQ(decodeBinaryRecord(*log, 0, r), ME_VALIDATION_ERROR);

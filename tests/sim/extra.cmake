@@ -1,0 +1,2 @@
+# The shared-library test opens the built transport library by path.
+add_dependencies(${target} vantrix32)
