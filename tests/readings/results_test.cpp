@@ -61,5 +61,6 @@ TEST(ResultCollection, OneBasedAndInOrder) {
     results.Add(std::make_shared<Alcohol>());
     EXPECT_THROW(results.Add(nullptr), ComponentError);
     EXPECT_EQ(results.Count(), 2);
-    EXPECT_EQ((std::vector{results.Item(0), results.Item(1), results.Item(3)}), (std::vector<ResultPtr>{nullptr, food, nullptr}));
+    EXPECT_EQ((std::vector{results.Item(0), results.Item(1), results.Item(3)}),
+              (std::vector<ResultPtr>{nullptr, food, nullptr}));
 }

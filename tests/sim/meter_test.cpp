@@ -157,14 +157,14 @@ TEST_F(MeterSettings, Type7TablesReadBackAndNamesAreHeldAsBytes) {
 
 TEST_F(MeterSettings, RefusalsChangeNothing) {
     connect(7);
-    INSULIN_OR_ORAL_MED_NAME_TYPE fixed{10, 0, {'X'}}, beyondInsulins{22, 0, {}}, fixedPill{5, 0, {'X'}}, none{0, 0, {}};
+    INSULIN_OR_ORAL_MED_NAME_TYPE fixed{10, 0, {'X'}}, pastInsulins{22, 0, {}}, fixedPill{5, 0, {'X'}}, none{0, 0, {}};
     PREDEFINED_INSULINS_TYPE beyondFavourites{{0, 0, 22}};
     MEAL_SEGMENTS_TYPE late{{0, 0, 0, 0, 0, 0, 96}};
     const MeterProfile before = meter();
     const std::vector<int> bad = {
         vb_Set_Meter_Option(&rec, eUnits, 2), vb_Set_Meter_Option(&rec, eLanguage, 6),  // not in its language map
         vb_Set_Meter_Option(&rec, 19, 0), vb_Set_Meter_Clock(&rec, secondsOf(2021, 1, 1)),
-        vb_Read_Meter_Clock(&rec, nullptr), SetInsulinName(&rec, &fixed), GetInsulinName(&rec, &beyondInsulins),
+        vb_Read_Meter_Clock(&rec, nullptr), SetInsulinName(&rec, &fixed), GetInsulinName(&rec, &pastInsulins),
         SetOralMedicationName(&rec, &fixedPill), GetOralMedicationName(&rec, &none),
         SetPredefinedInsulins(&rec, &beyondFavourites), SetMealSegments(&rec, &late),
         SetTargetRange(&rec, 150, 140, 90, 200, 55),  // low above high
