@@ -195,7 +195,8 @@ bool clsMeterFns::NonFastmeterUpload(std::string&, std::int16_t&, ResultCollecti
         recordCount_ = log.recordCount;
         maxRecordsForMeter_ = log.maxRecordsForMeter;
         unmatchedCount_ = 0;
-        corruptedCount_ = log.recordCount != log.ValidRecordCount ? log.recordCount - log.ValidRecordCount : 0;
+        // A transport reporting more valid records than records (or a negative count) damaged none.
+        corruptedCount_ = std::max(0, std::int32_t(log.recordCount) - std::int32_t(log.ValidRecordCount));
         std::int32_t last = 0;
         for (std::int32_t i = 0; i < recordCount_; ++i) {
             if (i >= static_cast<std::int32_t>(std::size(log.DataLog))) subscriptError();

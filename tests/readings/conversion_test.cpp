@@ -181,6 +181,7 @@ TEST_F(Conversion, RecordDatalogNeverReadsPastItsBuffer) {
     log.recordCount = -4;
     EXPECT_TRUE(fns.NonFastmeterUpload(serial, type, results));
     EXPECT_EQ(results.Count(), 0);
+    EXPECT_EQ(fns.corruptedCount(), 0);
 }
 
 TEST_F(Conversion, TwoDigitYearWindow) {
