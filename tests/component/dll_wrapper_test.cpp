@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <utility>
 
 #include "component/dll_impl.h"
 #include "support/fake_transport.h"
@@ -16,9 +17,8 @@ TEST(ProgressStage, StagesHalvesToEvenAndDroppedEvents) {
     std::vector<int> raised;
     impl.onProgress = [&](std::int16_t& p) { raised.push_back(p); };
     auto raise = [&](std::initializer_list<std::int16_t> values) {
-        raised.clear();
         for (std::int16_t v : values) impl.RaiseProgress(v);
-        return raised;
+        return std::exchange(raised, {});
     };
     impl.PercentLimit(0);  // changes nothing
     EXPECT_EQ(impl.PercentLimit(), 100);
@@ -43,22 +43,7 @@ struct Requests : WrapperTest {
     }
 };
 
-TEST_F(Requests, EraseEmptiesTheMeterReportingItsOwnStage) {
-    discover(eCVPellis);
-    EXPECT_EQ(clear(), ME_SUCCESS);
-    EXPECT_TRUE(sim::meter().datalog.empty());
-    EXPECT_TRUE(statusGroups(status).empty());
-    EXPECT_EQ(completions, 1);
-    EXPECT_FALSE(closed());
-    EXPECT_FALSE(detail::frmTimer().tmrStatus().enabled());
-    // 1.5 s of erasing, ticks every 0.4 s; a fresh DllWrapper's first stage starts at 0.
-    ASSERT_GE(progress.size(), 3u);
-    EXPECT_TRUE(std::is_sorted(progress.begin(), progress.end()));
-    EXPECT_GT(progress.front(), 0);
-    EXPECT_LT(progress.front(), 50);
-}
-
-TEST_F(Requests, FailedEraseClosesUnlessToldToKeepTheMeter) {
+TEST_F(Requests, FailedEraseClosesUnlessToldToKeepTheMeterAndAnEraseReportsItsOwnStage) {
     discover(eDunmark);
     for (std::int16_t keep : {0, -50}) {
         sim::injectFault("vb_Clear_Meter_Datalog", 1, ME_TIME_OUT, false);
@@ -71,6 +56,19 @@ TEST_F(Requests, FailedEraseClosesUnlessToldToKeepTheMeter) {
         EXPECT_FALSE(detail::frmTimer().tmrStatus().enabled());
     }
     EXPECT_FALSE(sim::meter().datalog.empty());
+
+    fresh();
+    EXPECT_EQ(clear(), ME_SUCCESS);
+    EXPECT_TRUE(sim::meter().datalog.empty());
+    EXPECT_TRUE(statusGroups(status).empty());
+    EXPECT_EQ(completions, 1);
+    EXPECT_FALSE(closed());
+    EXPECT_FALSE(detail::frmTimer().tmrStatus().enabled());
+    // 1.5 s of erasing, ticks every 0.4 s, in one stage from 0 whatever an earlier request left.
+    ASSERT_GE(progress.size(), 3u);
+    EXPECT_TRUE(std::is_sorted(progress.begin(), progress.end()));
+    EXPECT_GT(progress.front(), 0);
+    EXPECT_LT(progress.front(), 50);
 }
 
 TEST_F(Requests, ErasesThatFailWithoutACodeOrRaiseAreFailures) {
@@ -87,8 +85,8 @@ TEST_F(Requests, ErasesThatFailWithoutACodeOrRaiseAreFailures) {
     fresh();
     fake->does("vb_Clear_Meter_Datalog", [](FakeArgs&) { detail::raise(errc::overflow, "Overflow"); });
     EXPECT_EQ(unexpectedTrace([&] { own.clearMeter(rec, doc, status); }), "6 doAction --> clearMeter --> ");
-    EXPECT_EQ(statusGroups(status),
-              std::vector<std::string>{"-17/-16/Unknown status;Error number = 6 Error description = clearMeter --> /0"});
+    EXPECT_EQ(statusGroups(status), std::vector<std::string>{"-17/-16/Unknown status;Error number = 6 "
+                                                             "Error description = clearMeter --> /0"});
 }
 
 TEST_F(Requests, CloseReleasesThePortQuietly) {
@@ -111,11 +109,7 @@ TEST_F(Requests, CloseReleasesThePortQuietly) {
 TEST_F(Requests, DeviceInformationChecksAndUnexpectedErrors) {
     discover(eDunmark);
     const std::string bad = "-17/-19/Bad parameter passed to the function ; ";
-    struct Case {
-        std::string port, sn, type;
-        std::int32_t result;
-        std::string group;  // "" for none
-    };
+    struct Case { std::string port, sn, type; std::int32_t result; std::string group; };  // group "" for none
     for (const Case& c : {
              Case{"abc", "dnm3001296", "3.0", 0, ""},  // a port that is no number is port 0; case is ignored
              Case{"1", "", "0", ME_BAD_PARAMETER, bad + "Device Type from Device Info XML is invalid"},
@@ -144,8 +138,9 @@ TEST_F(Requests, DeviceInformationChecksAndUnexpectedErrors) {
         rec.Error_code = keep;
         EXPECT_EQ(unexpectedTrace([&] { wrapper->clearMeter(rec, noPortInfo, status); }), "91 doAction --> ");
         ASSERT_EQ(statusGroups(status).size(), 1u);
-        EXPECT_TRUE(statusGroups(status)[0].starts_with("-17/-16/Unknown status;Error number = 91 Error description = "));
-        EXPECT_TRUE(statusGroups(status)[0].ends_with("/0"));
+        const std::string group = statusGroups(status)[0];
+        EXPECT_TRUE(group.starts_with("-17/-16/Unknown status;Error number = 91 Error description = ")) << group;
+        EXPECT_TRUE(group.ends_with("/0")) << group;  // no line number
         EXPECT_EQ(completions, 1);
         EXPECT_EQ(closed(), keep != -50);
     }

@@ -21,11 +21,9 @@ TEST(ErrPropagator, TraceGrowsOutermostFirstAndCleanupSeesIt) {
     });
     EXPECT_EQ(trace, std::to_string(errc::subscript_out_of_range) + " outer --> mid --> inner --> ");
     EXPECT_EQ(seen, "mid --> inner --> ");
-    // The shared error holds the latest routine, with the inner trace as its description.
+    // The shared error holds the latest routine, the inner trace as its description and no class.
     const IError& e = errPropagator().error();
-    EXPECT_EQ(e.ErrorDesc, "mid --> inner --> ");
-    EXPECT_EQ(e.FunctionName, "outer");
-    EXPECT_TRUE(e.ClassName.empty());
+    EXPECT_EQ(e.ErrorDesc + "|" + e.FunctionName + "|" + e.ClassName, "mid --> inner --> |outer|");
 
     // Started afresh, the next trace does not carry this one.
     EXPECT_EQ(test::unexpectedTrace([] { guarded("X", "getReadings", [] { raise(errc::missing_object, "boom"); }); }),

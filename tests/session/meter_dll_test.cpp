@@ -34,7 +34,7 @@ struct Session : ::testing::Test {
     }
 };
 
-TEST_F(Session, FindSearchesThePreferredPortAndKeepsTheLastMeterOnFailure) {
+TEST_F(Session, FindChecksAndRebuildsTheMeterKeepingTheLastOneOnFailure) {
     meterAnswers(eDunmark, "DNM42");
     session.setCOMPort_Pref(3);
     EXPECT_EQ(session.findmeter(rec), 0);
@@ -52,11 +52,9 @@ TEST_F(Session, FindSearchesThePreferredPortAndKeepsTheLastMeterOnFailure) {
     EXPECT_TRUE(session.isInitialised());
     EXPECT_FALSE(session.Meter());
     EXPECT_EQ(session.LastMeterSerialNo(), "DNM42");
-}
 
-TEST_F(Session, CheckWaitsBeforeAskingAndInitReturnsTheFirmwareCode) {
-    meterAnswers(eMorvex, "MVX1");
-    rec.M_Type = eMorvex;
+    // A check waits before it asks and reads no firmware; a rebuild gives the firmware read's code.
+    fake->clearLog();
     EXPECT_EQ(session.checkmeter(rec), 0);
     EXPECT_EQ(fake->names(), (std::vector<std::string>{"initialize_meter_type_structure", "vb_Chk4Meter"}));
     EXPECT_EQ(clock->tickCount(), 5100u);
@@ -67,7 +65,7 @@ TEST_F(Session, CheckWaitsBeforeAskingAndInitReturnsTheFirmwareCode) {
     EXPECT_STREQ(session.Meter()->className(), "clsParvix");
 }
 
-TEST_F(Session, HandleAndFlagsComeFromTheStoredRecordAndCloseActsOnTheCallers) {
+TEST_F(Session, HandleAndFlagsComeFromTheStoredRecordAndCloseActsOnTheCallersRecord) {
     TextToBytes(rec.Serial_number, "A1");
     session.initMeter(rec);
     for (auto [id, handle] : {std::pair{0, 0}, {-1, 0}, {1, 1}, {0x4003, 0x4003}}) {

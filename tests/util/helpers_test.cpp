@@ -1,7 +1,6 @@
 #include <gtest/gtest.h>
 
 #include <cstdint>
-#include <optional>
 #include <thread>
 
 #include "util/helpers.h"
@@ -93,9 +92,7 @@ TEST(ContinueFlag, IsPerThreadAndStartsTrue) {
 }
 
 TEST(MinMaxDates, RangesByMeterType) {
-    struct Range {
-        int type, y0, y1;
-    };
+    struct Range { int type, y0, y1; };
     for (auto [type, y0, y1] : {Range{1, 1990, 2014}, Range{2, 1992, 2022}, Range{3, 1992, 2022},
                                 Range{4, 1997, 2015}, Range{5, 1996, 2026}, Range{6, 2000, 2020},
                                 Range{7, 2000, 2020}, Range{8, 2000, 2020}, Range{0, 0, 0}, Range{9, 0, 0}}) {
