@@ -36,6 +36,26 @@ inline std::vector<std::string> statusGroups(const XMLWrapper& status) {
     return groups;
 }
 
+// The status groups joined by " | "; a single group reads as it is.
+inline std::string statusText(const XMLWrapper& status) {
+    std::string text;
+    for (const std::string& g : statusGroups(status)) text += (text.empty() ? "" : " | ") + g;
+    return text;
+}
+
+// A node's attributes as "name=value " each, then its text.
+inline std::string nodeText(pugi::xml_node n) {
+    std::string out;
+    for (pugi::xml_attribute a : n.attributes()) out += std::string(a.name()) + "=" + a.value() + " ";
+    return out + n.child_value();
+}
+
+inline std::vector<std::string> childTexts(pugi::xml_node n) {
+    std::vector<std::string> out;
+    for (pugi::xml_node c : n.children()) out.push_back(nodeText(c));
+    return out;
+}
+
 inline std::shared_ptr<pugi::xml_document> parsed(const XMLWrapper& doc) {
     auto tree = std::make_shared<pugi::xml_document>();
     tree->load_string(doc.XML().c_str());
@@ -103,9 +123,16 @@ struct WrapperTest : ::testing::Test {
         sim::reset();
         setThreadClock(nullptr);
     }
-    // Attaches the default meter of a type and discovers it on its port.
+    // Attaches the default meter of a type, or this meter, and discovers it on its port.
     void discover(int type) {
         sim::selectType(type);
+        attach();
+    }
+    void discover(const sim::MeterProfile& profile) {
+        sim::loadProfile(profile);
+        attach();
+    }
+    void attach() {
         device = newDoc(doc_kind::device_info);
         XMLWrapper conn = connectionDoc(std::to_string(sim::meter().port));
         ASSERT_EQ(wrapper->discoverDevice(rec, device, conn, status), ME_SUCCESS);
@@ -119,6 +146,22 @@ struct WrapperTest : ::testing::Test {
         closedBefore = sim::callCount("close_meter");
     }
     bool closed() const { return sim::callCount("close_meter") > closedBefore; }
+    std::string report() const { return statusText(status); }
+    // An exit of a request: its result, its one report, whether it closed the meter, how often onComplete came.
+    void expectExit(std::int32_t got, std::int32_t result, const std::string& text, bool closes,
+                    int completed = 1) const {
+        EXPECT_EQ(got, result);
+        EXPECT_EQ(report(), text);
+        EXPECT_EQ(closed(), closes);
+        EXPECT_EQ(completions, completed);
+    }
+    // The unexpected-error handler's exit: one -17/-16 report beginning with start, the meter closed, onComplete.
+    void expectUnexpected(const std::string& start) const {
+        EXPECT_EQ(report().rfind("-17/-16/" + start, 0), 0u) << report();
+        EXPECT_EQ(report().find(" | "), std::string::npos) << report();
+        EXPECT_TRUE(closed());
+        EXPECT_EQ(completions, 1);
+    }
 };
 
 }  // namespace varnel::test
