@@ -11,6 +11,7 @@
 #include <cstdio>
 #include <filesystem>
 #include <fstream>
+#include <iterator>
 #include <sstream>
 #include <string>
 #include <vector>
@@ -29,6 +30,15 @@ struct Outcome {
 inline std::string slurp(const fs::path& p) {
     std::ifstream in(p, std::ios::binary);
     return {std::istreambuf_iterator<char>(in), {}};
+}
+
+// The names of the children of the element at path in a printed document, each followed by a blank.
+inline std::string childNames(const std::string& xml, const char* path) {
+    pugi::xml_document doc;
+    if (!doc.load_string(xml.c_str())) return "not a document: " + xml;
+    std::string names;
+    for (pugi::xml_node n : doc.first_element_by_path(path).children()) names += n.name() + std::string(" ");
+    return names;
 }
 
 inline std::vector<std::string> lines(const std::string& text) {
@@ -84,6 +94,17 @@ protected:
         run.out = slurp(out);
         run.err = slurp(err);
         return run;
+    }
+
+    // The test meter as the last run saved it.
+    pugi::xml_node saved(pugi::xml_document& doc) const {
+        EXPECT_TRUE(doc.load_file(meter.c_str()));
+        return doc.child("meter");
+    }
+    std::size_t savedRecords() const {
+        pugi::xml_document doc;
+        const pugi::xml_node log = saved(doc).child("binaryDatalog");
+        return static_cast<std::size_t>(std::distance(log.begin(), log.end()));
     }
 
     // A readings run on the test meter, its datalog parsed.
