@@ -10,8 +10,6 @@ using namespace varnel::test;
 
 namespace {
 
-using Names = std::vector<std::string>;
-
 struct Caps : WrapperTest {
     XMLWrapper caps = newDoc(doc_kind::device_caps);
     bool checked = false;
@@ -30,13 +28,9 @@ struct Caps : WrapperTest {
     }
     // The names under Settings, then under Records.
     std::string described() const {
-        std::string out;
-        for (const char* section : {"Settings", "Records"}) {
-            for (pugi::xml_node n : parsed(caps)->document_element().child(section).children())
-                out += std::string(n.name()) + " ";
-            out += "| ";
-        }
-        return out;
+        const auto doc = parsed(caps);
+        return childNames(doc->document_element().child("Settings")) + "| " +
+               childNames(doc->document_element().child("Records")) + "| ";
     }
     std::string at(const char* path) const {
         return nodeText(parsed(caps)->document_element().first_element_by_path(path));
@@ -65,7 +59,7 @@ TEST_F(Caps, FullDescriptionOfEveryMeterType) {
         SCOPED_TRACE(type);
         discover(type);
         caps = XMLWrapper();  // rebuilt whatever the client passed
-        expectExit(describe(), ME_SUCCESS, "0/0/Operation completed successfully", false);
+        expectExit(describe(), ME_SUCCESS, kReportOk, false);
         EXPECT_EQ(described(), full[type]);
         EXPECT_EQ(at("DeviceInfo/SN"), sim::meter().serial);
         EXPECT_TRUE(checked);
@@ -175,7 +169,7 @@ TEST_F(Caps, EveryExit) {
              Case{sn, "7", "", "vb_Chk4Meter", ME_COM_ERROR, "-17/-3/Communication error", false, 0},
              Case{"other1", "7", "", "", ME_FAIL,
                   other + "SN from Device Info XML - other1 Device SN from device - " + sn + " do not match", false},
-             Case{sn, "7.0", "", "", ME_SUCCESS, "0/0/Operation completed successfully", false},
+             Case{sn, "7.0", "", "", ME_SUCCESS, kReportOk, false},
              Case{sn, "2", "", "", ME_FAIL,
                   other + "Type from Device Info XML - 2 Device Type from device - 7 do not match", false},
          }) {

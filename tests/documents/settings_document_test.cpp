@@ -14,8 +14,6 @@ using detail::ErrorDescription;
 
 namespace {
 
-using Names = std::vector<std::string>;
-
 struct DeviceSettings : WrapperTest {
     XMLWrapper cfg = newDoc(doc_kind::device_settings);
     std::shared_ptr<pugi::xml_document> tree;
@@ -36,16 +34,9 @@ struct DeviceSettings : WrapperTest {
         return tree->document_element().child("Settings").first_element_by_path(path);
     }
     std::string at(const char* path) { return nodeText(item(path)); }
-    // The names of the items written, each followed by a blank.
-    std::string items() {
-        std::string out;
-        for (pugi::xml_node n : tree->document_element().child("Settings").children()) out += n.name() + std::string(" ");
-        return out;
-    }
+    std::string items() { return childNames(tree->document_element().child("Settings")); }
     Names children(const char* path) { return childTexts(item(path)); }
 };
-
-const std::string kSuccess = "0/0/" + ErrorDescription(0);
 
 TEST_F(DeviceSettings, EveryTypeGivesItsItemsInDocumentOrderWithProgress) {
     const std::string general = "Clock CC Beep GlucUnit ";
@@ -79,7 +70,7 @@ TEST_F(DeviceSettings, EveryTypeGivesItsItemsInDocumentOrderWithProgress) {
         EXPECT_EQ(sim::callCount("vb_Read_Meter_Options"), single ? 0 : 1);
         EXPECT_EQ(sim::callCount("vb_Read_Meter_Option"), single ? count - 4 : 0);
         EXPECT_EQ(sim::callCount("vb_Tickle_Meter"), single ? 1 : 0);
-        expectExit(ME_SUCCESS, ME_SUCCESS, kSuccess, false);
+        expectExit(ME_SUCCESS, ME_SUCCESS, kReportOk, false);
         EXPECT_TRUE(checkMeter);
     }
 }
@@ -128,7 +119,6 @@ TEST_F(DeviceSettings, Type7ValuesWordsAndLimits) {
     EXPECT_EQ(at("Targets"), "Mode=1 Unit=0 UTxt=mg/dL ");
     EXPECT_EQ(at("Targets/PreMealHigh") + "|" + at("Targets/Hypo"), "Min=60 Max=200 140|Min=50 Max=90 60");
     EXPECT_EQ(at("GlucRange") + at("GlucCalib"), "High=600 Low=20 Mode=0 Txt=Plasma Mode=0 1");
-    EXPECT_EQ(progress.back(), 95);  // 19 steps of 5
 }
 
 TEST_F(DeviceSettings, OptionMappingsAndAttributes) {
@@ -165,14 +155,14 @@ TEST_F(DeviceSettings, ListedItems) {
         int reads, identityChecks;  // single option and clock reads; identity checks after the reads
     } cases[] = {
         // Only the clock: no identity check.
-        {eMorvex, {"Clock"}, "Clock ", kSuccess, 1, 0},
+        {eMorvex, {"Clock"}, "Clock ", kReportOk, 1, 0},
         // EvtAvgDurn and EvtAvg name the same item; the element follows the meter type.
         {eMorvex, {"EvtAvg", "Nothing"}, "EvtAvgDurn ", partial + "Nothing is not supported;", 0, 1},
-        {eCVPellis, {"EvtAvgDurn"}, "EvtAvg ", kSuccess, 0, 1},
+        {eCVPellis, {"EvtAvgDurn"}, "EvtAvg ", kReportOk, 0, 1},
         {eQuillaandBremo, {"Beep", "GlucUnit"}, "GlucUnit ", partial + "Beep is not supported;", 1, 1},
         // Nothing the meter offers: the document still describes the meter, nothing is read.
         {eCorviaZenta, {"Foo"}, "", "-17/-17/" + ErrorDescription(-17) + ";Foo is not supported;", 0, 1},
-        {eCorviaZenta, {"TimeFormat", "GlucUnit"}, "GlucUnit TimeFormat ", kSuccess, 2, 1},
+        {eCorviaZenta, {"TimeFormat", "GlucUnit"}, "GlucUnit TimeFormat ", kReportOk, 2, 1},
     };
     for (const Case& c : cases) {
         SCOPED_TRACE(c.listed.front());
@@ -189,7 +179,6 @@ TEST_F(DeviceSettings, ListedItems) {
 
 TEST_F(DeviceSettings, EveryExitReportsOnceAndCompletes) {
     struct Exit {
-        const char* what;
         std::function<void(DeviceSettings&)> arrange;
         std::optional<Names> listed;  // none: every item
         std::int32_t result;
@@ -198,7 +187,7 @@ TEST_F(DeviceSettings, EveryExitReportsOnceAndCompletes) {
     };
     const std::string bad = "-17/-19/" + ErrorDescription(-19) + " ; Device ";
     const std::string failed = "-17/-2/" + ErrorDescription(-17) + ";;" + ErrorDescription(-2) + " ; ";
-    const std::string xml = "-17/-33/" + ErrorDescription(-33);
+    const std::string xml = "-17/-33/" + ErrorDescription(-33), other = "-8/-8/" + ErrorDescription(-8) + " ; Device ";
     auto fault = [](const char* fn, int type = 0) {  // on another meter type when one is given
         return [=](DeviceSettings& t) {
             if (type) t.discover(type);
@@ -211,39 +200,36 @@ TEST_F(DeviceSettings, EveryExitReportsOnceAndCompletes) {
             t.rec.Error_code = keep;
         };
     };
+    auto cfg = [](XMLWrapper doc) { return [=](DeviceSettings& t) { t.cfg = doc; }; };
+    XMLWrapper bare;
+    bare.AddElement("DeviceSettings");
     const std::vector<Exit> exits = {
-        {"negative port", info("-1", "MVX7001184", "7"), {}, -17,
+        {info("-1", "MVX7001184", "7"), {}, -17,
          "-3/-19/" + ErrorDescription(-19) + " ; Port number from XML file is invalid", false},
-        {"no serial", info("1", "", "7"), {}, -17, bad + "SN from Device Info XML is invalid", true},
-        {"type 9", info("1", "MVX7001184", "9"), {}, -17, bad + "Type from Device Info XML is invalid", true},
-        {"kept open", info("1", "", "7", -50), {}, -17, bad + "SN from Device Info XML is invalid", false},
-        {"other root", [](DeviceSettings& t) { t.cfg = newDoc(doc_kind::device_caps); }, Names{"Clock"}, -17,
-         xml + " ;", true},
-        {"empty list", nullptr, Names{}, -17, xml, true},
-        {"no Settings", [](DeviceSettings& t) { t.cfg = XMLWrapper(); t.cfg.AddElement("DeviceSettings"); },
-         Names{}, -17, xml + " ;Settings node missing in Device settings", true},
-        {"clock", fault("vb_Read_Meter_Clock"), {}, -2, failed + "Clock setting failed", true},
-        {"options", fault("vb_Read_Meter_Options"), Names{"Beep", "Bad"}, -2,
+        {info("1", "", "7"), {}, -17, bad + "SN from Device Info XML is invalid", true},
+        {info("1", "MVX7001184", "9"), {}, -17, bad + "Type from Device Info XML is invalid", true},
+        {info("1", "", "7", -50), {}, -17, bad + "SN from Device Info XML is invalid", false},
+        {cfg(newDoc(doc_kind::device_caps)), Names{"Clock"}, -17, xml + " ;", true},
+        {nullptr, Names{}, -17, xml, true},
+        {cfg(bare), Names{}, -17, xml + " ;Settings node missing in Device settings", true},
+        {fault("vb_Read_Meter_Clock"), {}, -2, failed + "Clock setting failed", true},
+        {fault("vb_Read_Meter_Options"), Names{"Beep", "Bad"}, -2,
          "-17/-2/" + ErrorDescription(-17) + ";Bad is not supported; ; GetAllGeneralSettings failed. Error is : " +
              ErrorDescription(-2), true},
-        {"insulins", fault("GetPredefinedInsulins"), {}, -2, failed + "Insulins setting failed", true},
-        {"pills", fault("GetPredefinedOralMeds"), {}, -2, failed + "OralMeds setting failed", true},
-        {"schedule", fault("GetMealSegments"), {}, -2, failed + "Schedule setting failed", true},
-        {"targets", fault("GetTargetRange"), {}, -2, failed + "Targets setting failed", true},
-        {"target unit", fault("vb_Read_Meter_Option"), Names{"Targets"}, -2, failed + "Target Units settings failed",
-         true},
-        {"identity", fault("vb_Chk4Meter"), {}, -2, "-17/-2/" + ErrorDescription(-2), false},
-        {"single read", fault("vb_Read_Meter_Option", eParvix), {}, -2, failed + "GluUnits settings failed", true},
-        {"serial", [](DeviceSettings&) { sim::setIdentitySerial("mvx7009999"); }, Names{"Beep", "CC"}, -17,
-         "-8/-8/" + ErrorDescription(-8) +
-             " ; Device SN from Device Info XML - MVX7001184 Device SN from device - mvx7009999 do not match",
-         false},
-        {"type", info("1", "MVX7001184", "2"), Names{"Beep"}, -17,
-         "-8/-8/" + ErrorDescription(-8) + " ; Device Type from Device Info XML - 2 Device Type from device - 7 do not match",
-         false},
+        {fault("GetPredefinedInsulins"), {}, -2, failed + "Insulins setting failed", true},
+        {fault("GetPredefinedOralMeds"), {}, -2, failed + "OralMeds setting failed", true},
+        {fault("GetMealSegments"), {}, -2, failed + "Schedule setting failed", true},
+        {fault("GetTargetRange"), {}, -2, failed + "Targets setting failed", true},
+        {fault("vb_Read_Meter_Option"), Names{"Targets"}, -2, failed + "Target Units settings failed", true},
+        {fault("vb_Read_Meter_Option", eParvix), {}, -2, failed + "GluUnits settings failed", true},
+        {fault("vb_Chk4Meter"), {}, -2, "-17/-2/" + ErrorDescription(-2), false},
+        {[](DeviceSettings&) { sim::setIdentitySerial("mvx7009999"); }, Names{"Beep", "CC"}, -17,
+         other + "SN from Device Info XML - MVX7001184 Device SN from device - mvx7009999 do not match", false},
+        {info("1", "MVX7001184", "2"), Names{"Beep"}, -17,
+         other + "Type from Device Info XML - 2 Device Type from device - 7 do not match", false},
     };
     for (const Exit& e : exits) {
-        SCOPED_TRACE(e.what);
+        SCOPED_TRACE(e.report);
         discover(eMorvex);
         if (e.arrange) e.arrange(*this);
         expectExit(get(e.listed), e.result, e.report, e.closes);

@@ -21,6 +21,11 @@
 
 namespace varnel::test {
 
+using Names = std::vector<std::string>;
+
+// The one report of a request that went well.
+inline const std::string kReportOk = "0/0/Operation completed successfully";
+
 // The status document's groups, each as "Major/Minor/ErrDesc", with "/VBTrace" when present.
 inline std::vector<std::string> statusGroups(const XMLWrapper& status) {
     pugi::xml_document doc;
@@ -48,6 +53,13 @@ inline std::string nodeText(pugi::xml_node n) {
     std::string out;
     for (pugi::xml_attribute a : n.attributes()) out += std::string(a.name()) + "=" + a.value() + " ";
     return out + n.child_value();
+}
+
+// The names of a node's children, each followed by a blank.
+inline std::string childNames(pugi::xml_node n) {
+    std::string names;
+    for (pugi::xml_node c : n.children()) names += c.name() + std::string(" ");
+    return names;
 }
 
 inline std::vector<std::string> childTexts(pugi::xml_node n) {
