@@ -17,9 +17,9 @@ namespace varnel::sim {
 namespace detail {
 namespace {
 
-#define I8(f) Field{#f, Width::I8, &RECORD_DATA::f, nullptr}
-#define I16(f) Field{#f, Width::I16, &RECORD_DATA::f, nullptr}
-#define H(f) Field{#f, Width::Hundredths, nullptr, &RECORD_DATA::f}
+#define I8(f) Field{#f, Width::I8, &RECORD_DATA::f, 0}
+#define I16(f) Field{#f, Width::I16, &RECORD_DATA::f, 0}
+#define H(f) Field{#f, Width::Hundredths, nullptr, offsetof(RECORD_DATA, f)}
 
 const Field kGlucose[] = {I16(reading),     I8(controlFlag),  I8(alternateSiteFlag),
                           I8(dietLabel),    I8(exerciseLabel), I8(stressFlag),
@@ -90,7 +90,7 @@ std::span<const Field> allValueFields() { return kAll; }
 bool sameRecord(const RECORD_DATA& a, const RECORD_DATA& b) {
     if (a.recType != b.recType || a.timeStamp != b.timeStamp || a.Ordinal != b.Ordinal) return false;
     return std::all_of(std::begin(kAll), std::end(kAll), [&](const Field& f) {
-        return f.real ? a.*f.real == b.*f.real : a.*f.integer == b.*f.integer;
+        return f.isReal() ? f.real(a) == f.real(b) : a.*f.integer == b.*f.integer;
     });
 }
 
@@ -145,7 +145,7 @@ std::int64_t get(const std::uint8_t*& p, std::size_t bytes) {
 // The stored form of one field, refusing what the width cannot hold exactly.
 std::int64_t storedValue(std::size_t index, const RECORD_DATA& r, const Field& f) {
     if (f.width == Width::Hundredths) {
-        const double v = r.*f.real;
+        const double v = f.real(r);
         const double scaled = v * 100.0;
         if (!std::isfinite(v) || std::fabs(scaled) > 2147483647.0)
             refuse(index, r, f.name, std::to_string(v), "is out of range");
@@ -192,7 +192,7 @@ void encodeBinaryDatalog(const std::vector<RECORD_DATA>& records, METER_BIN_DATA
             refuse(i, r, "recType", std::to_string(r.recType), "does not fit one byte");
         for (const Field& f : detail::allValueFields()) {
             const auto carried = detail::fieldsOf(r.recType);
-            const bool set = f.real ? r.*f.real != 0.0 : r.*f.integer != 0;
+            const bool set = f.isReal() ? f.real(r) != 0.0 : r.*f.integer != 0;
             if (set && std::none_of(carried.begin(), carried.end(),
                                     [&](const Field& c) { return std::string_view(c.name) == f.name; }))
                 refuse(i, r, f.name, "", "is not carried by this record type");
@@ -238,7 +238,7 @@ std::int16_t decodeBinaryRecord(const METER_BIN_DATALOG& d, int index, RECORD_DA
     for (const Field& f : detail::fieldsOf(recType)) {
         const std::int64_t v = get(p, widthOf(f.width));
         if (f.width == Width::Hundredths)
-            r.*f.real = static_cast<double>(v) / 100.0;
+            f.setReal(r, static_cast<double>(v) / 100.0);
         else
             r.*f.integer = static_cast<std::int16_t>(v);
     }

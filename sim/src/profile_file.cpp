@@ -273,7 +273,7 @@ void readBinaryDatalog(const Source& src, pugi::xml_node log, MeterProfile& p) {
         r.Ordinal = e.number<std::int16_t>("ordinal");
         for (const Field& f : detail::fieldsOf(r.recType)) {
             if (f.width == Width::Hundredths)
-                r.*f.real = e.real(f.name);
+                f.setReal(r, e.real(f.name));
             else
                 r.*f.integer = e.number<std::int16_t>(f.name);
         }
@@ -511,8 +511,8 @@ void writeProfileFile(const MeterProfile& p, const std::string& path) {
             for (const Field& f : detail::fieldsOf(rd.recType)) {
                 if (f.width != Width::Hundredths)
                     setIfNonZero(n, f.name, rd.*f.integer);
-                else if (rd.*f.real != 0.0)
-                    n.append_attribute(f.name) = realText(rd.*f.real).c_str();
+                else if (f.real(rd) != 0.0)
+                    n.append_attribute(f.name) = realText(f.real(rd)).c_str();
             }
         }
     } else {

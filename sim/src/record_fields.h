@@ -3,7 +3,9 @@
 // time stamp and ordinal.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
+#include <cstring>
 #include <span>
 
 #include "varnel/records.h"
@@ -13,11 +15,23 @@ namespace varnel::sim::detail {
 // How a field is stored: one signed byte, two bytes, or hundredths in four bytes.
 enum class Width : std::uint8_t { I8, I16, Hundredths };
 
+// A value field. Doubles sit on 4-byte boundaries in the packed record, so a
+// real field is reached by its offset and copied, never through a double pointer.
 struct Field {
     const char* name;
     Width width;
-    std::int16_t RECORD_DATA::*integer;
-    double RECORD_DATA::*real;
+    std::int16_t RECORD_DATA::*integer;  // null for a real field
+    std::size_t realOffset;
+
+    bool isReal() const { return integer == nullptr; }
+    double real(const RECORD_DATA& r) const {
+        double v;
+        std::memcpy(&v, reinterpret_cast<const unsigned char*>(&r) + realOffset, sizeof v);
+        return v;
+    }
+    void setReal(RECORD_DATA& r, double v) const {
+        std::memcpy(reinterpret_cast<unsigned char*>(&r) + realOffset, &v, sizeof v);
+    }
 };
 
 // The fields of a record type in stored order; empty for a type outside the table.
