@@ -441,15 +441,18 @@ void clsMeterFns::convertBinaryRecord(Grouping& g, ResultCollection& out,
         }
         g.open = false;
         break;
-    case 36:
+    case 36: {
         g.newMeterGroup();
-        for (auto [value, type] : {std::pair{w.weight, 100}, std::pair{w.height, 101}}) {
+        // Copies: the packed record's doubles cannot be bound to references.
+        const double weight = w.weight, height = w.height;
+        for (auto [value, type] : {std::pair{weight, 100}, std::pair{height, 101}}) {
             if (missing(value)) continue;
             g.join();
             out.Add(grouped(std::make_shared<BodyDimensions>(), value, type));
         }
         g.open = false;
         break;
+    }
     case 37:
         g.newGroup();
         g.newMeterGroup();
