@@ -10,6 +10,7 @@
 #include "component/err_propagator.h"
 #include "component/error_description.h"
 #include "component/request_frame.h"
+#include "documents/document_values.h"
 #include "documents/option_tables.h"
 #include "documents/settings_requests.h"
 #include "settings/clock_group.h"
@@ -21,17 +22,6 @@ namespace {
 
 // How an element of "Settings" is written.
 enum class Write { clock, option, devInit, insulins, pills, schedule, targets };
-
-// Meter types as bits: bit t for type t.
-using TypeSet = std::uint16_t;
-
-constexpr TypeSet types(std::initializer_list<int> list) {
-    TypeSet set = 0;
-    for (int t : list) set = static_cast<TypeSet>(set | (1u << t));
-    return set;
-}
-
-constexpr TypeSet kAllTypes = types({1, 2, 3, 4, 5, 6, 7, 8});
 
 struct SettingsItem {
     const char* name;
@@ -228,7 +218,7 @@ std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, 
             const auto item = std::find_if(std::begin(kItems), std::end(kItems), [&](const SettingsItem& it) {
                 return name == it.name || (it.alias && name == it.alias);
             });
-            if (item != std::end(kItems) && (item->acceptedFor >> meterType & 1u)) {
+            if (item != std::end(kItems) && has(item->acceptedFor, meterType)) {
                 wanted[item - std::begin(kItems)] = true;
                 ++accepted;
             } else if (std::find(std::begin(kReadOnlyItems), std::end(kReadOnlyItems), name) !=

@@ -14,6 +14,7 @@
 #include "component/error_description.h"
 #include "component/request_frame.h"
 #include "documents/discovery.h"
+#include "documents/document_values.h"
 #include "documents/option_tables.h"
 #include "documents/settings_requests.h"
 #include "session/option_writers.h"
@@ -23,19 +24,6 @@
 namespace varnel::detail {
 
 namespace {
-
-// Meter types as bits: bit t for type t.
-using TypeSet = std::uint16_t;
-
-constexpr TypeSet types(std::initializer_list<int> list) {
-    TypeSet set = 0;
-    for (int t : list) set = static_cast<TypeSet>(set | (1u << t));
-    return set;
-}
-
-constexpr TypeSet kAllTypes = types({1, 2, 3, 4, 5, 6, 7, 8});
-
-constexpr bool has(TypeSet set, std::int32_t type) { return type >= 0 && type < 16 && ((set >> type) & 1u) != 0; }
 
 enum class Kind : std::uint8_t { clock, option, insulins, pills, schedule, targets, glucRange, glucErrRange, glucCalib };
 
@@ -221,12 +209,6 @@ std::optional<std::string> readListing(XMLWrapper& caps, std::int16_t meterType,
     return description;
 }
 
-std::string twoDigits(int value) {
-    char text[8];
-    std::snprintf(text, sizeof text, "%02d", value);
-    return text;
-}
-
 void setLimits(XMLWrapper& doc, const Limits& limits, std::int16_t meterType, bool child) {
     if (!limits.min) return;
     const std::string max = limits.max ? limits.max : glucoseCeiling(meterType);
@@ -327,9 +309,7 @@ private:
         for (auto [name, day] : {std::pair{"Min", first}, std::pair{"Max", last}}) {
             const DateTime date = DateTime::fromSerial(day);
             caps_.AddChildElement(name);
-            caps_.SetChildAttribute("D", std::to_string(date.day()));
-            caps_.SetChildAttribute("MM", twoDigits(date.month()));
-            caps_.SetChildAttribute("Y", std::to_string(date.year()));
+            for (const auto& [attribute, value] : dateAttributes(date, false)) caps_.SetChildAttribute(attribute, value);
         }
         advance();
         return 0;

@@ -7,6 +7,7 @@
 
 #include "component/err_propagator.h"
 #include "component/request_frame.h"
+#include "documents/document_values.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {
@@ -38,20 +39,6 @@ std::string takeDatePart(std::string_view& rest, const std::string& firmware) {
     return part;
 }
 
-// A month number with at least two digits.
-std::string twoDigits(double value) {
-    char buf[32];
-    const int n = std::snprintf(buf, sizeof buf, "%02lld", std::llround(value));
-    return std::string(buf, static_cast<std::size_t>(n));
-}
-
-// The shortest decimal text of a number: 3, 3.5.
-std::string numberText(double value) {
-    char buf[32];
-    const auto end = std::to_chars(buf, buf + sizeof buf, value).ptr;
-    return std::string(buf, end);
-}
-
 // Meters that are switched off while they talk to the computer.
 bool talksWhileOff(std::int16_t meterType) { return meterType == 4 || meterType == 6 || meterType == 8; }
 
@@ -73,7 +60,7 @@ FirmwareText splitFirmware(const std::string& firmware) {
         else if (y >= 0 && y < 90)
             out.year = "20" + year;
     }
-    if (!month.empty()) out.month = twoDigits(ToNumber(month));
+    if (!month.empty()) out.month = TwoDigits(std::llround(ToNumber(month)));
     return out;
 }
 
@@ -131,7 +118,7 @@ std::int32_t discoverDevice(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XML
 
         const std::int16_t found = req.session.findmeter(udtMeterRec);
         if (found != 0) {
-            const std::string searched = comma == std::string::npos ? ports : numberText(port);
+            const std::string searched = comma == std::string::npos ? ports : NumberText(port);
             req.fail(req.session.LastError(), " ; No meter detected on port " + searched);
             SetContinueFlag(false);
             req.session.transport().initialize_meter_structure(udtMeterRec);

@@ -10,6 +10,7 @@
 #include <string>
 
 #include "component/err_propagator.h"
+#include "documents/document_values.h"
 
 namespace varnel::detail {
 
@@ -17,31 +18,6 @@ namespace {
 
 // The text GetTrueString gives; flags and health entries carry it.
 constexpr const char* kTrue = "true";
-
-// A whole number as decimal text.
-template <std::integral T>
-std::string numberText(T v) {
-    return std::to_string(v);
-}
-
-// A real number as decimal text with at most 15 significant digits, no
-// exponent and no trailing zeros: 12.5, 3, 0.25.
-std::string numberText(double v) {
-    if (v == 0) return "0";  // also for -0
-    std::array<char, 400> buf{};
-    if (!std::isfinite(v)) {
-        auto end = std::to_chars(buf.data(), buf.data() + buf.size(), v).ptr;
-        return std::string(buf.data(), end);
-    }
-    int decimals = std::max(0, 14 - static_cast<int>(std::floor(std::log10(std::fabs(v)))));
-    auto end = std::to_chars(buf.data(), buf.data() + buf.size(), v, std::chars_format::fixed, decimals).ptr;
-    std::string text(buf.data(), end);
-    if (text.find('.') != std::string::npos) {
-        text.erase(text.find_last_not_of('0') + 1);
-        if (text.back() == '.') text.pop_back();
-    }
-    return text;
-}
 
 // The concrete class of a result; a result that is not what its kind says is an error, never a guess.
 template <class T>
@@ -55,7 +31,7 @@ T& as(Result& r) {
 
 template <ResultKind K>
 std::string valueText(const Result& r) {
-    return numberText(as<ResultOf<K>>(r).Value());
+    return NumberText(as<ResultOf<K>>(r).Value());
 }
 
 // A text looked up by ResultType.
@@ -84,7 +60,7 @@ struct Entry {
     void childAttr(const char* name, const std::string& value) { doc.SetChildAttribute(name, value); }
     // Ord: only the binary-datalog meter numbers its entries.
     void ord(const Result& r) {
-        if (context.storedMeterType == 7) attr("Ord", numberText(r.Ordinal()));
+        if (context.storedMeterType == 7) attr("Ord", NumberText(r.Ordinal()));
     }
     // Attributes Name/Txt from a ResultType table; nothing for an unlisted type.
     void codedAttrs(const char* name, const Coded* c) {
@@ -111,7 +87,7 @@ void mealSlot(Entry& e, std::int32_t slot, bool glucose) {
     // Type-2 meters name their night and sleep glucose slots the other way round.
     const bool swapped = glucose && e.context.storedMeterType == 2 && slot >= 7;
     e.child("MealSlot");
-    e.childAttr("Slot", numberText(slot));
+    e.childAttr("Slot", NumberText(slot));
     e.childAttr("Txt", kMealSlotTexts[swapped ? 14 - slot : slot - 1]);
 }
 
@@ -164,8 +140,8 @@ void comments(Entry& e, const Glucose& g) {
         if (el->txt) e.childAttr("Txt", el->txt);
     }
     for (const CommentPtr& c : *events) {
-        e.child("Event", numberText(c->Id()), "Comments");
-        e.childAttr("Txt", "EVENT" + numberText(c->Id()));
+        e.child("Event", NumberText(c->Id()), "Comments");
+        e.childAttr("Txt", "EVENT" + NumberText(c->Id()));
     }
 }
 
@@ -184,7 +160,7 @@ void writeGlucose(Entry& e, const Result& r) {
             s = &x;
             break;
         }
-    e.attr("Val", numberText(g.Value()));
+    e.attr("Val", NumberText(g.Value()));
     e.attr("Type", s->kind);
     e.attr("Txt", s->txt);
     e.attr("Site", s->site);
@@ -197,14 +173,14 @@ void writeCheckStrip(Entry& e, const Result& r) {
     const CheckStrip& s = as<CheckStrip>(r);
     e.ord(r);
     e.attr("Site", "4");
-    e.attr("Val", numberText(s.Value()));
+    e.attr("Val", NumberText(s.Value()));
     e.attr("Type", "2");
     e.attr("Txt", "Check Strip");
     mealSlot(e, s.Slot(), false);
     e.child("Strip");
     e.child("Lvl", "1", "Strip");
-    e.childAttr("Upper", numberText(e.context.checkStripHigh));
-    e.childAttr("Lower", numberText(e.context.checkStripLow));
+    e.childAttr("Upper", NumberText(e.context.checkStripHigh));
+    e.childAttr("Lower", NumberText(e.context.checkStripLow));
 }
 
 // --- entries that take several results of one meter entry ---
@@ -269,7 +245,7 @@ void writeOrd(Entry& e, const Result& r) {
 void writeError(Entry& e, const Result& r) {
     e.child("Major", "Gluc Error");
     e.child("Minor", "Test.Flags=3");
-    e.child("Txt", numberText(as<Error>(r).Value()));
+    e.child("Txt", NumberText(as<Error>(r).Value()));
 }
 
 void writeChange(Entry& e, const Result& r) {
@@ -281,7 +257,7 @@ void writeChange(Entry& e, const Result& r) {
 
 void writeExercise(Entry& e, const Result& r) {
     const Exercise& x = as<Exercise>(r);
-    e.attr("Duration", numberText(static_cast<long long>(x.Hours()) * 60 + x.Minutes()));
+    e.attr("Duration", NumberText(static_cast<long long>(x.Hours()) * 60 + x.Minutes()));
     e.ord(r);
     static constexpr Coded levels[] = {{60, "0", "Mild"}, {61, "1", "Moderate"}, {62, "2", "Hard"}};
     e.codedChild("Intensity", lookup(levels, r.ResultType()));
@@ -289,7 +265,7 @@ void writeExercise(Entry& e, const Result& r) {
 
 void writeAlcohol(Entry& e, const Result& r) {
     const Alcohol& a = as<Alcohol>(r);
-    if (a.Value() > 0) e.attr("Val", numberText(a.Value()));
+    if (a.Value() > 0) e.attr("Val", NumberText(a.Value()));
     e.ord(r);
 }
 
@@ -305,7 +281,7 @@ void writePump(Entry& e, const Result& r) {
 
 void writeInjection(Entry& e, const Result& r) {
     const InsulinInjection& i = as<InsulinInjection>(r);
-    e.attr("Val", numberText(i.Value()));
+    e.attr("Val", NumberText(i.Value()));
     e.ord(r);
     e.attr("InsName", i.InsulinName());
 }
@@ -340,7 +316,7 @@ void writeMicroAlbumin(Entry& e, const Result& r) {
 void writeOralMed(Entry& e, const Result& r) {
     const OralMeds& m = as<OralMeds>(r);
     e.ord(r);
-    e.attr("Val", numberText(m.Value()));
+    e.attr("Val", NumberText(m.Value()));
     e.child("OMedName", m.OralMedsName());
 }
 
@@ -398,14 +374,7 @@ const char* elementName(const EntryKind& k, const Result& r) {
 }
 
 void dateAttributes(Entry& e, const DateTime& t) {
-    char month[8];
-    std::snprintf(month, sizeof month, "%02d", t.month());
-    e.attr("D", numberText(t.day()));
-    e.attr("MM", month);
-    e.attr("Y", numberText(t.year()));
-    e.attr("h", numberText(t.hour()));
-    e.attr("m", numberText(t.minute()));
-    e.attr("s", numberText(t.second()));
+    for (const auto& [attribute, value] : dateAttributes(t, true)) e.attr(attribute, value);
 }
 
 void cholesUnit(XMLWrapper& doc, const Cholestrol& first) {
@@ -473,14 +442,14 @@ void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryC
         if (k.value) k.value(e, first, first);
 
         checker.Clear();
-        checker.AddValue(numberText(first.ResultType()));
+        checker.AddValue(NumberText(first.ResultType()));
         for (int absorbed = 0; absorbed < k.merge.most && i < count; ++absorbed) {
             const ResultPtr nextItem = results.Item(i + 1);
             const Result& next = asResult(nextItem);
             if (next.kind() != k.kind) break;
             if (k.merge.sameGroup && next.GroupId() != first.GroupId()) break;
             if (k.merge.fits && !k.merge.fits(first, next)) break;
-            if (!checker.AddValue(numberText(next.ResultType()))) break;
+            if (!checker.AddValue(NumberText(next.ResultType()))) break;
             k.value(e, first, next);
             ++i;
         }

@@ -13,6 +13,7 @@
 #include "component/error_description.h"
 #include "component/request_frame.h"
 #include "documents/discovery.h"
+#include "documents/document_values.h"
 #include "documents/option_elements.h"
 #include "documents/option_tables.h"
 #include "documents/settings_requests.h"
@@ -156,17 +157,9 @@ constexpr MedicationItem<Group_OralMeds> kPillItem{
     &Group_OralMeds::OralMedName, &Group_OralMeds::FavOralMed, &Group_OralMeds::FavOralMedsCount,
     &Group_OralMeds::isOralMedChangeable};
 
-std::string twoDigits(int value) {
-    char buf[16];
-    std::snprintf(buf, sizeof buf, "%02d", value);
-    return buf;
-}
-
 // Day, month ("00") and year of a date as child attributes of the last added child.
 void setDateAttributes(XMLWrapper& doc, const DateTime& date) {
-    doc.SetChildAttribute("D", std::to_string(date.day()));
-    doc.SetChildAttribute("MM", twoDigits(date.month()));
-    doc.SetChildAttribute("Y", std::to_string(date.year()));
+    for (const auto& [attribute, value] : dateAttributes(date, false)) doc.SetChildAttribute(attribute, value);
 }
 
 // The document has exactly one "Settings" element below its document element.
@@ -307,10 +300,7 @@ SettingsRequest::Exit SettingsRequest::writeClock() {
     getMinMaxDates(req_.session.LastMeterType(), minDate, maxDate);
     const DateTime now = clock->ClockTime();
     cfg_.AddChildElement("Val");
-    setDateAttributes(cfg_, now);
-    cfg_.SetChildAttribute("h", std::to_string(now.hour()));
-    cfg_.SetChildAttribute("m", std::to_string(now.minute()));
-    cfg_.SetChildAttribute("s", std::to_string(now.second()));
+    for (const auto& [attribute, value] : dateAttributes(now, true)) cfg_.SetChildAttribute(attribute, value);
     cfg_.AddChildElement("Min");
     setDateAttributes(cfg_, DateTime::fromSerial(minDate));
     cfg_.AddChildElement("Max");
