@@ -1,5 +1,7 @@
 #include "component/request_frame.h"
 
+#include <algorithm>
+
 #include "component/err_propagator.h"
 #include "component/error_description.h"
 #include "util/helpers.h"
@@ -142,6 +144,14 @@ void Request::unexpected() {
     }
     owner.raiseComplete();
     throw ComponentError(e.ErrorNo, e.ErrorTrace, e.ErrLine);
+}
+
+ItemProgress::ItemProgress(std::int32_t count)
+    : step_(count > 0 ? roundToInt16(100.0 / count) : std::int16_t{0}) {}
+
+void ItemProgress::advance(DllWrapper::Impl& owner) {
+    percent_ = static_cast<std::int16_t>(std::min(percent_ + step_, 100));
+    owner.RaiseProgress(percent_);
 }
 
 }  // namespace varnel::detail

@@ -30,6 +30,19 @@ struct ProgressTimer {
     ProgressTimer& operator=(const ProgressTimer&) = delete;
 };
 
+// The progress of a request that handles count items: each item done adds
+// 100 / count (rounded, halves to even), capped at 100.
+class ItemProgress {
+public:
+    explicit ItemProgress(std::int32_t count = 0);
+    // Counts one more item done and raises the new percentage.
+    void advance(DllWrapper::Impl& owner);
+
+private:
+    std::int16_t step_;
+    std::int16_t percent_ = 0;
+};
+
 // One public request in progress. Creating it starts the routine trace afresh.
 class Request {
 public:

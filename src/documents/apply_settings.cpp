@@ -230,14 +230,13 @@ std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, 
         }
 
         std::shared_ptr<MeterModel> meter = session.Meter();
-        const std::int16_t step = accepted > 0 ? roundToInt16(100.0 / accepted) : 0;
+        ItemProgress progress(accepted);
         if (!meter) return stop(ME_FAIL, ME_NO_DEVICE, ErrorDescription(ME_NO_DEVICE));
 
         // One stage of 0-100, whatever an earlier request left.
         owner.resetPercentage();
         owner.PercentLimit(100);
         ApplyContext ctx{session, *meter, deviceCfg, outcome};
-        std::int16_t percent = 0;
         for (std::size_t i = 0; i < std::size(kItems); ++i) {
             if (!wanted[i]) continue;
             MissingElement missing;
@@ -256,8 +255,7 @@ std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, 
                 return invalidXml(" ;" + *missing + " missing in Device settings" +
                                   (outcome.strError.empty() ? "" : ";" + outcome.strError));
             if (!written) continue;
-            percent = static_cast<std::int16_t>(std::min(percent + step, 100));
-            owner.RaiseProgress(percent);
+            progress.advance(owner);
         }
 
         if (outcome.bFailure && outcome.bSuccess)

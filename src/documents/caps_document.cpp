@@ -227,7 +227,7 @@ public:
     CapsWriter(Request& req, XMLWrapper& caps, MeterModel* meter, Wanted& wanted)
         : req_(req), session_(req.session), caps_(caps), meter_(meter), wanted_(wanted),
           copy_(session_.storedRecord()), type_(copy_.M_Type),
-          step_(wanted.count > 0 ? roundToInt16(100.0 / wanted.count) : std::int16_t{0}) {}
+          progress_(wanted.count) {}
 
     // Describes the wanted settings: 0, or the code of the read that failed (reported).
     std::int16_t settings() {
@@ -396,8 +396,7 @@ private:
     }
 
     void advance() {
-        percent_ = std::min<std::int16_t>(static_cast<std::int16_t>(percent_ + step_), 100);
-        req_.owner.RaiseProgress(percent_);
+        progress_.advance(req_.owner);
     }
 
     Request& req_;
@@ -407,8 +406,7 @@ private:
     Wanted& wanted_;
     METER_REC copy_;
     std::int16_t type_;
-    std::int16_t step_;
-    std::int16_t percent_ = 0;
+    ItemProgress progress_;
 };
 
 }  // namespace

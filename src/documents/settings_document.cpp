@@ -221,8 +221,7 @@ private:
     std::shared_ptr<MeterModel> meter_;
     std::array<bool, kItemCount> wanted_{};
     std::int32_t listed_ = 0;  // children of the client's "Settings"
-    std::int16_t step_ = 0;
-    std::int16_t percent_ = 0;
+    ItemProgress progress_;
     std::string message_;
     bool unsupported_ = false;
     bool read_ = false;
@@ -248,8 +247,7 @@ ISetupGroup* SettingsRequest::readGroup(std::int32_t number, const char* failure
 }
 
 void SettingsRequest::advance() {
-    percent_ = static_cast<std::int16_t>(std::min(percent_ + step_, 100));
-    req_.owner.RaiseProgress(percent_);
+    progress_.advance(req_.owner);
 }
 
 SettingsRequest::Exit SettingsRequest::chooseItems() {
@@ -283,7 +281,7 @@ SettingsRequest::Exit SettingsRequest::chooseItems() {
             }
         }
     }
-    step_ = count > 0 ? roundToInt16(100.0 / count) : 0;
+    progress_ = ItemProgress(count);
     return std::nullopt;
 }
 
