@@ -69,7 +69,8 @@ const char* meterDisplayName(std::int32_t meterType) {
     return kDisplayNames[meterType];
 }
 
-void writeDeviceDescription(XMLWrapper& doc, MeterDll& session) {
+std::int16_t writeDeviceDescription(XMLWrapper& doc, MeterDll& session) {
+    if (const std::int16_t code = session.FirmwareCode()) return code;
     const METER_REC stored = session.storedRecord();
     doc.SelectElement("DeviceInfo");
     doc.AddElement("SN", session.LastMeterSerialNo());
@@ -87,6 +88,7 @@ void writeDeviceDescription(XMLWrapper& doc, MeterDll& session) {
     const bool off = talksWhileOff(stored.M_Type);
     doc.AddElement("CommState", off ? "0" : "1");
     doc.SetAttribute("Txt", off ? "Off" : "On");
+    return 0;
 }
 
 std::int32_t discoverDevice(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
@@ -125,6 +127,11 @@ std::int32_t discoverDevice(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XML
             return found;
         }
 
+        // A meter whose firmware could not be read is not described with a made-up version.
+        if (const std::int16_t f = req.session.FirmwareCode()) {
+            req.fail(f, kFirmwareFailed);
+            return f;
+        }
         SetContinueFlag(true);
         writeDeviceDescription(deviceInfo, req.session);
         deviceInfo.SelectElement("PortInfo");

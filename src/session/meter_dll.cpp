@@ -51,6 +51,8 @@ std::int16_t MeterDll::identify(Step step, METER_REC& udtMeterRec) {
         MeterSerialNumberFix();
         if (step != Step::Check) {
             const std::int16_t firmware = transport_->vb_Get_Meter_Firmware(working_);
+            // A failed read leaves whatever the record held: remembered, so nobody takes it for the meter's.
+            FirmwareCode_ = firmware == 0 ? std::int16_t{0} : working_.Error_code != 0 ? working_.Error_code : firmware;
             if (step == Step::Init) code = firmware;
             store();
         }
@@ -164,9 +166,18 @@ void MeterDll::GetHandle(std::int32_t& longHandle) {
 }
 
 std::int16_t MeterDll::DevInitialised() {
-    METER_REC copy = storedRecord();
-    transport_->GetInitializedFlag(copy, DevInitialised_);
+    readDevInitialised(DevInitialised_);
     return DevInitialised_;
+}
+
+std::int16_t MeterDll::readDevInitialised(std::int16_t& value) {
+    METER_REC copy = storedRecord();
+    std::int16_t flag = DevInitialised_;
+    const std::int16_t code = transport_->GetInitializedFlag(copy, flag);
+    if (code != 0) return copy.Error_code != 0 ? copy.Error_code : code;
+    DevInitialised_ = flag;
+    value = flag;
+    return 0;
 }
 
 std::int16_t MeterDll::setDevInitialised(std::int16_t value) {
