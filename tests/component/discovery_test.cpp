@@ -97,4 +97,17 @@ TEST_F(Discovery, PortsToSearchAndMissingPorts) {
     EXPECT_EQ(completions, 1);
 }
 
+// A meter whose firmware cannot be read is not described; the next discovery works.
+TEST_F(Discovery, AFailedFirmwareReadIsAReportedFailure) {
+    meterWith(eMorvex, 2);
+    sim::injectFault("vb_Get_Meter_Firmware", 1, ME_TIME_OUT, false);
+    EXPECT_EQ(discoverOn("2"), ME_TIME_OUT);
+    EXPECT_EQ(statusGroups(status), std::vector<std::string>{"-17/-2/Timeout error ; Firmware read failed"});
+    EXPECT_EQ(childNames(parsed(device)->document_element().child("DeviceInfo")), "");
+    EXPECT_EQ(completions, 0);
+    EXPECT_EQ(discoverOn("2"), ME_SUCCESS);
+    EXPECT_STREQ(parsed(device)->document_element().child("DeviceInfo").child_value("MasterSWVer"),
+                 detail::splitFirmware(sim::meter().firmware).version.c_str());
+}
+
 }  // namespace
