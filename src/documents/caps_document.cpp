@@ -232,7 +232,7 @@ public:
     // Describes the wanted settings: 0, or the code of the read that failed (reported).
     // The device description; a failed firmware read is reported like any failed read.
     std::int16_t device() {
-        if (const std::int16_t f = writeDeviceDescription(caps_, session_)) return readFailed(f, kFirmwareFailed);
+        if (const IdentityFailure f = writeDeviceDescription(caps_, session_)) return readFailed(f.code, f.context);
         return 0;
     }
 

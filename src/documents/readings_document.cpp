@@ -114,10 +114,10 @@ std::int32_t getReadings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWra
         owner.resetPercentage();
         UniqueChecker checker;
 
-        if (const std::int16_t f = writeDeviceDescription(datalog, session)) {
-            req.fail(f, kFirmwareFailed);
+        if (const IdentityFailure f = writeDeviceDescription(datalog, session)) {
+            req.fail(f.code, f.context);
             req.close();
-            return req.complete(f);
+            return req.complete(f.code);
         }
         writeTransferSummary(datalog, session);
         datalog.SelectElement("Records");

@@ -480,7 +480,7 @@ std::int32_t SettingsRequest::run(bool& blnCheckMeter) {
     if (Exit exit = chooseItems()) return *exit;
 
     cfg_.InitDocument(doc_kind::device_settings);
-    if (const std::int16_t f = writeDeviceDescription(cfg_, session)) return readFailed(f, kFirmwareFailed);
+    if (const IdentityFailure f = writeDeviceDescription(cfg_, session)) return readFailed(f.code, f.context);
     if (!meter_) {
         req_.fail(ME_FAIL);
         return closeAndEnd(ME_FAIL);

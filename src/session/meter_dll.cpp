@@ -13,6 +13,12 @@ constexpr int kSerialBytes = 20;
 
 std::string serialText(const METER_REC& rec) { return BytesToText(rec.Serial_number, kSerialBytes); }
 
+// Some meters only tell their serial number with an upload.
+bool serialUnknown(const std::string& serial) {
+    const std::string s = Trim(serial);
+    return s.empty() || s == "00";
+}
+
 }  // namespace
 
 MeterDll::MeterDll(std::shared_ptr<Transport> transport)
@@ -86,12 +92,13 @@ void MeterDll::AssignMeter() {
 
 void MeterDll::MeterSerialNumberFix() {
     guarded(kClass, "MeterSerialNumberFix", [&] {
-        const std::string serial = Trim(LastMeterSerialNo_);
-        if (!serial.empty() && serial != "00") return;
-        // Some meters only tell their serial number with an upload.
+        SerialCode_ = 0;
+        if (!serialUnknown(LastMeterSerialNo_)) return;
         if (!Meter_) raise(errc::missing_object, "The session has no meter model");
-        Meter_->GetReadingFromMeter();
+        const std::int16_t code = Meter_->GetReadingFromMeter();
         LastMeterSerialNo_ = serialText(storedRecord());
+        // A failed upload leaves the serial number unknown; "00" is not to be passed off as the meter's.
+        if (code != 0 && serialUnknown(LastMeterSerialNo_)) SerialCode_ = code;
     });
 }
 

@@ -73,6 +73,9 @@ public:
     std::int16_t LastMeterType() const { return LastMeterType_; }
     // The code of the last firmware read of find or init: 0 when the stored Firmware_number is the meter's.
     std::int16_t FirmwareCode() const { return FirmwareCode_; }
+    // The code of the upload that was to give the serial number of a meter identifying itself as "00"
+    // and failed: 0 when LastMeterSerialNo is what the meter says.
+    std::int16_t SerialCode() const { return SerialCode_; }
 
     // A copy of the stored record.
     METER_REC storedRecord() const { return mobjMeterFns->MeterRec; }
@@ -103,6 +106,7 @@ private:
     std::string LastMeterSerialNo_;
     std::int16_t LastMeterType_ = 0;
     std::int16_t FirmwareCode_ = 0;
+    std::int16_t SerialCode_ = 0;
     METER_REC working_{};
     std::shared_ptr<Transport> transport_;
     std::shared_ptr<clsMeterFns> mobjMeterFns;
