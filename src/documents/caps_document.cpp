@@ -230,6 +230,12 @@ public:
           progress_(wanted.count) {}
 
     // Describes the wanted settings: 0, or the code of the read that failed (reported).
+    // The device description; a failed firmware read is reported like any failed read.
+    std::int16_t device() {
+        if (const IdentityFailure f = writeDeviceDescription(caps_, session_)) return readFailed(f.code, f.context);
+        return 0;
+    }
+
     std::int16_t settings() {
         caps_.MoveToRoot();
         caps_.MoveToChild("Settings");
@@ -444,7 +450,7 @@ std::int32_t getDeviceCaps(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLW
             SetContinueFlag(true);
             status.InitDocument(doc_kind::status);
             deviceCaps.InitDocument(doc_kind::device_caps);
-            writeDeviceDescription(deviceCaps, session);
+            if (std::int16_t c = writer.device()) return closing(c);
             if (std::int16_t c = writer.settings()) return closing(c);
         }
         writer.records();

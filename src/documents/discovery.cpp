@@ -69,7 +69,14 @@ const char* meterDisplayName(std::int32_t meterType) {
     return kDisplayNames[meterType];
 }
 
-void writeDeviceDescription(XMLWrapper& doc, MeterDll& session) {
+IdentityFailure identityFailure(const MeterDll& session) {
+    if (const std::int16_t code = session.SerialCode()) return {code, " ; Serial number read failed"};
+    if (const std::int16_t code = session.FirmwareCode()) return {code, " ; Firmware read failed"};
+    return {};
+}
+
+IdentityFailure writeDeviceDescription(XMLWrapper& doc, MeterDll& session) {
+    if (const IdentityFailure failure = identityFailure(session)) return failure;
     const METER_REC stored = session.storedRecord();
     doc.SelectElement("DeviceInfo");
     doc.AddElement("SN", session.LastMeterSerialNo());
@@ -87,6 +94,7 @@ void writeDeviceDescription(XMLWrapper& doc, MeterDll& session) {
     const bool off = talksWhileOff(stored.M_Type);
     doc.AddElement("CommState", off ? "0" : "1");
     doc.SetAttribute("Txt", off ? "Off" : "On");
+    return {};
 }
 
 std::int32_t discoverDevice(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
@@ -116,6 +124,9 @@ std::int32_t discoverDevice(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XML
         }
         req.session.setCOMPort_Pref(roundToInt16(port));
 
+        // Finding may upload (a meter that tells its serial number no other way); an earlier
+        // failed search must not make that upload a silent no-op.
+        SetContinueFlag(true);
         const std::int16_t found = req.session.findmeter(udtMeterRec);
         if (found != 0) {
             const std::string searched = comma == std::string::npos ? ports : NumberText(port);
@@ -125,8 +136,12 @@ std::int32_t discoverDevice(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XML
             return found;
         }
 
+        // A meter whose identity could not be read in full is not described with made-up parts.
         SetContinueFlag(true);
-        writeDeviceDescription(deviceInfo, req.session);
+        if (const IdentityFailure failure = writeDeviceDescription(deviceInfo, req.session)) {
+            req.fail(failure.code, failure.context);
+            return failure.code;
+        }
         deviceInfo.SelectElement("PortInfo");
         deviceInfo.AddElement("PortID", std::to_string(req.session.COMPort_Detected()));
         deviceInfo.AddElement("PortType", "0");

@@ -27,20 +27,31 @@ constexpr ExtraUnit kExtraUnits[] = {
     {"CholesUnit", "mg/dL", [](std::int16_t t) { return t == eMorvex; }},
 };
 
+struct RecordCounts {
+    std::int32_t total, valid, corrupted;
+};
+
+RecordCounts recordCounts(MeterDll& session) {
+    const clsMeterFns& fns = session.meterFns();
+    // The binary datalog counts its corrupted records apart; the record datalog counts them in.
+    // Records that could not be read or dated gave no entry: they are corrupted, not valid.
+    const bool binary = session.storedRecord().M_Type == eMorvex;
+    const std::int32_t total = binary ? fns.recordCount() + fns.corruptedCount() : fns.recordCount();
+    const std::int32_t corrupted = fns.corruptedCount() + fns.unreadableCount();
+    return {total, total - corrupted, corrupted};
+}
+
 // Record counts, calibration and units of the upload.
 void writeTransferSummary(XMLWrapper& datalog, MeterDll& session) {
     const METER_REC stored = session.storedRecord();
     const clsMeterFns& fns = session.meterFns();
-    // The binary datalog counts its corrupted records apart; the record datalog counts them in.
-    const bool binary = stored.M_Type == eMorvex;
-    const std::int32_t total = binary ? fns.recordCount() + fns.corruptedCount() : fns.recordCount();
-    const std::int32_t valid = binary ? fns.recordCount() : fns.recordCount() - fns.corruptedCount();
+    const auto [total, valid, corrupted] = recordCounts(session);
 
     datalog.SelectElement("TransferDetail");
     datalog.AddElement("Records");
     datalog.AddChildElement("Total", "", std::to_string(total));
     datalog.AddChildElement("Valid", "", std::to_string(valid));
-    datalog.AddChildElement("Corrupted", "", std::to_string(fns.corruptedCount()));
+    datalog.AddChildElement("Corrupted", "", std::to_string(corrupted));
     datalog.AddChildElement("Capacity", "", std::to_string(fns.maxRecordsForMeter()));
 
     datalog.AddElement("ExtraInfo");
@@ -89,10 +100,10 @@ std::int32_t getReadings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWra
         }
         if (uploaded != 0) {
             req.fail(uploaded, " ; GetReadingFromMeter failed");
-            // The session's code, unless the failure left none behind.
-            const std::int16_t e = session.LastError();
+            // The upload's own code: the name tables read after it fail on their own record copy,
+            // so the session's Error_code may still hold an older code.
             req.close();
-            return req.complete(e != 0 ? e : uploaded);
+            return req.complete(uploaded);
         }
 
         owner.PercentLimit(100);
@@ -103,7 +114,11 @@ std::int32_t getReadings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWra
         owner.resetPercentage();
         UniqueChecker checker;
 
-        writeDeviceDescription(datalog, session);
+        if (const IdentityFailure f = writeDeviceDescription(datalog, session)) {
+            req.fail(f.code, f.context);
+            req.close();
+            return req.complete(f.code);
+        }
         writeTransferSummary(datalog, session);
         datalog.SelectElement("Records");
         const METER_REC stored = session.storedRecord();
@@ -118,6 +133,14 @@ std::int32_t getReadings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWra
         SetContinueFlag(true);
         if (std::int32_t r = req.compareIdentity()) return req.complete(r);
         datalog.MoveToRoot();
+        // Every entry that could be read is written, but the datalog is not all the meter holds.
+        const clsMeterFns& fns = session.meterFns();
+        if (const std::int32_t lost = fns.unreadableCount()) {
+            const std::int16_t code = fns.unreadableCode();
+            req.fail(code, " ; " + std::to_string(lost) + " of " + std::to_string(recordCounts(session).total) +
+                               " records could not be read");
+            return req.complete(code);
+        }
         return req.complete(ME_SUCCESS);
     });
 }

@@ -78,6 +78,12 @@ struct Entry {
 
 // --- glucose and check strip ---
 
+// "High" above the meter's range, "Low" below it, nothing within it: a HI or LO reading
+// carries the meter's limit as its value and must not pass for a measured one.
+const char* rangeText(std::int32_t valueInMeterRange) {
+    return valueInMeterRange == 1 ? "High" : valueInMeterRange == 2 ? "Low" : nullptr;
+}
+
 constexpr const char* kMealSlotTexts[] = {
     "Before Breakfast", "After Breakfast", "Before Lunch", "After Lunch",
     "Before Dinner",    "After Dinner",    "Night",        "Sleep"};
@@ -161,6 +167,7 @@ void writeGlucose(Entry& e, const Result& r) {
             break;
         }
     e.attr("Val", NumberText(g.Value()));
+    if (const char* range = rangeText(g.ValueInMeterRange())) e.attr("Range", range);
     e.attr("Type", s->kind);
     e.attr("Txt", s->txt);
     e.attr("Site", s->site);
@@ -174,6 +181,7 @@ void writeCheckStrip(Entry& e, const Result& r) {
     e.ord(r);
     e.attr("Site", "4");
     e.attr("Val", NumberText(s.Value()));
+    if (const char* range = rangeText(s.ValueInMeterRange())) e.attr("Range", range);
     e.attr("Type", "2");
     e.attr("Txt", "Check Strip");
     mealSlot(e, s.Slot(), false);
@@ -198,8 +206,11 @@ void valueHtWt(Entry& e, const Result&, const Result& r) {
 void valueCholes(Entry& e, const Result&, const Result& r) {
     static constexpr Coded names[] = {
         {130, "LDL", ""}, {131, "HDL", ""}, {140, "Total", ""}, {150, "Trig", ""}};
-    if (const Coded* c = lookup(names, r.ResultType()))
-        e.child(c->text, valueText<ResultKind::Cholestrol>(r));
+    const Coded* c = lookup(names, r.ResultType());
+    if (!c) return;
+    e.child(c->text, valueText<ResultKind::Cholestrol>(r));
+    // One entry holds several values; each says for itself whether it is out of range.
+    if (const char* range = rangeText(as<Cholestrol>(r).ValueInMeterRange())) e.childAttr("Range", range);
 }
 
 bool isSnack(const Result& r) {

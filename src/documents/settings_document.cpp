@@ -204,7 +204,7 @@ private:
     Exit chooseItems();
     Exit writeItem(const ItemRow& item);
     Exit writeClock();
-    void writeDevInit();
+    Exit writeDevInit();
     template <class G>
     Exit writeMedications(const MedicationItem<G>& item);
     Exit writeSchedule();
@@ -289,6 +289,8 @@ SettingsRequest::Exit SettingsRequest::writeClock() {
     Exit exit;
     auto* clock = static_cast<Group_Clock*>(readGroup(eGroupClock, " ; Clock setting failed", exit));
     if (!clock) return exit;
+    DateTime now;
+    if (const std::int16_t c = clock->readClockTime(now)) return readFailed(c, " ; Clock setting failed");
     cfg_.AddElement("Clock");
     cfg_.SetAttribute("Mode", "1");
     advance();
@@ -296,7 +298,6 @@ SettingsRequest::Exit SettingsRequest::writeClock() {
     std::int32_t minDate = 0;
     std::int32_t maxDate = 0;
     getMinMaxDates(req_.session.LastMeterType(), minDate, maxDate);
-    const DateTime now = clock->ClockTime();
     cfg_.AddChildElement("Val");
     for (const auto& [attribute, value] : dateAttributes(now, true)) cfg_.SetChildAttribute(attribute, value);
     cfg_.AddChildElement("Min");
@@ -313,13 +314,18 @@ SettingsRequest::Exit SettingsRequest::writeClock() {
     return std::nullopt;
 }
 
-void SettingsRequest::writeDevInit() {
-    const std::int16_t value = req_.session.DevInitialised();
+SettingsRequest::Exit SettingsRequest::writeDevInit() {
+    std::int16_t value = 0;
+    // A flag that could not be read is not "No".
+    if (const std::int16_t c = req_.session.readDevInitialised(value))
+        return readFailed(c, " ; DevInit setting failed");
     cfg_.AddElement("DevInit", std::to_string(value));
     cfg_.SetAttribute("Mode", "1");
     cfg_.SetAttribute("Txt", value == 0 ? "No" : "Yes");
     cfg_.SetAttribute("Min", "0");
     cfg_.SetAttribute("Max", "1");
+    advance();
+    return std::nullopt;
 }
 
 template <class G>
@@ -428,10 +434,7 @@ SettingsRequest::Exit SettingsRequest::writeItem(const ItemRow& item) {
         if (!options_.bulk()) read_ = true;
         advance();
         return std::nullopt;
-    case Kind::devInit:
-        writeDevInit();
-        advance();
-        return std::nullopt;
+    case Kind::devInit: return writeDevInit();
     case Kind::insulins: return writeMedications(kInsulinItem);
     case Kind::pills: return writeMedications(kPillItem);
     case Kind::schedule: return writeSchedule();
@@ -477,7 +480,7 @@ std::int32_t SettingsRequest::run(bool& blnCheckMeter) {
     if (Exit exit = chooseItems()) return *exit;
 
     cfg_.InitDocument(doc_kind::device_settings);
-    writeDeviceDescription(cfg_, session);
+    if (const IdentityFailure f = writeDeviceDescription(cfg_, session)) return readFailed(f.code, f.context);
     if (!meter_) {
         req_.fail(ME_FAIL);
         return closeAndEnd(ME_FAIL);

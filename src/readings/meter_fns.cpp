@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "component/err_propagator.h"
+#include "readings/meter_reads.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {
@@ -173,9 +174,10 @@ void clsMeterFns::conversionProgress(std::int32_t index, std::int32_t count, std
     doEvents();
 }
 
-DateTime clsMeterFns::meterDate(std::int32_t seconds) {
+std::int16_t clsMeterFns::meterDate(std::int32_t seconds, DateTime& date) {
     TIME_REC t{};
-    transport->convert_from_seconds(seconds, t);
+    // A record the transport cannot date has no date at all; it never gets a made-up one.
+    if (const std::int16_t code = meterTimeOf(*transport, seconds, t)) return code;
     // Two-digit years: 0-29 are 2000-2029, 30-99 are 1930-1999.
     int yy = (t.year % 100 + 100) % 100;
     int year = yy < 30 ? 2000 + yy : 1900 + yy;
@@ -184,9 +186,15 @@ DateTime clsMeterFns::meterDate(std::int32_t seconds) {
     int monthsDown = months >= 0 ? months / 12 : (months - 11) / 12;
     auto first = DateTime::fromParts(year + monthsDown, months - monthsDown * 12 + 1, 1);
     if (!first) raise(errc::overflow, "Overflow");
-    DateTime date = first->addSeconds((std::int64_t(t.mday) - 1) * 86400);
+    DateTime day = first->addSeconds((std::int64_t(t.mday) - 1) * 86400);
     DateTime time = DateTime::fromSeconds(std::int64_t(t.hour) * 3600 + t.min * 60 + t.sec);
-    return ToDateTime(date, time);
+    date = ToDateTime(day, time);
+    return 0;
+}
+
+void clsMeterFns::unreadable(std::int16_t code) {
+    if (unreadableCount_ == 0) unreadableCode_ = code;
+    ++unreadableCount_;
 }
 
 bool clsMeterFns::NonFastmeterUpload(std::string&, std::int16_t&, ResultCollection& objresultcol) {
@@ -195,21 +203,29 @@ bool clsMeterFns::NonFastmeterUpload(std::string&, std::int16_t&, ResultCollecti
         recordCount_ = log.recordCount;
         maxRecordsForMeter_ = log.maxRecordsForMeter;
         unmatchedCount_ = 0;
+        unreadableCount_ = 0;
+        unreadableCode_ = 0;
         // A transport reporting more valid records than records (or a negative count) damaged none.
         corruptedCount_ = std::max(0, std::int32_t(log.recordCount) - std::int32_t(log.ValidRecordCount));
         std::int32_t last = 0;
         for (std::int32_t i = 0; i < recordCount_; ++i) {
             if (i >= static_cast<std::int32_t>(std::size(log.DataLog))) subscriptError();
-            convertRecord(log.DataLog[i], objresultcol);
+            const data_rec& record = log.DataLog[i];
+            // Records the meter marks invalid give nothing and are counted as corrupted already.
+            if (record.Valid == 0) {
+                DateTime date;
+                if (const std::int16_t code = meterDate(record.D_Time, date))
+                    unreadable(code);
+                else
+                    convertRecord(record, date, objresultcol);
+            }
             conversionProgress(i, recordCount_, last);
         }
-        return true;
+        return unreadableCount_ == 0;
     });
 }
 
-void clsMeterFns::convertRecord(const data_rec& record, ResultCollection& out) {
-    DateTime date = meterDate(record.D_Time);
-    if (record.Valid != 0) return;
+void clsMeterFns::convertRecord(const data_rec& record, const DateTime& date, ResultCollection& out) {
     const TEST_REC& test = record.Test;
     auto make = [&](auto r) {
         r->setDateTime(date);
@@ -268,16 +284,27 @@ bool clsMeterFns::Fastmeterupload(std::string&, std::int16_t&, ResultCollection&
         recordCount_ = log.recordCount;
         maxRecordsForMeter_ = log.maxRecordsForMeter;
         unmatchedCount_ = 0;
+        unreadableCount_ = 0;
+        unreadableCode_ = 0;
         corruptedCount_ = log.corruptedCount > 0 ? log.corruptedCount : 0;
         Grouping grouping;
         std::int32_t last = 0;
         for (std::int32_t i = 0; i < recordCount_; ++i) {
-            workRecord_.recType = 0;
-            if (transport->GetMeterDatalogRecordData(log, toInt16(i), workRecord_) != 0) return false;
-            convertBinaryRecord(grouping, objresultcol, OralMedsArray, InsulinsArray);
+            const std::int16_t index = toInt16(i);
+            std::int16_t code = readTwice([&] {
+                workRecord_.recType = 0;
+                return transport->GetMeterDatalogRecordData(log, index, workRecord_);
+            });
+            DateTime date;
+            if (code == 0) code = meterDate(workRecord_.timeStamp, date);
+            // One record that cannot be read costs that record only, never the ones after it.
+            if (code != 0)
+                unreadable(code);
+            else
+                convertBinaryRecord(grouping, date, objresultcol, OralMedsArray, InsulinsArray);
             conversionProgress(i, recordCount_, last);
         }
-        return true;
+        return unreadableCount_ == 0;
     });
 }
 
@@ -293,11 +320,11 @@ std::shared_ptr<HealthNotes> clsMeterFns::getNewHealthNote(std::int32_t groupId,
     });
 }
 
-void clsMeterFns::convertBinaryRecord(Grouping& g, ResultCollection& out,
+void clsMeterFns::convertBinaryRecord(Grouping& g, const DateTime& date, ResultCollection& out,
                                       const std::vector<std::string>& OralMedsArray,
                                       const std::vector<std::string>& InsulinsArray) {
     const RECORD_DATA& w = workRecord_;
-    g.date = meterDate(w.timeStamp);
+    g.date = date;
     g.placed = false;
     auto stamp = [&](auto r) {
         r->setDateTime(g.date);

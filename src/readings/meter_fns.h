@@ -43,16 +43,22 @@ public:
     std::int32_t corruptedCount() const { return corruptedCount_; }
     std::int32_t unmatchedCount() const { return unmatchedCount_; }
     std::int32_t maxRecordsForMeter() const { return maxRecordsForMeter_; }
+    // Records of the last conversion that could not be decoded or dated (they gave no result),
+    // and the failure code of the first of them (0 when every record was read).
+    std::int32_t unreadableCount() const { return unreadableCount_; }
+    std::int16_t unreadableCode() const { return unreadableCode_; }
 
     // The datalogs of the last uploads; conversions read them as they are.
     METER_DATALOG& recordDatalog() { return *recordDatalog_; }
     METER_BIN_DATALOG& binaryDatalog() { return *binaryDatalog_; }
 
     // Converts the record datalog into objresultcol. Serial number and device type are not used.
+    // A record that cannot be dated is counted as unreadable and skipped; false when any was.
     bool NonFastmeterUpload(std::string& MSerialnumber, std::int16_t& MDevicetype,
                             ResultCollection& objresultcol);
     // Converts the binary datalog into objresultcol; the arrays are the meter's oral-medication
-    // and insulin names, zero-based. False when a record cannot be decoded (earlier results stay).
+    // and insulin names, zero-based. A record that cannot be decoded or dated is counted as
+    // unreadable and skipped, the others are still converted; false when any was.
     bool Fastmeterupload(std::string& MSerialnumber, std::int16_t& MDevicetype,
                          ResultCollection& objresultcol, const std::vector<std::string>& OralMedsArray,
                          const std::vector<std::string>& InsulinsArray);
@@ -64,13 +70,16 @@ private:
     enum class UploadMode { Idle, Binary, Records };
     struct Grouping;
 
-    DateTime meterDate(std::int32_t seconds);
+    // The date of meter seconds: 0, or the failure code of the time conversion (date untouched).
+    std::int16_t meterDate(std::int32_t seconds, DateTime& date);
+    // Counts a record that gave no result because it could not be read.
+    void unreadable(std::int16_t code);
     void timerTick();
     void conversionProgress(std::int32_t index, std::int32_t count, std::int32_t& last);
     void raiseProgress(std::int16_t percent);
     std::int16_t upload(UploadMode mode, const std::function<std::int16_t()>& call);
-    void convertRecord(const data_rec& record, ResultCollection& out);
-    void convertBinaryRecord(Grouping& g, ResultCollection& out,
+    void convertRecord(const data_rec& record, const DateTime& date, ResultCollection& out);
+    void convertBinaryRecord(Grouping& g, const DateTime& date, ResultCollection& out,
                              const std::vector<std::string>& OralMedsArray,
                              const std::vector<std::string>& InsulinsArray);
 
@@ -83,6 +92,8 @@ private:
     std::int32_t corruptedCount_ = 0;
     std::int32_t unmatchedCount_ = 0;
     std::int32_t maxRecordsForMeter_ = 0;
+    std::int32_t unreadableCount_ = 0;
+    std::int16_t unreadableCode_ = 0;
     // Never reset: a later upload of the session reports only above what was reached.
     std::int32_t lastTimerProgress_ = 0;
     TimerControl& mobjTimer;

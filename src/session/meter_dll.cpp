@@ -13,6 +13,12 @@ constexpr int kSerialBytes = 20;
 
 std::string serialText(const METER_REC& rec) { return BytesToText(rec.Serial_number, kSerialBytes); }
 
+// Some meters only tell their serial number with an upload.
+bool serialUnknown(const std::string& serial) {
+    const std::string s = Trim(serial);
+    return s.empty() || s == "00";
+}
+
 }  // namespace
 
 MeterDll::MeterDll(std::shared_ptr<Transport> transport)
@@ -51,6 +57,8 @@ std::int16_t MeterDll::identify(Step step, METER_REC& udtMeterRec) {
         MeterSerialNumberFix();
         if (step != Step::Check) {
             const std::int16_t firmware = transport_->vb_Get_Meter_Firmware(working_);
+            // A failed read leaves whatever the record held: remembered, so nobody takes it for the meter's.
+            FirmwareCode_ = firmware == 0 ? std::int16_t{0} : working_.Error_code != 0 ? working_.Error_code : firmware;
             if (step == Step::Init) code = firmware;
             store();
         }
@@ -84,12 +92,13 @@ void MeterDll::AssignMeter() {
 
 void MeterDll::MeterSerialNumberFix() {
     guarded(kClass, "MeterSerialNumberFix", [&] {
-        const std::string serial = Trim(LastMeterSerialNo_);
-        if (!serial.empty() && serial != "00") return;
-        // Some meters only tell their serial number with an upload.
+        SerialCode_ = 0;
+        if (!serialUnknown(LastMeterSerialNo_)) return;
         if (!Meter_) raise(errc::missing_object, "The session has no meter model");
-        Meter_->GetReadingFromMeter();
+        const std::int16_t code = Meter_->GetReadingFromMeter();
         LastMeterSerialNo_ = serialText(storedRecord());
+        // A failed upload leaves the serial number unknown; "00" is not to be passed off as the meter's.
+        if (code != 0 && serialUnknown(LastMeterSerialNo_)) SerialCode_ = code;
     });
 }
 
@@ -164,9 +173,18 @@ void MeterDll::GetHandle(std::int32_t& longHandle) {
 }
 
 std::int16_t MeterDll::DevInitialised() {
-    METER_REC copy = storedRecord();
-    transport_->GetInitializedFlag(copy, DevInitialised_);
+    readDevInitialised(DevInitialised_);
     return DevInitialised_;
+}
+
+std::int16_t MeterDll::readDevInitialised(std::int16_t& value) {
+    METER_REC copy = storedRecord();
+    std::int16_t flag = DevInitialised_;
+    const std::int16_t code = transport_->GetInitializedFlag(copy, flag);
+    if (code != 0) return copy.Error_code != 0 ? copy.Error_code : code;
+    DevInitialised_ = flag;
+    value = flag;
+    return 0;
 }
 
 std::int16_t MeterDll::setDevInitialised(std::int16_t value) {

@@ -46,6 +46,8 @@ public:
 
     // The meter's initialised flag, read from or written to the meter.
     std::int16_t DevInitialised();
+    // Reads the initialised flag into value: 0, or the transport's code (value then untouched).
+    std::int16_t readDevInitialised(std::int16_t& value);
     // The transport's code for the write.
     std::int16_t setDevInitialised(std::int16_t value);
 
@@ -69,6 +71,11 @@ public:
     void setMeter(std::shared_ptr<MeterModel> meter) { Meter_ = std::move(meter); }
     const std::string& LastMeterSerialNo() const { return LastMeterSerialNo_; }
     std::int16_t LastMeterType() const { return LastMeterType_; }
+    // The code of the last firmware read of find or init: 0 when the stored Firmware_number is the meter's.
+    std::int16_t FirmwareCode() const { return FirmwareCode_; }
+    // The code of the upload that was to give the serial number of a meter identifying itself as "00"
+    // and failed: 0 when LastMeterSerialNo is what the meter says.
+    std::int16_t SerialCode() const { return SerialCode_; }
 
     // A copy of the stored record.
     METER_REC storedRecord() const { return mobjMeterFns->MeterRec; }
@@ -98,6 +105,8 @@ private:
     bool CanContinue_ = true;
     std::string LastMeterSerialNo_;
     std::int16_t LastMeterType_ = 0;
+    std::int16_t FirmwareCode_ = 0;
+    std::int16_t SerialCode_ = 0;
     METER_REC working_{};
     std::shared_ptr<Transport> transport_;
     std::shared_ptr<clsMeterFns> mobjMeterFns;

@@ -1,6 +1,7 @@
 #include "settings/clock_group.h"
 
 #include "component/err_propagator.h"
+#include "readings/meter_reads.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {
@@ -32,6 +33,8 @@ std::int16_t Group_Clock::saveToMeter() {
 
 DateTime Group_Clock::ClockTime() { return getTimeForSec(ClockInSeconds); }
 
+std::int16_t Group_Clock::readClockTime(DateTime& clock) { return timeForSec(ClockInSeconds, clock); }
+
 void Group_Clock::setClockTime(const DateTime& clock) { ClockInSeconds = getSecondsFor(clock); }
 
 std::int32_t Group_Clock::getSecondsFor(const DateTime& clock) {
@@ -47,16 +50,28 @@ std::int32_t Group_Clock::getSecondsFor(const DateTime& clock) {
     });
 }
 
+// Transport seconds to date-time: 0, or the conversion's failure code.
+std::int16_t Group_Clock::convertTime(std::int32_t seconds, DateTime& time) {
+    TIME_REC t{};
+    if (const std::int16_t code = meterTimeOf(transport(), seconds, t)) return code;
+    auto date = DateTime::fromParts(windowedYear(t.year), t.mon, t.mday);
+    auto clock = DateTime::fromParts(1899, 12, 30, t.hour, t.min, t.sec);
+    if (!date || !clock) raise(errc::internal, "The meter clock is not a valid date and time");
+    time = ToDateTime(*date, *clock);
+    return 0;
+}
+
 DateTime Group_Clock::getTimeForSec(std::int32_t seconds) {
     return guarded(kClass, "getTimeForSec", [&] {
-        TIME_REC t{};
-        transport().convert_from_seconds(seconds, t);
-        auto date = DateTime::fromParts(windowedYear(t.year), t.mon, t.mday);
-        auto time = DateTime::fromParts(1899, 12, 30, t.hour, t.min, t.sec);
-        if (!date || !time)
-            raise(errc::internal, "The meter clock is not a valid date and time");
-        return ToDateTime(*date, *time);
+        DateTime time;
+        if (const std::int16_t code = convertTime(seconds, time))
+            raise(errc::internal, "The meter clock could not be converted (code " + std::to_string(code) + ")");
+        return time;
     });
+}
+
+std::int16_t Group_Clock::timeForSec(std::int32_t seconds, DateTime& time) {
+    return guarded(kClass, "getTimeForSec", [&] { return convertTime(seconds, time); });
 }
 
 }  // namespace varnel::detail

@@ -83,20 +83,16 @@ void MedicationGroup::clearValues() {
 std::int16_t MedicationGroup::readFromMeter() {
     return guarded(table_.className, "readFromMeter", [&]() -> std::int16_t {
         Transport& t = transport();
-        std::int16_t last = 0;
         for (std::int32_t p = 1; p <= table_.count; ++p) {
             if (!GetContinueFlag()) return 0;
             INSULIN_OR_ORAL_MED_NAME_TYPE record{};
             record.index = toInt16(p);
-            last = outcome((t.*table_.getName)(rec_, record));
-            // A position the meter did not give keeps what it held rather than an empty name.
-            if (last != 0) continue;
+            // A name the meter did not give fails the read: an empty name would pass for the meter's.
+            if (const std::int16_t code = outcome((t.*table_.getName)(rec_, record))) return code;
             const auto slot = static_cast<std::size_t>(p - 1);
             names_[slot] = BytesToText(record.nameStr, kNameReadBytes);
             notChangeable_[slot] = record.notChangeable;
         }
-        // Meters answer the whole table; only the last position decides whether it was read.
-        if (last != 0) return last;
         std::fill(changed_.begin(), changed_.end(), false);
         std::vector<std::int16_t> received(static_cast<std::size_t>(table_.favouriteCount));
         for (std::int32_t f = 1; f <= table_.favouriteCount; ++f) {

@@ -34,7 +34,8 @@ class MedicationGroup : public ISetupGroup {
 public:
     // Also empties the table: no names, zero codes and favourites, no changes.
     // Reads every name, then the favourites; stops early, returning 0, when the
-    // continue flag is cleared.
+    // continue flag is cleared. The first name or favourite the meter does not
+    // give ends the read with its code.
     std::int16_t readFromMeter() override;
     // Writes the changed names at the custom positions, then all favourites.
     std::int16_t saveToMeter() override;

@@ -166,6 +166,8 @@ TEST_F(Caps, EveryExit) {
                   "-17/-2/Operation failed;;Timeout error ; StripCalCode setting failed"},
              Case{sn, "7", "", "GetScheduleSelection", ME_COM_ERROR,
                   "-17/-3/Operation failed;;Communication errorSchedule setting failed"},
+             Case{sn, "7", "", "vb_Get_Meter_Firmware", ME_TIME_OUT,
+                  "-17/-2/Operation failed;;Timeout error ; Firmware read failed"},
              Case{sn, "7", "", "vb_Chk4Meter", ME_COM_ERROR, "-17/-3/Communication error", false, 0},
              Case{"other1", "7", "", "", ME_FAIL,
                   other + "SN from Device Info XML - other1 Device SN from device - " + sn + " do not match", false},

@@ -83,7 +83,12 @@ TEST_F(Readings, RecordDatalogAsTheMeterHoldsIt) {
         const bool error = valid[i].Test.Flags == 3;
         EXPECT_STREQ(written[i].name(), error ? "Error" : "Gluc") << i;
         EXPECT_EQ(entry(written[i]), expected(valid[i].Test.Result, valid[i].D_Time)) << i;
+        // A HI or LO reading says so; a measured one carries no range.
+        const std::int16_t flags = valid[i].Test.Flags;
+        EXPECT_STREQ(written[i].attribute("Range").value(), flags == 1 ? "High" : flags == 2 ? "Low" : "") << i;
     }
+    EXPECT_TRUE(std::any_of(valid.begin(), valid.end(), [](const data_rec& e) { return e.Test.Flags == 1; }));
+    EXPECT_TRUE(std::any_of(valid.begin(), valid.end(), [](const data_rec& e) { return e.Test.Flags == 2; }));
 }
 
 TEST_F(Readings, BinaryDatalogWithOrdinalsAndEveryUnit) {
@@ -140,6 +145,7 @@ TEST_F(Readings, EveryExit) {
              Case{sn, "9", bad + "Device Type from Device Info XML is invalid", ME_BAD_PARAMETER, true},
              Case{sn, "3", upload, ME_TIME_OUT, true, 0, "vb_Upload_Meter_Datalog"},
              Case{sn, "3", upload, ME_TIME_OUT, false, 0, "vb_Upload_Meter_Datalog", -50},
+             Case{sn, "3", "-17/-2/Timeout error ; Firmware read failed", ME_TIME_OUT, true, 0, "vb_Get_Meter_Firmware"},
              Case{sn, "3", "-17/-3/Communication error", ME_COM_ERROR, false, records, "vb_Chk4Meter"},
              Case{"OTHER1", "3",
                   other + "SN from Device Info XML - OTHER1 Device SN from device - " + sn + " do not match",
@@ -161,6 +167,89 @@ TEST_F(Readings, EveryExit) {
     datalog = newDoc(doc_kind::filter);
     EXPECT_EQ(unexpectedTrace([&] { read(); }), "91 getReadings --> ");
     expectUnexpected("Unknown status;Error number = 91 Error description = ");
+}
+
+// A record that cannot be read or dated is lost alone: every other entry is written with
+// its own date, the counts add up, and the request fails saying how many records were lost.
+TEST_F(Readings, UnreadableRecordsAreCountedAndReportedWithEveryOtherEntryKept) {
+    // A binary datalog of plain glucose tests: one entry per record, in record order.
+    sim::MeterProfile binary = sim::defaultProfile(eMorvex);
+    binary.binaryDatalog.clear();
+    for (std::int16_t i = 0; i < 8; ++i) {
+        RECORD_DATA& r = binary.binaryDatalog.emplace_back();
+        r.timeStamp = sim::secondsOf(2004, 3, 1 + i, 8, 30, i), r.Ordinal = i, r.reading = 100 + i;
+    }
+    struct Case {
+        int type;
+        const char* function;
+        int record;       // the record whose read fails, 0-based among the records that are read
+        int tries;        // failing calls from that record's first one: 1 is retried, 2 loses it
+        bool persistent;  // every later call fails too
+        int lost;
+    };
+    const Case cases[] = {
+        {eDunmark, "convert_from_seconds", 0, 1, false, 0},
+        {eDunmark, "convert_from_seconds", 0, 2, false, 1},
+        {eDunmark, "convert_from_seconds", 5, 2, false, 1},
+        {eDunmark, "convert_from_seconds", 30, 1, true, 0},  // set below: every record from there on
+        {eMorvex, "GetMeterDatalogRecordData", 0, 1, false, 0},
+        {eMorvex, "GetMeterDatalogRecordData", 0, 2, false, 1},
+        {eMorvex, "GetMeterDatalogRecordData", 4, 2, false, 1},
+        {eMorvex, "GetMeterDatalogRecordData", 2, 1, true, 6},
+        {eMorvex, "convert_from_seconds", 7, 2, false, 1},
+        {eMorvex, "convert_from_seconds", 3, 1, true, 5},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(std::to_string(c.type) + " " + c.function + " " + std::to_string(c.record));
+        if (c.type == eMorvex)
+            discover(binary);
+        else
+            discover(c.type);
+        ASSERT_EQ(read(), ME_SUCCESS);
+        const std::vector<std::string> counts = summary();
+        std::vector<std::string> all;
+        for (pugi::xml_node n : entries()) all.push_back(nodeText(n));
+        const int total = std::stoi(counts[0]), valid = std::stoi(counts[1]), corrupted = std::stoi(counts[2]);
+        const int lost = c.persistent ? valid - c.record : c.lost;
+
+        fresh();
+        // A failing call and its retry are the record's two calls.
+        for (int i = 0; i < c.tries; ++i) sim::injectFault(c.function, c.record + 1, ME_TIME_OUT, c.persistent);
+        const std::int32_t r = read();
+        sim::clearFaults();
+        std::vector<std::string> kept;
+        for (pugi::xml_node n : entries()) kept.push_back(nodeText(n));
+        std::vector<std::string> expectedEntries = all;
+        expectedEntries.erase(expectedEntries.begin() + c.record, expectedEntries.begin() + c.record + lost);
+        EXPECT_EQ(kept, expectedEntries);
+        EXPECT_EQ(summary()[0], std::to_string(total));
+        EXPECT_EQ(summary()[1], std::to_string(valid - lost));
+        EXPECT_EQ(summary()[2], std::to_string(corrupted + lost));
+        if (lost == 0) {
+            EXPECT_EQ(r, ME_SUCCESS);
+            EXPECT_EQ(report(), "");
+        } else {
+            EXPECT_EQ(r, ME_TIME_OUT);
+            EXPECT_EQ(report(), "-17/-2/Timeout error ; " + std::to_string(lost) + " of " + std::to_string(total) +
+                                    " records could not be read");
+        }
+        EXPECT_FALSE(closed());
+        EXPECT_EQ(completions, 1);
+    }
+}
+
+// A name the type-7 meter does not give fails the upload; entries never carry an empty name.
+TEST_F(Readings, AFailedNameReadFailsTheUpload) {
+    const std::string failed = "-17/-2/Timeout error ; GetReadingFromMeter failed";
+    for (auto [function, position] : {std::pair{"GetOralMedicationName", 1}, {"GetOralMedicationName", 9},
+                                      {"GetInsulinName", 4}, {"GetInsulinName", 21}}) {
+        SCOPED_TRACE(std::string(function) + " " + std::to_string(position));
+        discover(eMorvex);
+        sim::injectFault(function, position, ME_TIME_OUT, false);
+        expectExit(read(), ME_TIME_OUT, failed, true);
+        EXPECT_TRUE(entries().empty());
+        sim::clearFaults();
+    }
 }
 
 // The transport library itself, found where a client's DllWrapper looks by default.

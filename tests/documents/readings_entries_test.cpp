@@ -183,6 +183,26 @@ TEST(ReadingsEntries, CholesterolUnitWrittenOnceAndEarlierEntriesSurviveErrors) 
     EXPECT_EQ(broken.at("/Datalog/Records"), (Lines{R"(<HbA1c Health="true" @ Val="7"/>)"}));
 }
 
+// A HI or LO result carries the meter's limit as its value; Range says so, and only then.
+TEST(ReadingsEntries, ResultsOutsideTheMetersRangeAreMarked) {
+    Datalog d(7);
+    for (std::int32_t range : {1, 2, 3, 0}) d.add<Glucose>(10, 600).setValueInMeterRange(range);
+    for (std::int32_t range : {1, 2, 3}) d.add<CheckStrip>(0, 20).setValueInMeterRange(range);
+    d.add<Cholestrol>(130, 501, 1).setValueInMeterRange(1);
+    d.add<Cholestrol>(131, 40, 1).setValueInMeterRange(3);
+    d.context.cholesUnitWritten = true;
+    const std::string strip = R"(<Strip><Lvl Upper="120" Lower="80">1</Lvl></Strip></Gluc>)";
+    EXPECT_EQ(d.write(), (Lines{
+        R"(<Gluc @ Val="600" Range="High" Type="0" Txt="Blood" Site="0" Ord="1"/>)",
+        R"(<Gluc @ Val="600" Range="Low" Type="0" Txt="Blood" Site="0" Ord="2"/>)",
+        R"(<Gluc @ Val="600" Type="0" Txt="Blood" Site="0" Ord="3"/>)",
+        R"(<Gluc @ Val="600" Type="0" Txt="Blood" Site="0" Ord="4"/>)",
+        R"(<Gluc @ Ord="5" Site="4" Val="20" Range="High" Type="2" Txt="Check Strip">)" + strip,
+        R"(<Gluc @ Ord="6" Site="4" Val="20" Range="Low" Type="2" Txt="Check Strip">)" + strip,
+        R"(<Gluc @ Ord="7" Site="4" Val="20" Type="2" Txt="Check Strip">)" + strip,
+        R"(<Choles Health="true" @ Ord="8"><LDL Range="High">501</LDL><HDL>40</HDL></Choles>)"}));
+}
+
 TEST(ReadingsEntries, GlucoseCommentsAndSlotsByMeterType) {
     const std::string plain = R"(<Gluc @ Val="100" Type="0" Txt="Blood" Site="0">)";
     Datalog two(2);

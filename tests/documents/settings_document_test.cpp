@@ -217,6 +217,9 @@ TEST_F(DeviceSettings, EveryExitReportsOnceAndCompletes) {
          "-17/-2/" + ErrorDescription(-17) + ";Bad is not supported; ; GetAllGeneralSettings failed. Error is : " +
              ErrorDescription(-2), true},
         {fault("GetPredefinedInsulins"), {}, -2, failed + "Insulins setting failed", true},
+        {fault("GetInitializedFlag"), {}, -2, failed + "DevInit setting failed", true},
+        {fault("vb_Get_Meter_Firmware"), {}, -2, failed + "Firmware read failed", true},
+        {fault("convert_from_seconds"), {}, -2, failed + "Clock setting failed", true},
         {fault("GetPredefinedOralMeds"), {}, -2, failed + "OralMeds setting failed", true},
         {fault("GetMealSegments"), {}, -2, failed + "Schedule setting failed", true},
         {fault("GetTargetRange"), {}, -2, failed + "Targets setting failed", true},
@@ -243,6 +246,29 @@ TEST_F(DeviceSettings, EveryExitReportsOnceAndCompletes) {
     device = XMLWrapper();
     EXPECT_THROW(get(Names{"Beep"}), ComponentError);
     expectUnexpected(ErrorDescription(-16) + ";Error number = ");
+}
+
+// A name the meter does not give, at any position, is a failed read, never an empty name.
+TEST_F(DeviceSettings, AFailedNameReadAtAnyPositionFailsTheRequest) {
+    const std::string failed = "-17/-2/" + ErrorDescription(-17) + ";;" + ErrorDescription(-2) + " ; ";
+    for (auto [function, position, text] : {std::tuple{"GetInsulinName", 1, "Insulins"}, {"GetInsulinName", 10, "Insulins"},
+                                            {"GetInsulinName", 21, "Insulins"}, {"GetOralMedicationName", 3, "OralMeds"},
+                                            {"GetOralMedicationName", 15, "OralMeds"}}) {
+        SCOPED_TRACE(std::string(function) + " " + std::to_string(position));
+        discover(eMorvex);
+        sim::injectFault(function, position, ME_TIME_OUT, false);
+        expectExit(get(), ME_TIME_OUT, failed + text + " setting failed", true);
+        sim::clearFaults();
+    }
+
+    // A clock conversion that fails once is asked again and the document is the fault-free one.
+    discover(eMorvex);
+    ASSERT_EQ(get(), ME_SUCCESS);
+    const std::string clean = at("Clock/Val");
+    fresh();
+    sim::injectFault("convert_from_seconds", 1, ME_TIME_OUT, false);
+    expectExit(get(), ME_SUCCESS, kReportOk, false);
+    EXPECT_EQ(at("Clock/Val"), clean);
 }
 
 }  // namespace

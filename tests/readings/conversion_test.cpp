@@ -117,15 +117,33 @@ TEST_F(Conversion, MealsAndCholesterolOfOneDateShareAGroup) {
     EXPECT_EQ(fns.unmatchedCount(), 1);
 }
 
-TEST_F(Conversion, UndecodableRecordStopsWithEarlierResultsKept) {
+// A record damaged in the datalog is lost alone: counted, with the records after it still converted.
+// A record the meter marks invalid is not dated at all, so it is never counted twice.
+TEST_F(Conversion, UnreadableRecordsAreCountedAndSkipped) {
     for (int day = 1; day <= 4; ++day) add(0, day, [](auto& r) { r.reading = 100; });
     sim::encodeBinaryDatalog(records, fns.binaryDatalog());
     sim::corruptBinaryRecord(fns.binaryDatalog(), 2);
     fns.binaryDatalog().corruptedCount = -3;
     fns.binaryDatalog().maxRecordsForMeter = 500;
     EXPECT_FALSE(fns.Fastmeterupload(serial, type, results, oralMeds, insulins));
-    EXPECT_EQ(results.Count(), 2);
+    std::vector<int> days;
+    for (const auto& r : results) days.push_back(r->DateTime().day());
+    EXPECT_EQ(days, (std::vector<int>{1, 2, 4}));
     EXPECT_EQ(std::tuple(fns.recordCount(), fns.corruptedCount(), fns.maxRecordsForMeter()), std::tuple(4, 0, 500));
+    EXPECT_EQ(std::tuple(fns.unreadableCount(), fns.unreadableCode()), std::tuple(1, std::int16_t{ME_CHKSUM_ERROR}));
+
+    METER_DATALOG& log = fns.recordDatalog();
+    for (int i = 0; i < 3; ++i) log.DataLog[i] = entry(1, 0), log.DataLog[i].D_Time = sim::secondsOf(2005, 6, i + 1);
+    log.DataLog[0].Valid = 1;
+    log.recordCount = 3;
+    log.ValidRecordCount = 2;
+    results = {};
+    sim::injectFault("convert_from_seconds", 1, ME_COM_ERROR, true);
+    EXPECT_FALSE(fns.NonFastmeterUpload(serial, type, results));
+    sim::clearFaults();
+    EXPECT_EQ(results.Count(), 0);
+    EXPECT_EQ(std::tuple(fns.corruptedCount(), fns.unreadableCount(), fns.unreadableCode()),
+              std::tuple(1, 2, std::int16_t{ME_COM_ERROR}));
 }
 
 TEST_F(Conversion, MedicationOutsideTheNamesRaisesWithEarlierResultsKept) {

@@ -55,6 +55,18 @@ TEST_F(Groups, ClockSavesReadsAndWindowsTheYear) {
     clock.ClockInSeconds = 1;
     EXPECT_EQ(clock.readFromMeter(), ME_TIME_OUT);
     EXPECT_EQ(clock.ClockInSeconds, 1);
+
+    // A conversion that fails once is asked again; one that keeps failing is reported, never a made-up date.
+    clock.ClockInSeconds = sim::secondsOf(2005, 3, 7, 14, 5, 9);
+    DateTime read = at(1990, 1, 1, 0, 0, 0);
+    sim::injectFault("convert_from_seconds", 1, ME_TIME_OUT, false);
+    EXPECT_EQ(clock.readClockTime(read), 0);
+    EXPECT_EQ(read, at(2005, 3, 7, 14, 5, 9));
+    sim::injectFault("convert_from_seconds", 1, ME_TIME_OUT, true);
+    EXPECT_EQ(clock.readClockTime(read), ME_TIME_OUT);
+    EXPECT_EQ(read, at(2005, 3, 7, 14, 5, 9));
+    EXPECT_THROW(clock.ClockTime(), ComponentError);
+    sim::clearFaults();
 }
 
 TEST(GeneralGroup, OptionsComeFromTheMeterAndWritesFollowTheirCodes) {
@@ -99,7 +111,7 @@ TEST(GeneralGroup, OptionsComeFromTheMeterAndWritesFollowTheirCodes) {
     EXPECT_EQ(general.OptionByKey(5), kept);
 }
 
-TEST_F(Groups, MedicationNamesOnlyCustomChangesAreSentAndTheLastNameDecidesARead) {
+TEST_F(Groups, MedicationNamesOnlyCustomChangesAreSentAndEveryNameDecidesARead) {
     sim::MeterProfile p = sim::defaultProfile(eMorvex);
     p.insulinNames[12].bytes = "ABCDEFGHIJ";  // no zero byte in the field
     connect(p);
@@ -125,17 +137,20 @@ TEST_F(Groups, MedicationNamesOnlyCustomChangesAreSentAndTheLastNameDecidesARead
     EXPECT_EQ(sim::callCount("SetInsulinName"), 1);
     EXPECT_TRUE(insulins.InsulinNameChanged(12));  // a save leaves the flags
 
-    // A failure before the last position still counts as read; the name it missed is kept.
-    sim::injectFault("GetInsulinName", 5, ME_CHKSUM_ERROR, false);
-    EXPECT_EQ(insulins.readFromMeter(), 0);
-    EXPECT_EQ(insulins.InsulinName(5), "Never");
-    EXPECT_EQ(insulins.InsulinName(4), sim::meter().insulinNames[3].bytes);
-
-    // A failure at the last position fails the read before the favourites.
-    const int favouriteCalls = sim::callCount("GetPredefinedInsulins");
-    sim::injectFault("GetInsulinName", 21, ME_CHKSUM_ERROR, false);
-    EXPECT_EQ(insulins.readFromMeter(), ME_CHKSUM_ERROR);
-    EXPECT_EQ(sim::callCount("GetPredefinedInsulins"), favouriteCalls);
+    // A name the meter does not give, at any position, fails the read with its code before the favourites.
+    for (auto [group, function, position] :
+         {std::tuple<MedicationGroup*, const char*, int>{&insulins, "GetInsulinName", 1},
+          {&insulins, "GetInsulinName", 5},
+          {&insulins, "GetInsulinName", 21},
+          {&oralMeds, "GetOralMedicationName", 7},
+          {&oralMeds, "GetOralMedicationName", 15}}) {
+        SCOPED_TRACE(std::string(function) + " " + std::to_string(position));
+        const int favouriteCalls = sim::callCount("GetPredefinedInsulins") + sim::callCount("GetPredefinedOralMeds");
+        sim::injectFault(function, position, ME_CHKSUM_ERROR, false);
+        EXPECT_EQ(group->readFromMeter(), ME_CHKSUM_ERROR);
+        EXPECT_EQ(sim::callCount("GetPredefinedInsulins") + sim::callCount("GetPredefinedOralMeds"), favouriteCalls);
+        sim::clearFaults();
+    }
 
     const int nameCalls = sim::callCount("GetInsulinName");
     insulins.setInsulinName(14, "Mine");
