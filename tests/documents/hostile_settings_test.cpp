@@ -17,10 +17,11 @@ struct HostileSettings : WrapperTest {
         XMLWrapper cfg;
         // The serial as the client has it: from the device information document.
         const std::string serial = parsed(device)->document_element().child("DeviceInfo").child_value("SN");
-        EXPECT_TRUE(cfg.LoadXML("<DeviceSettings><DeviceInfo><SN>" + serial + "</SN><TypeID>" +
-                                std::to_string(sim::meter().type) + "</TypeID></DeviceInfo><Settings>" + settings +
-                                "</Settings></DeviceSettings>"));
         fresh();
+        if (!cfg.LoadXML("<DeviceSettings><DeviceInfo><SN>" + serial + "</SN><TypeID>" +
+                         std::to_string(sim::meter().type) + "</TypeID></DeviceInfo><Settings>" + settings +
+                         "</Settings></DeviceSettings>"))
+            return ME_INVALID_XMLWRAPPOBJ;
         return wrapper->setDeviceSettings(rec, device, cfg, status);
     }
     // The text of the named custom entry the meter reports for a position.
@@ -140,6 +141,15 @@ TEST_F(HostileSettings, NamesTheMeterCannotHoldAreRefusedWhole) {
         ASSERT_EQ(apply(std::string("<Insulins><Custom><I Txt=\"") + name + "\">12</I></Custom><Favorite/></Insulins>"),
                   ME_SUCCESS);
         EXPECT_EQ(report(), kPartial + "Invalid CustomInsulin at index 12 ;");
+        EXPECT_EQ(sim::meter().insulinNames[11].bytes, kept);
+    }
+    // Bytes that are not UTF-8 never reach the meter, whether the loader or the item refuses them.
+    for (const char* name : {"\xE9t\xE9", "ab\xC3", "\xC0\xAF"}) {
+        SCOPED_TRACE(name);
+        if (apply(std::string("<Insulins><Custom><I Txt=\"") + name + "\">12</I></Custom><Favorite/></Insulins>") ==
+            ME_SUCCESS) {
+            EXPECT_EQ(report(), kPartial + "Invalid CustomInsulin at index 12 ;");
+        }
         EXPECT_EQ(sim::meter().insulinNames[11].bytes, kept);
     }
 }

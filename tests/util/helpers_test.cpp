@@ -25,34 +25,25 @@ TEST(ToNumber, CDecimalSyntaxWithBlanksAroundAndNothingElse) {
 
 // Texts clients put in settings documents: what is a number and what only looks like one.
 TEST(DocumentNumber, PlainDecimalsOnly) {
-    for (auto [text, value] : {std::pair{"12", 12.0}, {"-3", -3.0}, {"+4.5", 4.5}, {"0.5", 0.5}, {".5", 0.5},
-                               {"7.", 7.0}, {"007", 7.0}, {"-0", 0.0}, {"99999999999999999999", 1e20},
-                               {"0.0000000000000000000000000000000000000000000000000000000000000000000000000000000000"
-                                "000000000000000000000000000000000000000000000000000000000000000000000000000000000000"
-                                "000000000000000000000000000000000000000000000000000000000000000000000000000000000000"
-                                "000000000000000000000000000000000000000000000000000000000000000000000000000000000001",
-                                0.0}}) {
-        EXPECT_EQ(DocumentNumber(text), value) << text;
-    }
-    const std::string tenMegabytes(10'000'000, '9');
-    const std::string hugeFraction = "1." + std::string(10'000'000, '0');
-    EXPECT_EQ(DocumentNumber(hugeFraction), 1.0);
+    const std::string tiny = "0." + std::string(400, '0') + "1", tenMegabytes(10'000'000, '9');
+    for (auto [text, value] : {std::pair<std::string, double>{"12", 12}, {"-3", -3}, {"+4.5", 4.5}, {".5", 0.5},
+                               {"7.", 7}, {"007", 7}, {"99999999999999999999", 1e20}, {tiny, 0},
+                               {"1." + std::string(10'000'000, '0'), 1}})
+        EXPECT_EQ(DocumentNumber(text), value) << text.substr(0, 20);
     for (std::string_view text : std::initializer_list<std::string_view>{
-             "", " ", "abc", "nan", "NaN", "inf", "-infinity", "1e309", "1e5", "1E5", "0x10", " 12",
-          "12 ", "1 2", "\t12", "+", "-", ".", "-.", "1.2.3", "+-1", "12a", "1,5", "\xC3\xA9",
-          "\xD9\xA1\xD9\xA2",  // Arabic-Indic one, two
-          "\xEF\xBC\x91",  // fullwidth one
+             "", " ", "abc", "nan", "NaN", "inf", "-infinity", "1e309", "1e5", "1E5", "0x10", " 12", "12 ", "1 2",
+             "\t12", "+", "-", ".", "-.", "1.2.3", "+-1", "12a", "1,5", "\xC3\xA9",
+             "\xD9\xA1\xD9\xA2",  // Arabic-Indic one, two
+             "\xEF\xBC\x91",       // fullwidth one
              std::string_view("1\0" "2", 3), tenMegabytes}) {
         EXPECT_EQ(DocumentNumber(text), std::nullopt) << text.substr(0, 20);
         EXPECT_EQ(DocumentInt16(text), std::nullopt) << text.substr(0, 20);
     }
-}
-
-TEST(DocumentNumber, SixteenBitsRoundHalvesToEven) {
+    // Sixteen bits, halves to even.
     for (auto [text, value] : {std::pair{"32767", 32767}, {"-32768", -32768}, {"12.5", 12}, {"13.5", 14},
                                {"-0.5", 0}, {"32767.4", 32767}})
         EXPECT_EQ(DocumentInt16(text), std::optional<std::int16_t>(value)) << text;
-    for (const char* text : {"32768", "-32769", "32767.5", "99999999999999999999", "abc"})
+    for (const char* text : {"32768", "-32769", "32767.5", "99999999999999999999"})
         EXPECT_EQ(DocumentInt16(text), std::nullopt) << text;
 }
 
