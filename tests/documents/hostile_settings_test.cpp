@@ -30,7 +30,8 @@ struct HostileSettings : WrapperTest {
         bool checked = false;
         fresh();
         EXPECT_EQ(wrapper->getDeviceSettings(rec, device, cfg, true, status, checked), ME_SUCCESS);
-        for (pugi::xml_node n : parsed(cfg)->document_element().child("Settings").child(list).child("Custom").children())
+        const auto doc = parsed(cfg);
+        for (pugi::xml_node n : doc->document_element().child("Settings").child(list).child("Custom").children())
             if (n.text().as_int() == position) return n.attribute("Txt").value();
         return "(no entry)";
     }
