@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <array>
 #include <iterator>
+#include <optional>
 
 #include "component/err_propagator.h"
 #include "documents/apply_settings.h"
@@ -9,6 +10,7 @@
 #include "settings/medication_groups.h"
 #include "settings/schedule_group.h"
 #include "settings/targets_group.h"
+#include "util/codepage.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {
@@ -80,15 +82,17 @@ MissingElement applyMedications(ApplyContext& ctx, const MedicationList& list) {
     std::array<std::int16_t, kCustomEntries> named{};
     for (std::int32_t i = 0, n = cfg.GetChildCount(); i < n; ++i) {
         const std::string v = Trim(cfg.GetChildValueAt(i));
-        const double position = ToNumber(v);
-        if (position < list.firstCustom || position > list.lastCustom) {
-            outcome.refuse(list.customRefused + v + " ;");
+        const std::optional<double> position = DocumentNumber(v);
+        const std::string name = Trim(cfg.GetChildAttributeAt(i, "Txt"));
+        // A name the meter cannot hold is refused whole rather than stored garbled.
+        if (!position || *position < list.firstCustom || *position > list.lastCustom || !EncodeMeterText(name)) {
+            outcome.refuse(list.customRefused + Abbreviated(v) + " ;");
             continue;
         }
         if (static_cast<std::size_t>(i) >= named.size())
             raise(errc::subscript_out_of_range, std::string("More than 13 entries in ") + list.element + "/Custom");
-        named[static_cast<std::size_t>(i)] = roundToInt16(position);
-        list.setName(*group, named[static_cast<std::size_t>(i)], Trim(cfg.GetChildAttributeAt(i, "Txt")));
+        named[static_cast<std::size_t>(i)] = roundToInt16(*position);
+        list.setName(*group, named[static_cast<std::size_t>(i)], name);
     }
 
     cfg.SelectElement("Settings");
@@ -99,18 +103,18 @@ MissingElement applyMedications(ApplyContext& ctx, const MedicationList& list) {
     for (std::int32_t j = 0, n = cfg.GetChildCount(); j < n; ++j) {
         const std::string v = Trim(cfg.GetChildValueAt(j));
         if (v.empty()) continue;
-        const double position = ToNumber(v);
-        const bool fixed = position > 0 && position <= list.lastFixed;
-        const bool custom = position >= list.firstCustom && position <= list.lastCustom;
-        if (custom && std::find(named.begin(), named.end(), position) == named.end()) {
-            outcome.refuse(list.favouriteRefused + v + list.unmatchedEnd);
+        const std::optional<double> position = DocumentNumber(v);
+        const bool fixed = position && *position > 0 && *position <= list.lastFixed;
+        const bool custom = position && *position >= list.firstCustom && *position <= list.lastCustom;
+        if (custom && std::find(named.begin(), named.end(), *position) == named.end()) {
+            outcome.refuse(list.favouriteRefused + Abbreviated(v) + list.unmatchedEnd);
         } else if (!fixed && !custom) {
-            outcome.refuse(list.favouriteRefused + v + " ;");
+            outcome.refuse(list.favouriteRefused + Abbreviated(v) + " ;");
         } else if (slot > list.favouriteCount(*group)) {
             // The meter keeps a fixed number of favourites; the rest would be lost unseen.
-            outcome.refuse(list.tooMany + v + " ;");
+            outcome.refuse(list.tooMany + Abbreviated(v) + " ;");
         } else {
-            list.setFavourite(*group, slot++, roundToInt16(position));
+            list.setFavourite(*group, slot++, roundToInt16(*position));
         }
     }
     save(ctx, *group, list.saveRefused);
@@ -149,16 +153,16 @@ MissingElement applySchedule(ApplyContext& ctx) {
             cfg.SelectElement("Settings");
             cfg.MoveToChild("Schedule");
             if (cfg.CountElements(name) != 1) return name;
-            const std::int16_t h = roundToInt16(ToNumber(cfg.GetChildAttribute(name, "h")));
-            const std::int16_t m = roundToInt16(ToNumber(cfg.GetChildAttribute(name, "m")));
+            const std::optional<std::int16_t> h = DocumentInt16(Trim(cfg.GetChildAttribute(name, "h")));
+            const std::optional<std::int16_t> m = DocumentInt16(Trim(cfg.GetChildAttribute(name, "m")));
             // A negative time marks a segment left as it is.
-            if (h < 0 || m < 0) continue;
-            // Beyond the day it would wrap round to another time.
-            if (h > 23 || m > 59) {
+            if (h && m && (*h < 0 || *m < 0)) continue;
+            // Beyond the day it would wrap round to another time; no number is no time at all.
+            if (!h || !m || *h > 23 || *m > 59) {
                 ctx.outcome.refuse(std::string("Invalid Schedule ") + name + " value ; ");
                 continue;
             }
-            group->setScheduleTime(s, *DateTime::fromParts(1899, 12, 30, h, m));
+            group->setScheduleTime(s, *DateTime::fromParts(1899, 12, 30, *h, *m));
         }
     }
     save(ctx, *group, "Invalid Schedule value ; ");
@@ -180,10 +184,10 @@ MissingElement applyTargets(ApplyContext& ctx) {
     for (std::size_t i = 0; i < kTargetElements.size(); ++i) {
         const TargetElement& t = kTargetElements[i];
         if (cfg.CountElements(t.element) != 1) return t.element;
-        const double v = ToNumber(cfg.GetChildValue(t.element));
-        // The limits may be 0; a hypo level may not.
-        if (t.limit == &Group_targets::HypoLevel ? v > 0 : v >= 0) {
-            accepted[i] = roundToInt16(v);
+        const std::optional<std::int16_t> v = DocumentInt16(Trim(cfg.GetChildValue(t.element)));
+        // The limits may be 0; a hypo level may not. An empty text is no limit at all.
+        if (v && (t.limit == &Group_targets::HypoLevel ? *v > 0 : *v >= 0)) {
+            accepted[i] = *v;
         } else {
             ctx.outcome.refuse(std::string("Invalid Targets ") + t.element + " value ; ");
             anyRefused = true;

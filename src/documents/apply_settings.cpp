@@ -6,6 +6,7 @@
 #include <cmath>
 #include <initializer_list>
 #include <iterator>
+#include <optional>
 
 #include "component/err_propagator.h"
 #include "component/error_description.h"
@@ -96,26 +97,30 @@ MissingElement applyClock(ApplyContext& ctx, bool& written) {
     const std::string day = part("D"), month = part("MM"), year = part("Y");
     const std::string h = part("h"), m = part("m"), s = part("s");
 
-    const double hour = ToNumber(h), minute = ToNumber(m), second = ToNumber(s);
-    // Fractions are refused too: they would round into the next hour or day.
-    const bool valid = IsNumeric(h) && IsNumeric(m) && (s.empty() || IsNumeric(s)) && hour >= 0 && hour < 24 &&
-                       minute >= 0 && minute < 60 && second >= 0 && second < 60 && wholeNumber(hour) &&
-                       wholeNumber(minute) && wholeNumber(second) &&
+    const std::optional<double> hour = DocumentNumber(h), minute = DocumentNumber(m),
+                                second = s.empty() ? std::optional<double>(0) : DocumentNumber(s);
+    const auto within = [](const std::optional<double>& v, double end) {
+        // Fractions are refused too: they would round into the next minute, hour or day.
+        return v && *v >= 0 && *v < end && wholeNumber(*v);
+    };
+    const bool valid = within(hour, 24) && within(minute, 60) && within(second, 60) &&
                        IsValidDate(day + "/" + month + "/" + year, "/", "dd/MM/yyyy");
     if (!valid) {
         ctx.outcome.refuse("Invalid DeviceClock value ; ");
         return {};
     }
-    const int y = static_cast<int>(ToNumber(year));
+    // The date parts are all digits now, and within the calendar.
+    const auto datePart = [](const std::string& text) { return static_cast<int>(DocumentNumber(text).value_or(0)); };
+    const int y = datePart(year);
     std::int32_t first = 0, last = -1;  // no range: no year test
     getMinMaxDates(ctx.session.storedRecord().M_Type, first, last);
     if (first <= last && (y < DateTime::fromSerial(first).year() || y > DateTime::fromSerial(last).year())) {
         ctx.outcome.refuse("Invalid DeviceClock year value ; ");
         return {};
     }
-    clock->setClockTime(*DateTime::fromParts(y, static_cast<int>(ToNumber(month)), static_cast<int>(ToNumber(day)),
-                                             static_cast<int>(hour), static_cast<int>(minute),
-                                             static_cast<int>(second)));
+    clock->setClockTime(*DateTime::fromParts(y, datePart(month), datePart(day),
+                                             static_cast<int>(*hour), static_cast<int>(*minute),
+                                             static_cast<int>(*second)));
     if (clock->saveToMeter() != 0)
         ctx.outcome.refuse("Invalid DeviceClock value ; ");
     else
@@ -126,14 +131,12 @@ MissingElement applyClock(ApplyContext& ctx, bool& written) {
 // The meter's initialised flag, 0 or 1.
 void applyDevInit(ApplyContext& ctx) {
     ctx.deviceCfg.SelectElement("Settings");
-    const std::string v = Trim(ctx.deviceCfg.GetChildValue("DevInit"));
-    const double flag = ToNumber(v);
-    // An empty element is no value, not 0.
-    if (v.empty() || (flag != 0 && flag != 1)) {
+    const std::optional<double> flag = DocumentNumber(Trim(ctx.deviceCfg.GetChildValue("DevInit")));
+    if (!flag || (*flag != 0 && *flag != 1)) {
         ctx.outcome.refuse("Invalid DevInit value ; ");
         return;
     }
-    if (const std::int16_t code = ctx.session.setDevInitialised(toInt16(static_cast<long long>(flag))))
+    if (const std::int16_t code = ctx.session.setDevInitialised(*flag == 1 ? 1 : 0))
         ctx.outcome.refuse("Invalid DevInit value ; " + ErrorDescription(code) + ";");
     else
         ctx.outcome.bSuccess = true;

@@ -1,6 +1,7 @@
 #include "session/option_writers.h"
 
 #include <iterator>
+#include <optional>
 
 #include "component/err_propagator.h"
 #include "component/error_description.h"
@@ -68,21 +69,18 @@ const OptionWriter& writerFor(MeterOptions_Enum option) {
     return kWriters[option];
 }
 
-// The document's text as the meter takes it: a document 1 of an inverted option
-// is written as 0 and 0 as 1, the baud codes "0"-"3" run the other way; any
-// other text goes as it is.
-std::string mapped(OptionMapping mapping, const std::string& text) {
+// The document's value as the meter takes it: a document 1 of an inverted
+// option is written as 0 and 0 as 1, the baud texts "0"-"3" run the other
+// way; any other value goes as it is.
+double mapped(OptionMapping mapping, const std::string& text, double value) {
     switch (mapping) {
-        case OptionMapping::raw: return text;
-        case OptionMapping::inverted: {
-            const double v = ToNumber(text);
-            return v == 1 ? "0" : v == 0 ? "1" : text;
-        }
+        case OptionMapping::raw: return value;
+        case OptionMapping::inverted: return value == 1 ? 0 : value == 0 ? 1 : value;
         case OptionMapping::reversed:
-            if (text.size() == 1 && text[0] >= '0' && text[0] <= '3') return std::string(1, char('3' - text[0] + '0'));
-            return text;
+            if (text.size() == 1 && text[0] >= '0' && text[0] <= '3') return 3 - (text[0] - '0');
+            return value;
     }
-    return text;
+    return value;
 }
 
 // The element the writer reads: event averaging is "EvtAvg" on types 2 and 3,
@@ -121,25 +119,26 @@ std::int16_t writeOption(MeterDll& session, MeterOptions_Enum option, XMLWrapper
             else if (!element.empty())
                 text = deviceCfg.GetChildValue(element);
             text = Trim(text);
-            // No value stays no value, whatever the mapping would make of it.
-            if (text.empty()) {
+            // No value, or one that is no plain number or does not fit the meter's
+            // 16 bits, is refused alike: whatever it were taken for would not be what the client sent.
+            const std::optional<double> number = DocumentNumber(text);
+            const double value = number ? mapped(kOptionElements[option].mapping, text, *number) : 0;
+            const std::optional<std::int16_t> rounded = number ? Int16Value(value) : std::nullopt;
+            if (!rounded) {
                 outcome.refuse(w.emptyValue + ErrorDescription(ME_FAIL) + ";");
                 return ME_FAIL;
             }
-            text = mapped(kOptionElements[option].mapping, text);
             if (session.storedRecord().Setting.Availability[option] != kWritable) {
                 outcome.refuse(w.readOnly);
                 return ME_FAIL;
             }
-            if (option == eLanguage && session.storedRecord().M_Type == eMorvex &&
-                ToNumber(text) == kLanguageNotOnMorvex) {
+            if (option == eLanguage && session.storedRecord().M_Type == eMorvex && value == kLanguageNotOnMorvex) {
                 outcome.refuse(w.refused);
                 return ME_FAIL;
             }
-            const std::int16_t value = roundToInt16(ToNumber(text));
             // What the transport writes into this copy never reaches the session's record.
             METER_REC copy = session.storedRecord();
-            const std::int16_t code = session.transport().vb_Set_Meter_Option(copy, option, value);
+            const std::int16_t code = session.transport().vb_Set_Meter_Option(copy, option, *rounded);
             if (code == 0) {
                 outcome.bSuccess = true;
                 return 0;

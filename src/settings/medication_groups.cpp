@@ -112,7 +112,9 @@ std::int16_t MedicationGroup::saveToMeter() {
             if (!changed_[slot]) continue;
             INSULIN_OR_ORAL_MED_NAME_TYPE record{};
             record.index = toInt16(p);
-            TextToBytes(record.nameStr, names_[slot]);
+            // Names from documents were checked on the way in; any other is a fault, not a name to garble.
+            if (!TextToBytes(record.nameStr, names_[slot]))
+                raise(errc::internal, "The name at position " + std::to_string(p) + " is not text the meter can hold");
             if (std::int16_t code = outcome((t.*table_.setName)(rec_, record))) return code;
         }
         return outcome(table_.setFavourites(t, rec_, favourites_.data()));

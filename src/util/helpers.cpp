@@ -3,7 +3,11 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
+#include <cmath>
+#include <limits>
 #include <optional>
+
+#include "util/codepage.h"
 
 namespace varnel::detail {
 
@@ -58,6 +62,19 @@ std::optional<double> parseNumber(std::string_view text) {
     auto [end, ec] = std::from_chars(s.data(), s.data() + s.size(), value);
     if (ec != std::errc() || end != s.data() + s.size()) return std::nullopt;
     return value;
+}
+
+// Sign, then digits with at most one point among them (at least one digit).
+bool hasDocumentNumberSyntax(std::string_view s) {
+    std::size_t i = 0, digits = 0, points = 0;
+    if (!s.empty() && (s[0] == '+' || s[0] == '-')) ++i;
+    for (; i < s.size(); ++i) {
+        if (isDigit(s[i]))
+            ++digits;
+        else if (s[i] != '.' || ++points > 1)
+            return false;
+    }
+    return digits > 0;
 }
 
 // Value of an all-digit text, capped so that long runs of digits cannot overflow.
@@ -148,24 +165,68 @@ std::string LowerCase(std::string_view text) {
     return s;
 }
 
+std::string Abbreviated(std::string_view text) {
+    constexpr std::size_t kShown = 40;
+    std::size_t characters = 0;
+    for (std::size_t i = 0; i < text.size(); ++i) {
+        // A character starts at any byte that does not continue the one before.
+        if ((static_cast<unsigned char>(text[i]) & 0xC0) != 0x80 && characters++ == kShown)
+            return std::string(text.substr(0, i)) + "...";
+    }
+    return std::string(text);
+}
+
 bool IsNumeric(std::string_view text) { return parseNumber(text).has_value(); }
 
 double ToNumber(std::string_view text) { return parseNumber(text).value_or(0.0); }
+
+std::optional<double> DocumentNumber(std::string_view text) {
+    if (!hasDocumentNumberSyntax(text)) return std::nullopt;
+    std::string_view s = text;
+    if (s.front() == '+') s.remove_prefix(1);  // from_chars takes '-' only
+    double value = 0;
+    const auto [end, ec] = std::from_chars(s.data(), s.data() + s.size(), value);
+    if (ec == std::errc::result_out_of_range) {
+        // Too small for a double is as good as 0 to every reader; too large is no value at all.
+        const std::string_view whole = s.substr(0, s.find('.'));
+        if (whole.find_first_of("123456789") != std::string_view::npos) return std::nullopt;
+        return 0.0;
+    }
+    if (ec != std::errc() || end != s.data() + s.size()) return std::nullopt;
+    return value;
+}
+
+std::optional<std::int16_t> DocumentInt16(std::string_view text) {
+    const std::optional<double> value = DocumentNumber(text);
+    return value ? Int16Value(*value) : std::nullopt;
+}
+
+std::optional<std::int16_t> Int16Value(double value) {
+    if (!std::isfinite(value)) return std::nullopt;
+    const double r = std::nearbyint(value);
+    if (r < std::numeric_limits<std::int16_t>::min() || r > std::numeric_limits<std::int16_t>::max())
+        return std::nullopt;
+    return static_cast<std::int16_t>(r);
+}
 
 std::string BytesToText(std::span<const std::uint8_t> bytes, int count) {
     std::size_t n = count > 0 ? std::min(bytes.size(), std::size_t(count)) : 0;
     auto first = bytes.begin();
     auto last = std::find(first, first + std::ptrdiff_t(n), std::uint8_t(0));
-    return std::string(first, last);
+    return DecodeMeterText(std::span<const std::uint8_t>(first, last));
 }
 
-void TextToBytes(std::span<std::uint8_t> bytes, std::string_view text) {
-    if (bytes.empty()) return;
-    // The last byte is never written: the names these arrays hold are one shorter
-    // than the array less its zero. A one-byte array still gets its zero.
-    std::size_t n = std::min(text.size(), bytes.size() >= 2 ? bytes.size() - 2 : 0);
-    std::copy_n(text.begin(), n, bytes.begin());
+bool TextToBytes(std::span<std::uint8_t> bytes, std::string_view text) {
+    const std::optional<std::string> meterBytes = EncodeMeterText(text);
+    if (!meterBytes) return false;
+    if (bytes.empty()) return true;
+    // One byte per character, so the cut never falls inside one. The last byte
+    // is never written: the names these arrays hold are one shorter than the
+    // array less its zero. A one-byte array still gets its zero.
+    std::size_t n = std::min(meterBytes->size(), bytes.size() >= 2 ? bytes.size() - 2 : 0);
+    std::copy_n(meterBytes->begin(), n, bytes.begin());
     bytes[n] = 0;
+    return true;
 }
 
 DateTime ToDateTime(const DateTime& date, const DateTime& time) {

@@ -3,11 +3,13 @@
 //
 // The component reads no regional settings: number texts use the C/POSIX
 // conventions (decimal point '.', no thousands separators) and month names
-// are the English abbreviations "Jan".."Dec". Texts held in byte arrays carry
-// one character per byte, copied unchanged in both directions.
+// are the English abbreviations "Jan".."Dec". Texts held in byte arrays are
+// the meter's single-byte code page, one character per byte (util/codepage.h);
+// everywhere else they are UTF-8.
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <span>
 #include <string>
 #include <string_view>
@@ -23,17 +25,32 @@ bool IsNumeric(std::string_view text);
 // The value of a numeric text (see IsNumeric); 0 for any other text.
 double ToNumber(std::string_view text);
 
+// The value of a number as the client's documents write it: an optional sign
+// and decimal digits with at most one decimal point among them. Nothing for
+// any other text: empty, blanks anywhere, an exponent, hexadecimal, "inf",
+// "nan", digits of other scripts, or a value beyond the range of a double.
+std::optional<double> DocumentNumber(std::string_view text);
+// A document number rounded to a 16-bit integer, halves to even; nothing
+// when the text is no document number or the value does not fit.
+std::optional<std::int16_t> DocumentInt16(std::string_view text);
+// A value rounded to a 16-bit integer, halves to even; nothing when it does not fit.
+std::optional<std::int16_t> Int16Value(double value);
+
 // The text without the blanks (spaces, tabs, line ends) at either end.
 std::string Trim(std::string_view text);
 // The text with its ASCII capitals in lower case.
 std::string LowerCase(std::string_view text);
+// A client's text as a message quotes it: its first 40 UTF-8 characters, and
+// "..." when there were more, so that a huge value cannot swell a report.
+std::string Abbreviated(std::string_view text);
 
-// The text in the first count bytes, ending early at the first zero byte;
-// never reads past the array, whatever count says.
+// The text of the first count meter bytes as UTF-8, ending early at the first
+// zero byte; never reads past the array, whatever count says.
 std::string BytesToText(std::span<const std::uint8_t> bytes, int count);
-// Stores at most size-2 characters of text and a zero after them (a 10-byte
-// name holds 8 characters); later bytes keep their values.
-void TextToBytes(std::span<std::uint8_t> bytes, std::string_view text);
+// Stores the meter bytes of at most size-2 characters of a UTF-8 text and a
+// zero after them (a 10-byte name holds 8 characters); later bytes keep their
+// values. False, and nothing stored, when the meter cannot hold the text.
+bool TextToBytes(std::span<std::uint8_t> bytes, std::string_view text);
 
 // The date of the first value at the time of day of the second.
 DateTime ToDateTime(const DateTime& date, const DateTime& time);

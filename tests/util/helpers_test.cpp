@@ -1,6 +1,8 @@
 #include <gtest/gtest.h>
 
 #include <cstdint>
+#include <optional>
+#include <string>
 #include <thread>
 
 #include "util/helpers.h"
@@ -21,6 +23,38 @@ TEST(ToNumber, CDecimalSyntaxWithBlanksAroundAndNothingElse) {
     }
 }
 
+// Texts clients put in settings documents: what is a number and what only looks like one.
+TEST(DocumentNumber, PlainDecimalsOnly) {
+    const std::string tiny = "0." + std::string(400, '0') + "1", tenMegabytes(10'000'000, '9');
+    for (auto [text, value] : {std::pair<std::string, double>{"12", 12}, {"-3", -3}, {"+4.5", 4.5}, {".5", 0.5},
+                               {"7.", 7}, {"007", 7}, {"99999999999999999999", 1e20}, {tiny, 0},
+                               {"1." + std::string(10'000'000, '0'), 1}})
+        EXPECT_EQ(DocumentNumber(text), value) << text.substr(0, 20);
+    for (std::string_view text : std::initializer_list<std::string_view>{
+             "", " ", "abc", "nan", "NaN", "inf", "-infinity", "1e309", "1e5", "1E5", "0x10", " 12", "12 ", "1 2",
+             "\t12", "+", "-", ".", "-.", "1.2.3", "+-1", "12a", "1,5", "\xC3\xA9",
+             "\xD9\xA1\xD9\xA2",  // Arabic-Indic one, two
+             "\xEF\xBC\x91",       // fullwidth one
+             std::string_view("1\0" "2", 3), tenMegabytes}) {
+        EXPECT_EQ(DocumentNumber(text), std::nullopt) << text.substr(0, 20);
+        EXPECT_EQ(DocumentInt16(text), std::nullopt) << text.substr(0, 20);
+    }
+    // Sixteen bits, halves to even.
+    for (auto [text, value] : {std::pair{"32767", 32767}, {"-32768", -32768}, {"12.5", 12}, {"13.5", 14},
+                               {"-0.5", 0}, {"32767.4", 32767}})
+        EXPECT_EQ(DocumentInt16(text), std::optional<std::int16_t>(value)) << text;
+    for (const char* text : {"32768", "-32769", "32767.5", "99999999999999999999"})
+        EXPECT_EQ(DocumentInt16(text), std::nullopt) << text;
+}
+
+TEST(Abbreviated, CutsLongTextsBetweenCharacters) {
+    EXPECT_EQ(Abbreviated("12"), "12");
+    std::string accents;
+    for (int i = 0; i < 41; ++i) accents += "\xC3\xA9";
+    EXPECT_EQ(Abbreviated(accents), accents.substr(0, 80) + "...");
+    EXPECT_EQ(Abbreviated(accents.substr(0, 80)), accents.substr(0, 80));
+}
+
 TEST(ByteTexts, ReadStopsAtZeroOrCountAndWritesStopTwoShortOfTheEnd) {
     const std::uint8_t abc[] = {'A', 'B', 0, 'C'};
     EXPECT_EQ(BytesToText(abc, 4), "AB");
@@ -32,15 +66,33 @@ TEST(ByteTexts, ReadStopsAtZeroOrCountAndWritesStopTwoShortOfTheEnd) {
 
     std::uint8_t name[10];
     std::fill(std::begin(name), std::end(name), std::uint8_t(0xEE));
-    TextToBytes(name, "ABCDEFGHIJKL");
+    EXPECT_TRUE(TextToBytes(name, "ABCDEFGHIJKL"));
     EXPECT_EQ(BytesToText(name, 10), "ABCDEFGH");
     EXPECT_EQ(name[9], 0xEE);
-    TextToBytes(name, "Hi");
+    EXPECT_TRUE(TextToBytes(name, "Hi"));
     EXPECT_EQ(std::string(name, name + 4), std::string("Hi\0D", 4));  // later bytes keep their values
     std::uint8_t one[1] = {'x'};
-    TextToBytes(one, "abc");
+    EXPECT_TRUE(TextToBytes(one, "abc"));
     EXPECT_EQ(one[0], 0);
     TextToBytes(std::span<std::uint8_t>(), "x");  // no room at all: nothing written
+}
+
+TEST(ByteTexts, AreTheMetersCodePageAsUtf8CutByCharacters) {
+    const std::uint8_t cafe[] = {'C', 'a', 'f', 0xE9, 0x80, 0x01, 0};
+    EXPECT_EQ(BytesToText(cafe, 7), "Caf\xC3\xA9\xE2\x82\xAC\xEF\xBF\xBD");  // é, euro sign, U+FFFD
+
+    // Nine accented characters (eighteen UTF-8 bytes) keep their first eight.
+    std::uint8_t name[10] = {};
+    EXPECT_TRUE(TextToBytes(name, "\xC3\xA9t\xC3\xA9 cr\xC3\xA8me"));  // "été crème"
+    EXPECT_EQ(std::string(name, name + 9), "\xE9t\xE9 cr\xE8m" + std::string(1, '\0'));
+    EXPECT_EQ(BytesToText(name, 10), "\xC3\xA9t\xC3\xA9 cr\xC3\xA8m");
+
+    // Text the meter cannot hold stores nothing at all.
+    std::uint8_t kept[10] = {'o', 'l', 'd', 0};
+    for (const char* text : {"\xF0\x9F\x92\x89", "\xE8\x83\xB0", "ab\xE9", "\xEF\xBF\xBD"}) {
+        EXPECT_FALSE(TextToBytes(kept, text)) << text;
+        EXPECT_EQ(BytesToText(kept, 10), "old");
+    }
 }
 
 TEST(ToDateTime, JoinsDateAndTimeOfDay) {

@@ -1,0 +1,51 @@
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <string>
+
+#include "util/codepage.h"
+
+using namespace varnel::detail;
+
+namespace {
+
+std::string decoded(std::uint8_t b) { return DecodeMeterText(std::span<const std::uint8_t>(&b, 1)); }
+
+}  // namespace
+
+TEST(MeterText, EveryByteDecodesToACharacterADocumentCanCarry) {
+    for (int b = 1; b < 256; ++b) {
+        const bool control = b < 0x20 && b != '\t' && b != '\n' && b != '\r';
+        SCOPED_TRACE(b);
+        if (control) {
+            EXPECT_EQ(decoded(std::uint8_t(b)), "\xEF\xBF\xBD");  // U+FFFD
+            continue;
+        }
+        // Everything else comes back as the very byte, the code page's five gaps included.
+        EXPECT_EQ(EncodeMeterText(decoded(std::uint8_t(b))), std::string(1, char(b)));
+    }
+    for (auto [byte, text] : {std::pair{0x80, "\xE2\x82\xAC"}, {0x81, "\xC2\x81"}, {0x8A, "\xC5\xA0"},
+                              {0x9F, "\xC5\xB8"}, {0xA0, "\xC2\xA0"}, {0xE9, "\xC3\xA9"}, {0xFF, "\xC3\xBF"}})
+        EXPECT_EQ(decoded(std::uint8_t(byte)), text) << byte;
+}
+
+TEST(MeterText, TextThatIsNotUtf8OrNotInTheCodePageIsRefused) {
+    for (const char* text : {
+             "\xC3",              // cut short
+             "\x80",              // a continuation byte alone
+             "\xC0\xAF",          // overlong
+             "\xE0\x80\xAF",      // overlong, three bytes
+             "\xED\xA0\x80",      // a surrogate
+             "\xF4\x90\x80\x80",  // beyond U+10FFFF
+             "\xFF",
+             "\xF0\x9F\x92\x89",  // an emoji
+             "\xE8\x83\xB0",      // a CJK ideograph
+             "\xC2\x80",          // U+0080: 0x80 is the euro sign
+             "\xEF\xBF\xBD",      // what an unreadable byte became
+             "\x01",
+         })
+        EXPECT_EQ(EncodeMeterText(text), std::nullopt) << text;
+    EXPECT_EQ(EncodeMeterText(std::string("a\0b", 3)), std::nullopt);
+    EXPECT_EQ(EncodeMeterText("\xE2\x82\xAC 5\t\xC5\x93"), "\x80 5\t\x9C");
+    EXPECT_EQ(EncodeMeterText(""), "");
+}
