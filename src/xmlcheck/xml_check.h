@@ -245,7 +245,7 @@ private:
         p_ += 7;
         eq();
         const std::string_view version = literal("version");
-        if (version.size() < 3 || version.substr(0, 2) != "1." ||
+        if (version.size() < 2 || version.substr(0, 2) != "1." ||
             version.find_first_not_of("0123456789", 2) != std::string_view::npos)
             fail("unsupported XML version");
         space = skipSpace();
@@ -257,7 +257,8 @@ private:
             bool good = !enc.empty() && alpha(enc[0]);
             for (char c : enc) good = good && (alpha(c) || (c >= '0' && c <= '9') || c == '.' || c == '_' || c == '-');
             if (!good) fail("malformed encoding name");
-            space = skipSpace();
+            skipSpace();
+            space = true;  // strict parsers need no blank between encoding and standalone
         }
         if (space && startsWith("standalone")) {
             p_ += 10;
@@ -307,7 +308,7 @@ private:
     // is never read.
     void doctype() {
         p_ += 9;
-        if (!skipSpace()) fail("malformed DOCTYPE");
+        skipSpace();  // strict parsers take "<!DOCTYPEname" too
         name();
         bool space = skipSpace();
         if (space && startsWith("SYSTEM")) {
@@ -338,6 +339,8 @@ private:
         skipSpace();
         if (startsWith("[")) fail("a DOCTYPE with an internal subset is not accepted");
         expect(">", "'>' closing the DOCTYPE");
+        // Strict parsers read a "[" right after the DOCTYPE as its internal subset.
+        if (startsWith("[")) fail("a DOCTYPE with an internal subset is not accepted");
     }
 
     void element() {
