@@ -47,6 +47,8 @@ std::uint64_t& xmlIndexSteps() {
 }
 }  // namespace detail
 
+static_assert(kXmlDocumentMaxBytes == detail::kXmlMaxBytes && kXmlDocumentMaxDepth == detail::kXmlMaxDepth);
+
 namespace {
 
 using detail::kXmlMaxBytes;
