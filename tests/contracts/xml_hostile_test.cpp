@@ -245,3 +245,67 @@ TEST(XMLIndexedAccess, RememberedPlacesFollowChangesAndNavigation) {
     EXPECT_EQ(copy.GetChildCount(), 4);
     EXPECT_EQ(x.GetChildCount(), 3);
 }
+
+#if !defined(__SANITIZE_ADDRESS__) && !defined(__SANITIZE_THREAD__)
+#include <sys/resource.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <fstream>
+
+namespace {
+
+// Runs f in a child process whose address space may grow by `headroom` bytes
+// only; the child's exit code: 0 ComponentError internal "out of memory",
+// 1 no error, 2 another ComponentError, 3 anything else escaped.
+int underMemoryLimit(std::size_t headroom, const std::function<void()>& prepare, const std::function<void()>& f) {
+    const pid_t child = fork();
+    if (child == 0) {
+        prepare();
+        std::size_t pages = 0;
+        std::ifstream("/proc/self/statm") >> pages;
+        const rlim_t limit = pages * static_cast<std::size_t>(sysconf(_SC_PAGESIZE)) + headroom;
+        const rlimit r{limit, limit};
+        setrlimit(RLIMIT_AS, &r);
+        try {
+            f();
+            _exit(1);
+        } catch (const ComponentError& e) {
+            _exit(e.number() == errc::internal && e.description().find("out of memory") != std::string::npos ? 0 : 2);
+        } catch (...) {
+            _exit(3);
+        }
+    }
+    int status = 0;
+    waitpid(child, &status, 0);
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 100 + WTERMSIG(status);
+}
+
+}  // namespace
+
+TEST(XMLHostileText, RunningOutOfMemoryIsAComponentError) {
+    // In a fresh process: memory freed by earlier tests would be reused
+    // without growing the address space, and hide the shortage.
+    if (!std::getenv("VARNEL_XML_FRESH_PROCESS")) {
+        const std::string self = "VARNEL_XML_FRESH_PROCESS=1 /proc/self/exe --gtest_brief=1 --gtest_filter=" +
+                                 std::string(::testing::UnitTest::GetInstance()->current_test_info()->test_suite_name()) +
+                                 "." + ::testing::UnitTest::GetInstance()->current_test_info()->name();
+        EXPECT_EQ(std::system(self.c_str()), 0);
+        return;
+    }
+    XMLWrapper x;
+    const std::string text(4096, 'x');
+    auto fill = [&](int elements) {
+        x.AddElement("R");
+        for (int i = 0; i < elements; ++i) x.AddElement("E", text);
+    };
+    // Building, writing, copying and loading with too little memory left.
+    EXPECT_EQ(underMemoryLimit(8 << 20, [] {}, [&] { fill(1 << 30); }), 0);
+    EXPECT_EQ(underMemoryLimit(4 << 20, [&] { fill(4000); }, [&] { (void)x.XML(); }), 0);
+    EXPECT_EQ(underMemoryLimit(4 << 20, [&] { fill(4000); }, [&] { XMLWrapper copy(x); }), 0);
+    std::string big;
+    EXPECT_EQ(underMemoryLimit(4 << 20, [&] { fill(4000); big = x.XML(); }, [&] { (void)XMLWrapper().LoadXML(big); }),
+              0);
+}
+#endif
