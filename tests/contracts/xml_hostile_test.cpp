@@ -252,6 +252,7 @@ TEST(XMLIndexedAccess, RememberedPlacesFollowChangesAndNavigation) {
 #include <unistd.h>
 
 #include <cstdlib>
+#include <filesystem>
 #include <fstream>
 
 namespace {
@@ -288,7 +289,8 @@ TEST(XMLHostileText, RunningOutOfMemoryIsAComponentError) {
     // In a fresh process: memory freed by earlier tests would be reused
     // without growing the address space, and hide the shortage.
     if (!std::getenv("VARNEL_XML_FRESH_PROCESS")) {
-        const std::string self = "VARNEL_XML_FRESH_PROCESS=1 /proc/self/exe --gtest_brief=1 --gtest_filter=" +
+        const std::string self = "VARNEL_XML_FRESH_PROCESS=1 '" + std::filesystem::read_symlink("/proc/self/exe").string() +
+                                 "' --gtest_brief=1 --gtest_filter=" +
                                  std::string(::testing::UnitTest::GetInstance()->current_test_info()->test_suite_name()) +
                                  "." + ::testing::UnitTest::GetInstance()->current_test_info()->name();
         EXPECT_EQ(std::system(self.c_str()), 0);
