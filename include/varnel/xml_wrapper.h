@@ -3,6 +3,7 @@
 // takes its documents in. docs/documents.md shows each document kind.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <string>
@@ -32,6 +33,22 @@ inline constexpr std::int32_t filter = 6;
 inline constexpr std::int32_t status = 7;
 }  // namespace doc_kind
 
+// Limits of a document, the same for text that is loaded and for a document
+// built through the operations (docs/documents.md):
+//   - elements nest at most kXmlDocumentMaxDepth levels (the document element
+//     is level 1);
+//   - a document is at most kXmlDocumentMaxBytes, both as text given to
+//     LoadXML/LoadFile and as written by XML(). While building, each element,
+//     attribute and text is counted at the most it can take when written (both
+//     tags of an element on their own indented lines, every character at its
+//     escaped length), so XML() of any document stays within the limit and
+//     loads back.
+// LoadXML/LoadFile refuse a text past a limit (false, LastLoadError() says
+// which); an operation that would pass one raises errc::document_failure and
+// changes nothing.
+inline constexpr std::size_t kXmlDocumentMaxDepth = 256;
+inline constexpr std::size_t kXmlDocumentMaxBytes = std::size_t(64) << 20;  // 64 MiB
+
 // One XML document and three positions in it:
 //   - the current element, moved by MoveToRoot, MoveToChild, SelectElement;
 //     AddElement appends under it and the reading operations look at its children;
@@ -58,13 +75,19 @@ inline constexpr std::int32_t status = 7;
 //   - errc::subscript_out_of_range: an index outside the children of the current
 //     element (negative or >= GetChildCount()).
 //   - errc::document_failure: a name for a new element or attribute that is not
-//     an XML 1.0 Name; an InitDocument kind that is not listed above; SaveFile,
-//     or LoadFile of a file that cannot be read.
+//     an XML 1.0 Name; a text or attribute value that is not UTF-8 or holds a
+//     character XML 1.0 does not allow (a control character other than tab,
+//     line feed and carriage return, U+FFFE, U+FFFF); an element or a size past
+//     the limits above; an InitDocument kind that is not listed above;
+//     SaveFile, or LoadFile of a file that cannot be read.
+//   - errc::internal: memory ran out.
+// No operation, XML() included, raises anything but ComponentError.
 // A failing operation changes nothing. Reading the text or an attribute of a
 // named child that is absent, or an attribute that is absent, gives "" (callers
 // rely on that); only a bad index or an empty document raises.
 //
-// Texts are UTF-8. A text or attribute value ends at its first zero byte. A
+// Texts are UTF-8 made of XML 1.0 characters, so every document the component
+// writes is well-formed. A text or attribute value ends at its first zero byte. A
 // document written through these operations reads back the same through the
 // reading and navigation operations, also after a trip through XML()/LoadXML
 // or SaveFile/LoadFile, with one exception: a carriage return in an element
@@ -142,14 +165,18 @@ public:
 
     // --- the document as text ---
 
-    // Replaces the document with `text` when it is well-formed XML with one
-    // document element, and returns true; otherwise returns false and leaves
-    // the document and its positions unchanged (LastLoadError() says why).
-    // A DOCTYPE is accepted and dropped; no entity it declares is expanded and
-    // nothing outside the text is ever read (a reference to an undeclared or
-    // DTD-declared entity stays in the text as it is written, e.g. "&xxe;").
+    // Replaces the document with `text` when it is well-formed XML 1.0 in
+    // UTF-8 with one document element, within the limits above, and returns
+    // true; otherwise returns false and leaves the document and its positions
+    // unchanged. LastLoadError() then says what and where ("... at line L,
+    // offset O"): invalid UTF-8, a character or character reference XML does
+    // not allow ("&#0;", "&#xFFFE;", a surrogate), a duplicate attribute, an
+    // undeclared entity, malformed markup, a limit passed.
+    // A DOCTYPE is accepted and dropped, and may name an external subset,
+    // which is never read: a reference to an entity it might declare stays in
+    // the text as it is written, e.g. "&ext;". A DOCTYPE with an internal
+    // subset ("[...]") is refused, so no entity is ever declared or expanded.
     // Comments, processing instructions and the XML declaration are dropped.
-    // Elements nested more than 256 deep are refused (returns false).
     bool LoadXML(const std::string& text);
     // The document as indented XML text without declaration; "" when empty.
     std::string XML() const;

@@ -1,6 +1,7 @@
 // Meter profiles as XML files (the format is described in docs/simulator.md).
-// Reading is strict: an unknown element or attribute, a malformed number or a
-// value out of range is an error naming the file and the line.
+// Reading is strict: text that is not a well-formed XML document in UTF-8, an
+// unknown element or attribute, a malformed number or a value out of range is
+// an error naming the file and the line.
 #include <pugixml.hpp>
 
 #include <algorithm>
@@ -15,6 +16,7 @@
 
 #include "record_fields.h"
 #include "simulator.h"
+#include "xml_check.h"
 
 namespace varnel::sim {
 namespace {
@@ -338,6 +340,12 @@ MeterProfile readProfileFile(const std::string& path) {
     buf << in.rdbuf();
     src.text = buf.str();
 
+    // pugixml alone would take invalid UTF-8, "&#0;" (cutting a serial there)
+    // and a duplicate attribute (the first winning); the shared check refuses them.
+    const varnel::detail::XmlCheckResult check = varnel::detail::checkXmlDocument(src.text);
+    if (!check.ok())
+        throw std::runtime_error(path + ":" + std::to_string(check.line) + ": " + check.problem + " (offset " +
+                                 std::to_string(check.offset) + ")");
     pugi::xml_document doc;
     const pugi::xml_parse_result parsed = doc.load_buffer(src.text.data(), src.text.size());
     if (!parsed) {
@@ -448,6 +456,12 @@ MeterProfile readProfileFile(const std::string& path) {
 }
 
 void writeProfileFile(const MeterProfile& p, const std::string& path) {
+    // A file the reader would refuse is not written.
+    for (const auto& [what, text] : {std::pair{"serial", &p.serial}, {"identitySerial", &p.identitySerial},
+                                     {"firmware", &p.firmware}, {"name", &p.name}}) {
+        const std::string problem = varnel::detail::xmlTextProblem(*text);
+        if (!problem.empty()) throw std::runtime_error(path + ": " + what + " cannot be written as XML text: " + problem);
+    }
     pugi::xml_document doc;
     pugi::xml_node m = doc.append_child("meter");
     m.append_attribute("type") = p.type;
