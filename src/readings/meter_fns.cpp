@@ -560,7 +560,7 @@ bool clsMeterFns::Fastmeterupload(std::string&, std::int16_t&, ResultCollection&
         unreadableCode_ = 0;
         corruptedCount_ = log.corruptedCount > 0 ? log.corruptedCount : 0;
         Grouping grouping;
-        const BinaryRecord record{*this,           workRecord_,   grouping,     objresultcol,
+        const BinaryRecord record{*this, workRecord_, grouping, objresultcol,
                                   unmatchedCount_, OralMedsArray, InsulinsArray};
         std::int32_t last = 0;
         for (std::int32_t i = 0; i < recordCount_; ++i) {
