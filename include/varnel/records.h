@@ -96,6 +96,29 @@ typedef enum MeterOptions_Enum {
     eInsulinPumpUse = 18
 } MeterOptions_Enum;
 
+/* What one binary datalog record holds: the recType of RECORD_DATA. Other
+   numbers carry only a time stamp and an ordinal. */
+typedef enum RecordType_Enum {
+    VX_REC_GLUCOSE = 0,                  /* a blood or control-solution test */
+    VX_REC_ORAL_MEDICATION = 10,         /* oralMedType, oralMedDosage */
+    VX_REC_INSULIN = 11,                 /* InsulinType, insulinDosage */
+    VX_REC_PUMP_BOLUS = 12,              /* bolusSetting */
+    VX_REC_PUMP_DAILY_TOTAL = 13,        /* dailyTotalSetting */
+    VX_REC_CARBS_FATS = 20,              /* a meal's carbs and fats, or alcohol (mealSegment 4) */
+    VX_REC_CALORIES_PROTEIN = 21,        /* a meal's calories and protein */
+    VX_REC_KETONES = 30,
+    VX_REC_HBA1C = 31,
+    VX_REC_MICROALBUMIN = 32,
+    VX_REC_CHOLESTEROL_LDL_HDL = 33,
+    VX_REC_CHOLESTEROL_TOTAL_TRIG = 34,  /* total cholesterol and triglycerides */
+    VX_REC_BLOOD_PRESSURE = 35,          /* systole, diastole */
+    VX_REC_WEIGHT_HEIGHT = 36,
+    VX_REC_HEALTH_NOTES = 37,            /* stress, feeling hypo, illness, menses, vacation, other */
+    VX_REC_LAST_VISIT = 38,
+    VX_REC_EXERCISE = 45,                /* ExerciseLevel, exerciseDuration in minutes */
+    VX_REC_CAL_CODE = 52                 /* a strip calibration code change */
+} RecordType_Enum;
+
 /* Serial-port control block, in the layout of the Windows DCB. */
 typedef struct dcb {
     int32_t DCBlength;
@@ -228,7 +251,7 @@ typedef struct METER_BIN_DATALOG {
 
 /* One decoded record of a binary datalog. */
 typedef struct RECORD_DATA {
-    int16_t recType;
+    int16_t recType; /* a RecordType_Enum value; kept 16 bits wide by the layout */
     int32_t timeStamp;
     int16_t Ordinal;
     int16_t reading;

@@ -60,30 +60,55 @@ const Field kAll[] = {
 #undef H
 
 struct Layout {
-    std::int16_t recType;
+    RecordType_Enum recType;
+    const char* name;
     std::span<const Field> fields;
 };
 
 const Layout kLayouts[] = {
-    {0, kGlucose},         {10, kOralMed},       {11, kInsulin},
-    {12, kBolus},          {13, kDailyTotal},    {20, kFoodCarbsFats},
-    {21, kFoodCaloriesProtein}, {30, kKetones},  {31, kHbA1c},
-    {32, kMicroalbumin},   {33, kCholesterolLdlHdl}, {34, kCholesterolTotalTrig},
-    {35, kBloodPressure},  {36, kWeightHeight},  {37, kHealthNotes},
-    {38, kVisit},          {45, kExercise},      {52, kCalCode},
+    {VX_REC_GLUCOSE, "Glucose", kGlucose},
+    {VX_REC_ORAL_MEDICATION, "OralMedication", kOralMed},
+    {VX_REC_INSULIN, "Insulin", kInsulin},
+    {VX_REC_PUMP_BOLUS, "PumpBolus", kBolus},
+    {VX_REC_PUMP_DAILY_TOTAL, "PumpDailyTotal", kDailyTotal},
+    {VX_REC_CARBS_FATS, "CarbsFats", kFoodCarbsFats},
+    {VX_REC_CALORIES_PROTEIN, "CaloriesProtein", kFoodCaloriesProtein},
+    {VX_REC_KETONES, "Ketones", kKetones},
+    {VX_REC_HBA1C, "HbA1c", kHbA1c},
+    {VX_REC_MICROALBUMIN, "Microalbumin", kMicroalbumin},
+    {VX_REC_CHOLESTEROL_LDL_HDL, "CholesterolLdlHdl", kCholesterolLdlHdl},
+    {VX_REC_CHOLESTEROL_TOTAL_TRIG, "CholesterolTotalTrig", kCholesterolTotalTrig},
+    {VX_REC_BLOOD_PRESSURE, "BloodPressure", kBloodPressure},
+    {VX_REC_WEIGHT_HEIGHT, "WeightHeight", kWeightHeight},
+    {VX_REC_HEALTH_NOTES, "HealthNotes", kHealthNotes},
+    {VX_REC_LAST_VISIT, "LastVisit", kVisit},
+    {VX_REC_EXERCISE, "Exercise", kExercise},
+    {VX_REC_CAL_CODE, "CalCode", kCalCode},
 };
 
-constexpr std::int16_t kTypes[] = {0, 10, 11, 12, 13, 20, 21, 30, 31, 32, 33, 34, 35, 36, 37, 38, 45, 52};
+const Layout* layoutOf(std::int16_t recType) {
+    for (const Layout& l : kLayouts)
+        if (l.recType == recType) return &l;
+    return nullptr;
+}
 
 }  // namespace
 
 std::span<const Field> fieldsOf(std::int16_t recType) {
-    for (const Layout& l : kLayouts)
-        if (l.recType == recType) return l.fields;
-    return {};
+    const Layout* l = layoutOf(recType);
+    return l ? l->fields : std::span<const Field>{};
 }
 
-std::span<const std::int16_t> knownRecordTypes() { return kTypes; }
+const char* recordTypeName(std::int16_t recType) {
+    const Layout* l = layoutOf(recType);
+    return l ? l->name : nullptr;
+}
+
+std::optional<std::int16_t> recordTypeNamed(std::string_view name) {
+    for (const Layout& l : kLayouts)
+        if (name == l.name) return static_cast<std::int16_t>(l.recType);
+    return std::nullopt;
+}
 
 std::span<const Field> allValueFields() { return kAll; }
 

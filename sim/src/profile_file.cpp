@@ -261,6 +261,15 @@ void readDatalog(const Source& src, pugi::xml_node log, std::vector<data_rec>& o
     }
 }
 
+// A record type by its word, or by its number as older files give it.
+std::int16_t recordType(Element& e) {
+    const std::string word = e.text("type", true);
+    if (const auto named = detail::recordTypeNamed(word)) return *named;
+    long number = 0;
+    if (!parseNumber(std::string_view(word), number)) e.fail("record type \"" + word + "\" is unknown");
+    return e.number<std::int16_t>("type", std::nullopt, 0, 255);
+}
+
 void readBinaryDatalog(const Source& src, pugi::xml_node log, MeterProfile& p) {
     Element l(src, log);
     for (std::int16_t i : l.list("corrupted")) p.corruptedRecords.push_back(i);
@@ -270,7 +279,7 @@ void readBinaryDatalog(const Source& src, pugi::xml_node log, MeterProfile& p) {
         Element e(src, n);
         if (std::string(n.name()) != "record") e.fail(std::string("unknown element <") + n.name() + ">");
         RECORD_DATA r{};
-        r.recType = e.number<std::int16_t>("type", std::nullopt, 0, 255);
+        r.recType = recordType(e);
         r.timeStamp = e.time("time");
         r.Ordinal = e.number<std::int16_t>("ordinal");
         for (const Field& f : detail::fieldsOf(r.recType)) {
@@ -519,7 +528,10 @@ void writeProfileFile(const MeterProfile& p, const std::string& path) {
         if (!p.corruptedRecords.empty()) log.append_attribute("corrupted") = joined(p.corruptedRecords).c_str();
         for (const RECORD_DATA& rd : p.binaryDatalog) {
             pugi::xml_node n = log.append_child("record");
-            n.append_attribute("type") = rd.recType;
+            if (const char* name = detail::recordTypeName(rd.recType))
+                n.append_attribute("type") = name;
+            else
+                n.append_attribute("type") = rd.recType;
             n.append_attribute("time") = timeText(rd.timeStamp).c_str();
             setIfNonZero(n, "ordinal", rd.Ordinal);
             for (const Field& f : detail::fieldsOf(rd.recType)) {

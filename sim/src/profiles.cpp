@@ -178,7 +178,7 @@ std::vector<data_rec> recordDatalog(const TypeSpec& s, std::int32_t clock) {
     return log;
 }
 
-RECORD_DATA binary(std::int16_t type, std::int32_t time) {
+RECORD_DATA binary(RecordType_Enum type, std::int32_t time) {
     RECORD_DATA r{};
     r.recType = type;
     r.timeStamp = time;
@@ -193,7 +193,7 @@ std::vector<RECORD_DATA> binaryDatalog(std::int32_t clock) {
     for (int d = 0; d < days; ++d) {
         const std::int32_t day = clock - (days - d) * 86400 - 14 * 3600;  // 00:05 of that day
         auto glucose = [&](int minutes, std::int16_t diet) {
-            RECORD_DATA r = binary(0, day + minutes * 60);
+            RECORD_DATA r = binary(VX_REC_GLUCOSE, day + minutes * 60);
             r.reading = static_cast<std::int16_t>(rng.next(68, 240));
             r.dietLabel = diet;
             r.exerciseLabel = static_cast<std::int16_t>(d % 4);
@@ -207,12 +207,12 @@ std::vector<RECORD_DATA> binaryDatalog(std::int32_t clock) {
             log.push_back(r);
         };
         auto food = [&](int minutes, std::int16_t segment) {
-            RECORD_DATA a = binary(20, day + minutes * 60);
+            RECORD_DATA a = binary(VX_REC_CARBS_FATS, day + minutes * 60);
             a.mealSegment = segment;
             a.carbs = static_cast<std::int16_t>(rng.next(20, 120));
             a.fats = d % 4 == 0 ? -1 : static_cast<std::int16_t>(rng.next(5, 40));
             RECORD_DATA b = a;
-            b.recType = 21;
+            b.recType = VX_REC_CALORIES_PROTEIN;
             b.carbs = b.fats = 0;
             b.calories = static_cast<std::int16_t>(rng.next(200, 900));
             b.protein = d % 3 == 0 ? -1 : static_cast<std::int16_t>(rng.next(5, 60));
@@ -220,44 +220,44 @@ std::vector<RECORD_DATA> binaryDatalog(std::int32_t clock) {
             log.push_back(b);
         };
         glucose(7 * 60, 1);
-        RECORD_DATA ins = binary(11, day + 7 * 60 * 60 + 300);
+        RECORD_DATA ins = binary(VX_REC_INSULIN, day + 7 * 60 * 60 + 300);
         ins.InsulinType = static_cast<std::int16_t>(1 + d % 12);  // fixed kinds and a custom one
         ins.insulinDosage = rng.next(8, 30) / 2.0;
         log.push_back(ins);
         food(7 * 60 + 10, static_cast<std::int16_t>(d % 4));  // breakfast, lunch, dinner, snack
         glucose(9 * 60, 2);
         if (d % 2 == 0) {
-            RECORD_DATA oral = binary(10, day + 12 * 3600);
+            RECORD_DATA oral = binary(VX_REC_ORAL_MEDICATION, day + 12 * 3600);
             oral.oralMedType = static_cast<std::int16_t>(1 + d % 7);
             oral.oralMedDosage = d % 4 == 0 ? 0.5 : 1.0;
             log.push_back(oral);
         }
         if (d % 3 == 0) {
-            RECORD_DATA bolus = binary(12, day + 12 * 3600 + 600);
+            RECORD_DATA bolus = binary(VX_REC_PUMP_BOLUS, day + 12 * 3600 + 600);
             bolus.bolusSetting = rng.next(10, 90) / 10.0;
             log.push_back(bolus);
-            RECORD_DATA total = binary(13, day + 23 * 3600);
+            RECORD_DATA total = binary(VX_REC_PUMP_DAILY_TOTAL, day + 23 * 3600);
             total.dailyTotalSetting = rng.next(200, 600) / 10.0;
             log.push_back(total);
         }
         if (d % 7 == 5) {  // an evening out
-            RECORD_DATA drink = binary(20, day + 20 * 3600);
+            RECORD_DATA drink = binary(VX_REC_CARBS_FATS, day + 20 * 3600);
             drink.mealSegment = 4;
             log.push_back(drink);
             RECORD_DATA drinkCalories = drink;
-            drinkCalories.recType = 21;
+            drinkCalories.recType = VX_REC_CALORIES_PROTEIN;
             drinkCalories.calories = 180;
             log.push_back(drinkCalories);
         }
         if (d % 4 == 1) {
-            RECORD_DATA ex = binary(45, day + 17 * 3600);
+            RECORD_DATA ex = binary(VX_REC_EXERCISE, day + 17 * 3600);
             ex.ExerciseLevel = static_cast<std::int16_t>(d % 3);
             ex.exerciseDuration = static_cast<std::int16_t>(20 + 15 * (d % 9));
             log.push_back(ex);
         }
         switch (d) {
             case 2: {
-                RECORD_DATA k = binary(30, day + 8 * 3600);
+                RECORD_DATA k = binary(VX_REC_KETONES, day + 8 * 3600);
                 for (std::int16_t v = 0; v <= 4; ++v, k.timeStamp += 3600) {
                     k.ketones = v;
                     log.push_back(k);
@@ -265,15 +265,15 @@ std::vector<RECORD_DATA> binaryDatalog(std::int32_t clock) {
                 break;
             }
             case 4: {
-                RECORD_DATA a1c = binary(31, day + 10 * 3600);
+                RECORD_DATA a1c = binary(VX_REC_HBA1C, day + 10 * 3600);
                 a1c.hbA1C = 6.8;
                 log.push_back(a1c);
-                RECORD_DATA visit = binary(38, day + 10 * 3600 + 60);
+                RECORD_DATA visit = binary(VX_REC_LAST_VISIT, day + 10 * 3600 + 60);
                 for (std::int16_t v = 0; v <= 2; ++v, visit.timeStamp += 60) {
                     visit.visit = v;
                     log.push_back(visit);
                 }
-                RECORD_DATA micro = binary(32, day + 10 * 3600 + 600);
+                RECORD_DATA micro = binary(VX_REC_MICROALBUMIN, day + 10 * 3600 + 600);
                 for (std::int16_t v : {std::int16_t(-1), std::int16_t(0), std::int16_t(-2), std::int16_t(28)}) {
                     micro.microalbumin = v;
                     log.push_back(micro);
@@ -283,11 +283,11 @@ std::vector<RECORD_DATA> binaryDatalog(std::int32_t clock) {
             }
             case 6:
             case 15: {
-                RECORD_DATA ldl = binary(33, day + 11 * 3600);
+                RECORD_DATA ldl = binary(VX_REC_CHOLESTEROL_LDL_HDL, day + 11 * 3600);
                 ldl.cholesterolLDL = d == 6 ? 118 : -1;
                 ldl.cholesterolHDL = 52;
                 log.push_back(ldl);
-                RECORD_DATA total = binary(34, ldl.timeStamp);
+                RECORD_DATA total = binary(VX_REC_CHOLESTEROL_TOTAL_TRIG, ldl.timeStamp);
                 total.cholesterolTotal = 196;
                 total.cholesterolTriglyceride = d == 6 ? 141 : -1;
                 log.push_back(total);
@@ -295,31 +295,31 @@ std::vector<RECORD_DATA> binaryDatalog(std::int32_t clock) {
             }
             case 8:
             case 16: {
-                RECORD_DATA bp = binary(35, day + 9 * 3600 + 1800);
+                RECORD_DATA bp = binary(VX_REC_BLOOD_PRESSURE, day + 9 * 3600 + 1800);
                 bp.bloodPressureSystole = static_cast<std::int16_t>(rng.next(112, 145));
                 bp.bloodPressureDiastole = d == 16 ? -1 : static_cast<std::int16_t>(rng.next(70, 92));
                 log.push_back(bp);
-                RECORD_DATA body = binary(36, day + 7 * 3600 + 120);
+                RECORD_DATA body = binary(VX_REC_WEIGHT_HEIGHT, day + 7 * 3600 + 120);
                 body.weight = d == 8 ? 182.4 : 180.6;
                 body.height = d == 8 ? 69.5 : -1.0;
                 log.push_back(body);
                 break;
             }
             case 10: {
-                RECORD_DATA notes = binary(37, day + 21 * 3600);
+                RECORD_DATA notes = binary(VX_REC_HEALTH_NOTES, day + 21 * 3600);
                 notes.stressFlag = notes.illnessFlag = notes.otherFlag = 1;
                 log.push_back(notes);
-                RECORD_DATA more = binary(37, day + 22 * 3600);
+                RECORD_DATA more = binary(VX_REC_HEALTH_NOTES, day + 22 * 3600);
                 more.feelHypoFlag = more.mensesFlag = more.vacationFlag = 1;
                 log.push_back(more);
                 break;
             }
             case 12: {
-                RECORD_DATA code = binary(52, day + 6 * 3600);
+                RECORD_DATA code = binary(VX_REC_CAL_CODE, day + 6 * 3600);
                 code.oldCalCode = 4;
                 code.newCalCode = 11;
                 log.push_back(code);
-                RECORD_DATA control = binary(0, day + 6 * 3600 + 120);
+                RECORD_DATA control = binary(VX_REC_GLUCOSE, day + 6 * 3600 + 120);
                 control.reading = 121;
                 control.controlFlag = 1;
                 log.push_back(control);

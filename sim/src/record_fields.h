@@ -1,12 +1,14 @@
-// The value fields each binary record type carries, shared by the datalog
-// encoding and the profile files. Types outside the table carry only their
-// time stamp and ordinal.
+// The value fields and the profile-file word of each binary record type, shared
+// by the datalog encoding and the profile files. Types outside the table carry
+// only their time stamp and ordinal.
 #pragma once
 
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <optional>
 #include <span>
+#include <string_view>
 
 #include "varnel/records.h"
 
@@ -36,8 +38,10 @@ struct Field {
 
 // The fields of a record type in stored order; empty for a type outside the table.
 std::span<const Field> fieldsOf(std::int16_t recType);
-// The record types of the table, in ascending order.
-std::span<const std::int16_t> knownRecordTypes();
+// The word a profile file uses for a record type; null for a type outside the table.
+const char* recordTypeName(std::int16_t recType);
+// The record type a profile file's word names, if the table has it.
+std::optional<std::int16_t> recordTypeNamed(std::string_view name);
 // Every value field of RECORD_DATA (all but recType, timeStamp and Ordinal).
 std::span<const Field> allValueFields();
 bool sameRecord(const RECORD_DATA& a, const RECORD_DATA& b);

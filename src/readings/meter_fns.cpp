@@ -55,10 +55,8 @@ bool missing(double value) { return value == -1.0; }
 // 1 above the meter's range, 2 below it, 3 within it.
 std::int32_t rangeOfFlags(std::int16_t flags) { return flags == 1 || flags == 2 ? flags : 3; }
 
-}  // namespace
-
 // Group numbering across the records of one binary conversion.
-struct clsMeterFns::Grouping {
+struct Grouping {
     std::int16_t group = 0;
     std::int16_t meterGroup = 0;
     bool open = false;
@@ -67,10 +65,16 @@ struct clsMeterFns::Grouping {
     std::optional<DateTime> lastFoodDate;
     std::optional<DateTime> lastCholesterolDate;
 
+    // A new record starts with none of its values placed.
+    void startRecord(const DateTime& recordDate) {
+        date = recordDate;
+        placed = false;
+    }
     void newGroup() { group = toInt16(group + 1); }
     void newMeterGroup() { meterGroup = toInt16(meterGroup + 1); }
 
-    // A value of types 20, 33, 35, 36 joins the open group or opens one.
+    // A value of a carbs-and-fats, LDL/HDL, blood-pressure or weight-and-height
+    // record joins the open group or opens one.
     void join() {
         if (!open) {
             newGroup();
@@ -78,8 +82,9 @@ struct clsMeterFns::Grouping {
         }
     }
 
-    // A value of types 21 and 34 joins the open group unless that holds values
-    // of another date. The record's second value goes with its first.
+    // A value of a calories-and-protein or total-and-triglyceride record joins the
+    // open group unless that holds values of another date. The record's second
+    // value goes with its first.
     void joinDated(std::optional<DateTime>& kept, bool first, bool keepNewDate) {
         bool otherDate = kept && *kept != date;
         if (first) {
@@ -101,6 +106,273 @@ struct clsMeterFns::Grouping {
         r.setMeterGroupId(meterGroup);
     }
 };
+
+// The decoded binary record being converted, and where its results go.
+struct BinaryRecord {
+    clsMeterFns& fns;
+    const RECORD_DATA& w;
+    Grouping& g;
+    ResultCollection& out;
+    std::int32_t& unmatched;
+    const std::vector<std::string>& oralMeds;
+    const std::vector<std::string>& insulins;
+
+    // A result of this record, with its date and the meter's ordinal.
+    template <class R>
+    std::shared_ptr<R> stamped() const {
+        auto r = std::make_shared<R>();
+        r->setDateTime(g.date);
+        r->setOrdinal(w.Ordinal);
+        return r;
+    }
+
+    // A grouped result carrying one value of a two-value record.
+    template <class R, class V>
+    std::shared_ptr<R> grouped(V value, std::int32_t type) const {
+        auto r = stamped<R>();
+        r->setResultType(type);
+        r->setValue(value);
+        g.mark(*r);
+        return r;
+    }
+
+    void food(std::int16_t value, std::int32_t type) const {
+        // Segments 0-2 are the three meals; segment 3 is a snack, with its own types.
+        if (w.mealSegment == 3) type += 5;
+        auto r = grouped<Food>(std::int32_t(value), type);
+        if (w.mealSegment >= 0 && w.mealSegment <= 2) r->setMealSlot(1 + 2 * w.mealSegment);
+        out.Add(r);
+    }
+
+    void cholesterol(std::int16_t value, std::int32_t type, std::int32_t limit) const {
+        auto r = grouped<Cholestrol>(double(value), type);
+        r->setUnitType(0);
+        r->setValueInMeterRange(value > limit ? 1 : 3);
+        out.Add(r);
+    }
+};
+
+void glucoseRecord(const BinaryRecord& r) {
+    const RECORD_DATA& w = r.w;
+    auto glucose = r.stamped<Glucose>();
+    glucose->setUnitType(0);
+    if (w.dietLabel != 0) glucose->setSlot(w.dietLabel);
+    glucose->setCalibration(w.controlFlag == 1 ? 1 : 2);
+    glucose->setValue(w.reading);
+    glucose->setResultType(w.alternateSiteFlag == 1 ? 11 : w.controlFlag == 1 ? 21 : 10);
+    auto comments = glucose->Comments();
+    constexpr std::int32_t kExerciseComments[] = {11, 10, 12};
+    if (w.exerciseLabel >= 1 && w.exerciseLabel <= 3) comments->Add(kExerciseComments[w.exerciseLabel - 1], 1, 1);
+    for (auto [flag, code] : kGlucoseFlagComments)
+        if (w.*flag == 1) comments->Add(code, 1, 1);
+    r.out.Add(glucose);
+}
+
+void oralMedicationRecord(const BinaryRecord& r) {
+    auto meds = r.stamped<OralMeds>();
+    meds->setOralMedsName(at(r.oralMeds, r.w.oralMedType - 1));
+    meds->setValue(r.w.oralMedDosage);
+    r.out.Add(meds);
+}
+
+void insulinRecord(const BinaryRecord& r) {
+    auto injection = r.stamped<InsulinInjection>();
+    injection->setInsulinName(at(r.insulins, r.w.InsulinType - 1));
+    injection->setValue(r.w.insulinDosage);
+    r.out.Add(injection);
+}
+
+void pumpBolusRecord(const BinaryRecord& r) {
+    auto pump = r.stamped<InsulinPump>();
+    pump->setResultType(41);
+    pump->setValue(r.w.bolusSetting);
+    r.out.Add(pump);
+}
+
+void pumpDailyTotalRecord(const BinaryRecord& r) {
+    auto pump = r.stamped<InsulinPump>();
+    pump->setResultType(40);
+    pump->setValue(r.w.dailyTotalSetting);
+    r.out.Add(pump);
+}
+
+void carbsFatsRecord(const BinaryRecord& r) {
+    const RECORD_DATA& w = r.w;
+    Grouping& g = r.g;
+    if (w.mealSegment == 4) {
+        r.out.Add(r.stamped<Alcohol>());
+        g.open = false;
+        return;
+    }
+    g.newMeterGroup();
+    for (auto [value, type] : {std::pair{w.carbs, 50}, std::pair{w.fats, 52}}) {
+        if (missing(value)) continue;
+        g.join();
+        r.food(value, type);
+    }
+    if (g.open) g.lastFoodDate = g.date;
+}
+
+void caloriesProteinRecord(const BinaryRecord& r) {
+    const RECORD_DATA& w = r.w;
+    Grouping& g = r.g;
+    if (w.mealSegment == 4) {
+        if (g.open) ++r.unmatched;
+        return;
+    }
+    g.newMeterGroup();
+    for (auto [value, type] : {std::pair{w.calories, 51}, std::pair{w.protein, 53}}) {
+        if (missing(value)) continue;
+        g.joinDated(g.lastFoodDate, type == 51, true);
+        r.food(value, type);
+    }
+    g.open = false;
+}
+
+void ketonesRecord(const BinaryRecord& r) {
+    auto k = r.stamped<ketones>();
+    if (r.w.ketones >= 0 && r.w.ketones <= 4) k->setResultType(110 + r.w.ketones);
+    r.out.Add(k);
+}
+
+void hbA1cRecord(const BinaryRecord& r) {
+    auto a1c = r.stamped<hbA1C>();
+    a1c->setValue(r.w.hbA1C);
+    r.out.Add(a1c);
+}
+
+void microalbuminRecord(const BinaryRecord& r) {
+    const std::int16_t v = r.w.microalbumin;
+    auto m = r.stamped<microalbumin>();
+    m->setValue(v);
+    m->setResultType(v == -1 ? 120 : v == 0 ? 121 : v == -2 ? 122 : 123);
+    r.out.Add(m);
+}
+
+void cholesterolLdlHdlRecord(const BinaryRecord& r) {
+    const RECORD_DATA& w = r.w;
+    Grouping& g = r.g;
+    g.newMeterGroup();
+    for (auto [value, type] : {std::pair{w.cholesterolLDL, 130}, std::pair{w.cholesterolHDL, 131}}) {
+        if (missing(value)) continue;
+        g.join();
+        r.cholesterol(value, type, 500);
+    }
+    if (g.open) g.lastCholesterolDate = g.date;
+}
+
+void cholesterolTotalTrigRecord(const BinaryRecord& r) {
+    const RECORD_DATA& w = r.w;
+    Grouping& g = r.g;
+    g.newMeterGroup();
+    if (!missing(w.cholesterolTotal)) {
+        g.joinDated(g.lastCholesterolDate, true, false);
+        r.cholesterol(w.cholesterolTotal, 140, 1000);
+    }
+    if (!missing(w.cholesterolTriglyceride)) {
+        g.joinDated(g.lastCholesterolDate, false, false);
+        r.cholesterol(w.cholesterolTriglyceride, 150, 3000);
+    }
+    g.open = false;
+    g.lastCholesterolDate.reset();
+}
+
+void bloodPressureRecord(const BinaryRecord& r) {
+    const RECORD_DATA& w = r.w;
+    Grouping& g = r.g;
+    g.newMeterGroup();
+    for (auto [value, type] : {std::pair{w.bloodPressureSystole, 90}, std::pair{w.bloodPressureDiastole, 91}}) {
+        if (missing(value)) continue;
+        g.join();
+        r.out.Add(r.grouped<BloodPressure>(std::int32_t(value), type));
+    }
+    g.open = false;
+}
+
+void weightHeightRecord(const BinaryRecord& r) {
+    Grouping& g = r.g;
+    g.newMeterGroup();
+    // Copies: the packed record's doubles cannot be bound to references.
+    const double weight = r.w.weight, height = r.w.height;
+    for (auto [value, type] : {std::pair{weight, 100}, std::pair{height, 101}}) {
+        if (missing(value)) continue;
+        g.join();
+        r.out.Add(r.grouped<BodyDimensions>(value, type));
+    }
+    g.open = false;
+}
+
+void healthNotesRecord(const BinaryRecord& r) {
+    Grouping& g = r.g;
+    g.newGroup();
+    g.newMeterGroup();
+    for (auto [flag, type] : kHealthNotes) {
+        if (r.w.*flag != 1) continue;
+        auto note = r.fns.getNewHealthNote(g.group, g.meterGroup, g.date);
+        note->setResultType(type);
+        r.out.Add(note);
+    }
+    g.open = false;
+}
+
+void lastVisitRecord(const BinaryRecord& r) {
+    Grouping& g = r.g;
+    g.newGroup();
+    g.newMeterGroup();
+    auto visit = r.stamped<LastVisits>();
+    visit->setValue(0);
+    if (r.w.visit >= 0 && r.w.visit <= 2) visit->setResultType(160 + r.w.visit);
+    g.mark(*visit);
+    r.out.Add(visit);
+    g.open = false;
+}
+
+void exerciseRecord(const BinaryRecord& r) {
+    const RECORD_DATA& w = r.w;
+    auto exercise = r.stamped<Exercise>();
+    if (w.ExerciseLevel >= 0 && w.ExerciseLevel <= 2) exercise->setResultType(60 + w.ExerciseLevel);
+    exercise->setHours(w.exerciseDuration / 60);
+    exercise->setMinutes(w.exerciseDuration % 60);
+    r.out.Add(exercise);
+    r.g.open = false;
+}
+
+void calCodeRecord(const BinaryRecord& r) {
+    auto change = r.stamped<CalCode>();
+    change->setFromValue(std::to_string(r.w.oldCalCode));
+    change->setToValue(std::to_string(r.w.newCalCode));
+    r.out.Add(change);
+}
+
+// The converter of each record type; a type outside the table gives no result.
+constexpr std::pair<RecordType_Enum, void (*)(const BinaryRecord&)> kConverters[] = {
+    {VX_REC_GLUCOSE, glucoseRecord},
+    {VX_REC_ORAL_MEDICATION, oralMedicationRecord},
+    {VX_REC_INSULIN, insulinRecord},
+    {VX_REC_PUMP_BOLUS, pumpBolusRecord},
+    {VX_REC_PUMP_DAILY_TOTAL, pumpDailyTotalRecord},
+    {VX_REC_CARBS_FATS, carbsFatsRecord},
+    {VX_REC_CALORIES_PROTEIN, caloriesProteinRecord},
+    {VX_REC_KETONES, ketonesRecord},
+    {VX_REC_HBA1C, hbA1cRecord},
+    {VX_REC_MICROALBUMIN, microalbuminRecord},
+    {VX_REC_CHOLESTEROL_LDL_HDL, cholesterolLdlHdlRecord},
+    {VX_REC_CHOLESTEROL_TOTAL_TRIG, cholesterolTotalTrigRecord},
+    {VX_REC_BLOOD_PRESSURE, bloodPressureRecord},
+    {VX_REC_WEIGHT_HEIGHT, weightHeightRecord},
+    {VX_REC_HEALTH_NOTES, healthNotesRecord},
+    {VX_REC_LAST_VISIT, lastVisitRecord},
+    {VX_REC_EXERCISE, exerciseRecord},
+    {VX_REC_CAL_CODE, calCodeRecord},
+};
+
+void convertBinaryRecord(const BinaryRecord& r, const DateTime& date) {
+    r.g.startRecord(date);
+    for (auto [type, convert] : kConverters)
+        if (r.w.recType == type) return convert(r);
+}
+
+}  // namespace
 
 clsMeterFns::clsMeterFns(std::shared_ptr<Transport> sessionTransport)
     : transport(std::move(sessionTransport)),
@@ -288,6 +560,8 @@ bool clsMeterFns::Fastmeterupload(std::string&, std::int16_t&, ResultCollection&
         unreadableCode_ = 0;
         corruptedCount_ = log.corruptedCount > 0 ? log.corruptedCount : 0;
         Grouping grouping;
+        const BinaryRecord record{*this, workRecord_, grouping, objresultcol,
+                                  unmatchedCount_, OralMedsArray, InsulinsArray};
         std::int32_t last = 0;
         for (std::int32_t i = 0; i < recordCount_; ++i) {
             const std::int16_t index = toInt16(i);
@@ -301,7 +575,7 @@ bool clsMeterFns::Fastmeterupload(std::string&, std::int16_t&, ResultCollection&
             if (code != 0)
                 unreadable(code);
             else
-                convertBinaryRecord(grouping, date, objresultcol, OralMedsArray, InsulinsArray);
+                convertBinaryRecord(record, date);
             conversionProgress(i, recordCount_, last);
         }
         return unreadableCount_ == 0;
@@ -318,209 +592,6 @@ std::shared_ptr<HealthNotes> clsMeterFns::getNewHealthNote(std::int32_t groupId,
         note->setMeterGroupId(meterGroupId);
         return note;
     });
-}
-
-void clsMeterFns::convertBinaryRecord(Grouping& g, const DateTime& date, ResultCollection& out,
-                                      const std::vector<std::string>& OralMedsArray,
-                                      const std::vector<std::string>& InsulinsArray) {
-    const RECORD_DATA& w = workRecord_;
-    g.date = date;
-    g.placed = false;
-    auto stamp = [&](auto r) {
-        r->setDateTime(g.date);
-        r->setOrdinal(w.Ordinal);
-        return r;
-    };
-    // A grouped result carrying one value of a two-value record.
-    auto grouped = [&](auto r, auto value, std::int32_t type) {
-        stamp(r);
-        r->setResultType(type);
-        r->setValue(value);
-        g.mark(*r);
-        return r;
-    };
-    auto food = [&](std::int16_t value, std::int32_t type) {
-        // Segments 0-2 are the three meals; segment 3 is a snack, with its own types.
-        if (w.mealSegment == 3) type += 5;
-        auto r = grouped(std::make_shared<Food>(), std::int32_t(value), type);
-        if (w.mealSegment >= 0 && w.mealSegment <= 2) r->setMealSlot(1 + 2 * w.mealSegment);
-        out.Add(r);
-    };
-    auto cholesterol = [&](std::int16_t value, std::int32_t type, std::int32_t limit) {
-        auto r = grouped(std::make_shared<Cholestrol>(), double(value), type);
-        r->setUnitType(0);
-        r->setValueInMeterRange(value > limit ? 1 : 3);
-        out.Add(r);
-    };
-
-    switch (w.recType) {
-    case 0: {
-        auto glucose = stamp(std::make_shared<Glucose>());
-        glucose->setUnitType(0);
-        if (w.dietLabel != 0) glucose->setSlot(w.dietLabel);
-        glucose->setCalibration(w.controlFlag == 1 ? 1 : 2);
-        glucose->setValue(w.reading);
-        glucose->setResultType(w.alternateSiteFlag == 1 ? 11 : w.controlFlag == 1 ? 21 : 10);
-        auto comments = glucose->Comments();
-        constexpr std::int32_t kExerciseComments[] = {11, 10, 12};
-        if (w.exerciseLabel >= 1 && w.exerciseLabel <= 3) comments->Add(kExerciseComments[w.exerciseLabel - 1], 1, 1);
-        for (auto [flag, code] : kGlucoseFlagComments)
-            if (w.*flag == 1) comments->Add(code, 1, 1);
-        out.Add(glucose);
-        break;
-    }
-    case 10: {
-        auto meds = stamp(std::make_shared<OralMeds>());
-        meds->setOralMedsName(at(OralMedsArray, w.oralMedType - 1));
-        meds->setValue(w.oralMedDosage);
-        out.Add(meds);
-        break;
-    }
-    case 11: {
-        auto injection = stamp(std::make_shared<InsulinInjection>());
-        injection->setInsulinName(at(InsulinsArray, w.InsulinType - 1));
-        injection->setValue(w.insulinDosage);
-        out.Add(injection);
-        break;
-    }
-    case 12:
-    case 13: {
-        auto pump = stamp(std::make_shared<InsulinPump>());
-        pump->setResultType(w.recType == 12 ? 41 : 40);
-        pump->setValue(w.recType == 12 ? w.bolusSetting : w.dailyTotalSetting);
-        out.Add(pump);
-        break;
-    }
-    case 20:
-        if (w.mealSegment == 4) {
-            out.Add(stamp(std::make_shared<Alcohol>()));
-            g.open = false;
-            break;
-        }
-        g.newMeterGroup();
-        for (auto [value, type] : {std::pair{w.carbs, 50}, std::pair{w.fats, 52}}) {
-            if (missing(value)) continue;
-            g.join();
-            food(value, type);
-        }
-        if (g.open) g.lastFoodDate = g.date;
-        break;
-    case 21:
-        if (w.mealSegment == 4) {
-            if (g.open) ++unmatchedCount_;
-            break;
-        }
-        g.newMeterGroup();
-        for (auto [value, type] : {std::pair{w.calories, 51}, std::pair{w.protein, 53}}) {
-            if (missing(value)) continue;
-            g.joinDated(g.lastFoodDate, type == 51, true);
-            food(value, type);
-        }
-        g.open = false;
-        break;
-    case 30: {
-        auto r = stamp(std::make_shared<ketones>());
-        if (w.ketones >= 0 && w.ketones <= 4) r->setResultType(110 + w.ketones);
-        out.Add(r);
-        break;
-    }
-    case 31: {
-        auto r = stamp(std::make_shared<hbA1C>());
-        r->setValue(w.hbA1C);
-        out.Add(r);
-        break;
-    }
-    case 32: {
-        auto r = stamp(std::make_shared<microalbumin>());
-        r->setValue(w.microalbumin);
-        r->setResultType(w.microalbumin == -1 ? 120 : w.microalbumin == 0 ? 121 : w.microalbumin == -2 ? 122 : 123);
-        out.Add(r);
-        break;
-    }
-    case 33:
-        g.newMeterGroup();
-        for (auto [value, type] : {std::pair{w.cholesterolLDL, 130}, std::pair{w.cholesterolHDL, 131}}) {
-            if (missing(value)) continue;
-            g.join();
-            cholesterol(value, type, 500);
-        }
-        if (g.open) g.lastCholesterolDate = g.date;
-        break;
-    case 34:
-        g.newMeterGroup();
-        if (!missing(w.cholesterolTotal)) {
-            g.joinDated(g.lastCholesterolDate, true, false);
-            cholesterol(w.cholesterolTotal, 140, 1000);
-        }
-        if (!missing(w.cholesterolTriglyceride)) {
-            g.joinDated(g.lastCholesterolDate, false, false);
-            cholesterol(w.cholesterolTriglyceride, 150, 3000);
-        }
-        g.open = false;
-        g.lastCholesterolDate.reset();
-        break;
-    case 35:
-        g.newMeterGroup();
-        for (auto [value, type] : {std::pair{w.bloodPressureSystole, 90}, std::pair{w.bloodPressureDiastole, 91}}) {
-            if (missing(value)) continue;
-            g.join();
-            out.Add(grouped(std::make_shared<BloodPressure>(), std::int32_t(value), type));
-        }
-        g.open = false;
-        break;
-    case 36: {
-        g.newMeterGroup();
-        // Copies: the packed record's doubles cannot be bound to references.
-        const double weight = w.weight, height = w.height;
-        for (auto [value, type] : {std::pair{weight, 100}, std::pair{height, 101}}) {
-            if (missing(value)) continue;
-            g.join();
-            out.Add(grouped(std::make_shared<BodyDimensions>(), value, type));
-        }
-        g.open = false;
-        break;
-    }
-    case 37:
-        g.newGroup();
-        g.newMeterGroup();
-        for (auto [flag, type] : kHealthNotes) {
-            if (w.*flag != 1) continue;
-            auto note = getNewHealthNote(g.group, g.meterGroup, g.date);
-            note->setResultType(type);
-            out.Add(note);
-        }
-        g.open = false;
-        break;
-    case 38: {
-        g.newGroup();
-        g.newMeterGroup();
-        auto visit = stamp(std::make_shared<LastVisits>());
-        visit->setValue(0);
-        if (w.visit >= 0 && w.visit <= 2) visit->setResultType(160 + w.visit);
-        g.mark(*visit);
-        out.Add(visit);
-        g.open = false;
-        break;
-    }
-    case 45: {
-        auto exercise = stamp(std::make_shared<Exercise>());
-        if (w.ExerciseLevel >= 0 && w.ExerciseLevel <= 2) exercise->setResultType(60 + w.ExerciseLevel);
-        exercise->setHours(w.exerciseDuration / 60);
-        exercise->setMinutes(w.exerciseDuration % 60);
-        out.Add(exercise);
-        g.open = false;
-        break;
-    }
-    case 52: {
-        auto change = stamp(std::make_shared<CalCode>());
-        change->setFromValue(std::to_string(w.oldCalCode));
-        change->setToValue(std::to_string(w.newCalCode));
-        out.Add(change);
-        break;
-    }
-    default:
-        break;
-    }
 }
 
 }  // namespace varnel::detail

@@ -68,7 +68,6 @@ public:
 
 private:
     enum class UploadMode { Idle, Binary, Records };
-    struct Grouping;
 
     // The date of meter seconds: 0, or the failure code of the time conversion (date untouched).
     std::int16_t meterDate(std::int32_t seconds, DateTime& date);
@@ -79,9 +78,6 @@ private:
     void raiseProgress(std::int16_t percent);
     std::int16_t upload(UploadMode mode, const std::function<std::int16_t()>& call);
     void convertRecord(const data_rec& record, const DateTime& date, ResultCollection& out);
-    void convertBinaryRecord(Grouping& g, const DateTime& date, ResultCollection& out,
-                             const std::vector<std::string>& OralMedsArray,
-                             const std::vector<std::string>& InsulinsArray);
 
     // The datalogs are large; they live on the heap.
     std::unique_ptr<METER_DATALOG> recordDatalog_;

@@ -54,18 +54,18 @@ data_rec entry(std::int16_t dType, std::int16_t tType, std::int16_t flags = 0, d
 }  // namespace
 
 TEST_F(Conversion, BinaryRecordTypes) {
-    add(0, 1, [](auto& r) { r.reading = 123, r.alternateSiteFlag = 1, r.dietLabel = 3, r.exerciseLabel = 2,
+    add(VX_REC_GLUCOSE, 1, [](auto& r) { r.reading = 123, r.alternateSiteFlag = 1, r.dietLabel = 3, r.exerciseLabel = 2,
                             r.stressFlag = 1, r.otherFlag = 1; });
-    add(0, 1, [](auto& r) { r.reading = 90, r.controlFlag = 1; });
-    add(10, 1, [](auto& r) { r.oralMedType = 2, r.oralMedDosage = 2.5; });
-    add(11, 1, [](auto& r) { r.InsulinType = 1, r.insulinDosage = 4.25; });
-    add(12, 1, [](auto& r) { r.bolusSetting = 1.5; });
-    add(30, 1, [](auto& r) { r.ketones = 5; });
-    add(32, 1, [](auto& r) { r.microalbumin = -2; });
-    add(45, 1, [](auto& r) { r.ExerciseLevel = 1, r.exerciseDuration = 135; });
-    add(52, 1, [](auto& r) { r.oldCalCode = 12, r.newCalCode = 7; });
-    add(31, 1, [](auto& r) { r.hbA1C = 6.8; });
-    add(20, 1, [](auto& r) { r.mealSegment = 4; });
+    add(VX_REC_GLUCOSE, 1, [](auto& r) { r.reading = 90, r.controlFlag = 1; });
+    add(VX_REC_ORAL_MEDICATION, 1, [](auto& r) { r.oralMedType = 2, r.oralMedDosage = 2.5; });
+    add(VX_REC_INSULIN, 1, [](auto& r) { r.InsulinType = 1, r.insulinDosage = 4.25; });
+    add(VX_REC_PUMP_BOLUS, 1, [](auto& r) { r.bolusSetting = 1.5; });
+    add(VX_REC_KETONES, 1, [](auto& r) { r.ketones = 5; });
+    add(VX_REC_MICROALBUMIN, 1, [](auto& r) { r.microalbumin = -2; });
+    add(VX_REC_EXERCISE, 1, [](auto& r) { r.ExerciseLevel = 1, r.exerciseDuration = 135; });
+    add(VX_REC_CAL_CODE, 1, [](auto& r) { r.oldCalCode = 12, r.newCalCode = 7; });
+    add(VX_REC_HBA1C, 1, [](auto& r) { r.hbA1C = 6.8; });
+    add(VX_REC_CARBS_FATS, 1, [](auto& r) { r.mealSegment = 4; });
     ASSERT_TRUE(convertBinary());
     EXPECT_EQ(column(), (Types{11, 21, 70, 30, 41, 0, 122, 61, 2, 80, 54}));
 
@@ -84,12 +84,28 @@ TEST_F(Conversion, BinaryRecordTypes) {
     EXPECT_EQ(at<hbA1C>(10).Value(), 6.8);
 }
 
+// Pump totals, blood pressure and visits each give their own kind and value; a type
+// outside the table gives nothing and takes no group.
+TEST_F(Conversion, PumpTotalsBloodPressureVisitsAndUnknownTypes) {
+    add(VX_REC_PUMP_DAILY_TOTAL, 1, [](auto& r) { r.dailyTotalSetting = 42.5; });
+    add(VX_REC_BLOOD_PRESSURE, 1, [](auto& r) { r.bloodPressureSystole = 128, r.bloodPressureDiastole = -1; });
+    add(60, 1, [](auto&) {});
+    add(VX_REC_LAST_VISIT, 1, [](auto& r) { r.visit = 2; });
+    add(VX_REC_LAST_VISIT, 1, [](auto& r) { r.visit = 3; });
+    ASSERT_TRUE(convertBinary());
+    EXPECT_EQ(column(), (Types{40, 90, 162, 0}));
+    EXPECT_EQ(column(&IResult::GroupId), (Types{0, 1, 2, 3}));
+    EXPECT_EQ(column(&IResult::MeterGroupId), (Types{0, 1, 2, 3}));
+    EXPECT_EQ(std::tuple(at<InsulinPump>(1).Value(), at<BloodPressure>(2).Value(), at<LastVisits>(4).Ordinal()),
+              std::tuple(42.5, 128, 5));
+}
+
 TEST_F(Conversion, MissingValuesSnacksAndRanges) {
-    add(20, 1, [](auto& r) { r.mealSegment = 1, r.carbs = 45, r.fats = -1; });
-    add(20, 1, [](auto& r) { r.mealSegment = 3, r.carbs = 10, r.fats = 2; });
-    add(21, 1, [](auto& r) { r.mealSegment = 3, r.calories = -1, r.protein = 4; });
-    add(36, 1, [](auto& r) { r.weight = -1.0, r.height = 170.5; });
-    add(34, 1, [](auto& r) { r.cholesterolTotal = 1001, r.cholesterolTriglyceride = 3000; });
+    add(VX_REC_CARBS_FATS, 1, [](auto& r) { r.mealSegment = 1, r.carbs = 45, r.fats = -1; });
+    add(VX_REC_CARBS_FATS, 1, [](auto& r) { r.mealSegment = 3, r.carbs = 10, r.fats = 2; });
+    add(VX_REC_CALORIES_PROTEIN, 1, [](auto& r) { r.mealSegment = 3, r.calories = -1, r.protein = 4; });
+    add(VX_REC_WEIGHT_HEIGHT, 1, [](auto& r) { r.weight = -1.0, r.height = 170.5; });
+    add(VX_REC_CHOLESTEROL_TOTAL_TRIG, 1, [](auto& r) { r.cholesterolTotal = 1001, r.cholesterolTriglyceride = 3000; });
     ASSERT_TRUE(convertBinary());
     EXPECT_EQ(column(), (Types{50, 55, 57, 58, 101, 140, 150}));
     EXPECT_EQ(std::tuple(at<Food>(1).MealSlot(), at<Food>(2).MealSlot()), std::tuple(3, 0));
@@ -99,17 +115,18 @@ TEST_F(Conversion, MissingValuesSnacksAndRanges) {
 }
 
 TEST_F(Conversion, MealsAndCholesterolOfOneDateShareAGroup) {
-    add(20, 1, [](auto& r) { r.carbs = 40, r.fats = 10; });
-    add(21, 1, [](auto& r) { r.calories = 400, r.protein = 20; });
-    add(20, 2, [](auto& r) { r.carbs = 30, r.fats = 5; });
-    add(21, 3, [](auto& r) { r.calories = 300, r.protein = 15; });  // a later date: a new group
-    add(21, 4, [](auto& r) { r.calories = 200, r.protein = 10; });  // after a closed group: its own
-    add(21, 4, [](auto& r) { r.mealSegment = 4; });                 // no open group: not unmatched
-    add(33, 5, [](auto& r) { r.cholesterolLDL = 100, r.cholesterolHDL = 50; });
-    add(34, 6, [](auto& r) { r.cholesterolTotal = 180, r.cholesterolTriglyceride = 120; });
-    add(37, 6, [](auto& r) { r.stressFlag = 1, r.illnessFlag = 1; });
-    add(20, 7, [](auto& r) { r.carbs = 5, r.fats = -1; });
-    add(21, 7, [](auto& r) { r.mealSegment = 4; });
+    add(VX_REC_CARBS_FATS, 1, [](auto& r) { r.carbs = 40, r.fats = 10; });
+    add(VX_REC_CALORIES_PROTEIN, 1, [](auto& r) { r.calories = 400, r.protein = 20; });
+    add(VX_REC_CARBS_FATS, 2, [](auto& r) { r.carbs = 30, r.fats = 5; });
+    add(VX_REC_CALORIES_PROTEIN, 3, [](auto& r) { r.calories = 300, r.protein = 15; });  // a later date: a new group
+    add(VX_REC_CALORIES_PROTEIN, 4, [](auto& r) { r.calories = 200, r.protein = 10; });  // after a closed group: its own
+    add(VX_REC_CALORIES_PROTEIN, 4, [](auto& r) { r.mealSegment = 4; });                 // no open group: not unmatched
+    add(VX_REC_CHOLESTEROL_LDL_HDL, 5, [](auto& r) { r.cholesterolLDL = 100, r.cholesterolHDL = 50; });
+    add(VX_REC_CHOLESTEROL_TOTAL_TRIG, 6,
+        [](auto& r) { r.cholesterolTotal = 180, r.cholesterolTriglyceride = 120; });
+    add(VX_REC_HEALTH_NOTES, 6, [](auto& r) { r.stressFlag = 1, r.illnessFlag = 1; });
+    add(VX_REC_CARBS_FATS, 7, [](auto& r) { r.carbs = 5, r.fats = -1; });
+    add(VX_REC_CALORIES_PROTEIN, 7, [](auto& r) { r.mealSegment = 4; });
     ASSERT_TRUE(convertBinary());
     EXPECT_EQ(column(&IResult::GroupId), (Types{1, 1, 1, 1, 2, 2, 3, 3, 4, 4, 5, 5, 6, 6, 7, 7, 8}));
     EXPECT_EQ(column(&IResult::MeterGroupId), (Types{1, 1, 2, 2, 3, 3, 4, 4, 5, 5, 6, 6, 7, 7, 8, 8, 9}));
@@ -120,7 +137,7 @@ TEST_F(Conversion, MealsAndCholesterolOfOneDateShareAGroup) {
 // A record damaged in the datalog is lost alone: counted, with the records after it still converted.
 // A record the meter marks invalid is not dated at all, so it is never counted twice.
 TEST_F(Conversion, UnreadableRecordsAreCountedAndSkipped) {
-    for (int day = 1; day <= 4; ++day) add(0, day, [](auto& r) { r.reading = 100; });
+    for (int day = 1; day <= 4; ++day) add(VX_REC_GLUCOSE, day, [](auto& r) { r.reading = 100; });
     sim::encodeBinaryDatalog(records, fns.binaryDatalog());
     sim::corruptBinaryRecord(fns.binaryDatalog(), 2);
     fns.binaryDatalog().corruptedCount = -3;
@@ -147,8 +164,8 @@ TEST_F(Conversion, UnreadableRecordsAreCountedAndSkipped) {
 }
 
 TEST_F(Conversion, MedicationOutsideTheNamesRaisesWithEarlierResultsKept) {
-    add(0, 1, [](auto& r) { r.reading = 100; });
-    add(10, 1, [](auto& r) { r.oralMedType = 3; });
+    add(VX_REC_GLUCOSE, 1, [](auto& r) { r.reading = 100; });
+    add(VX_REC_ORAL_MEDICATION, 1, [](auto& r) { r.oralMedType = 3; });
     EXPECT_THROW(convertBinary(), ComponentError);
     EXPECT_EQ(errPropagator().error().ErrorNo, errc::subscript_out_of_range);
     EXPECT_EQ(errPropagator().error().ErrorTrace, "Fastmeterupload --> ");

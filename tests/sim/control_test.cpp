@@ -2,8 +2,10 @@
 // shared library.
 #include <dlfcn.h>
 
+#include <cctype>
 #include <cstdio>
 #include <fstream>
+#include <sstream>
 
 #include "fixture.h"
 #include "vxsim.h"
@@ -129,6 +131,12 @@ TEST_F(Profiles, BadFilesNameTheFileTheLineAndTheProblemAndLeaveTheMeter) {
         {head + "><binaryDatalog/></meter>", ":1: only a type-7 meter keeps <binaryDatalog>"},
         {head + "><unknown/></meter>", "unknown element <unknown>"},
         {head + "><ranges", ": "},
+        {R"(<meter type="7" serial="MVX7001184" firmware="MX2210 05/07/03" clock="2008-03-07 14:05:09">)"
+         "\n<binaryDatalog>\n<record type='Glucoze' time='2008-01-01 00:00:00'/></binaryDatalog></meter>",
+         ":3: record type \"Glucoze\" is unknown"},
+        {R"(<meter type="7" serial="MVX7001184" firmware="MX2210 05/07/03" clock="2008-03-07 14:05:09">)"
+         "<binaryDatalog><record type='256' time='2008-01-01 00:00:00'/></binaryDatalog></meter>",
+         ":1: type 256 is outside 0..255"},
     };
     for (const auto& [content, expected] : cases) {
         SCOPED_TRACE(content);
@@ -146,6 +154,25 @@ TEST_F(Profiles, BadFilesNameTheFileTheLineAndTheProblemAndLeaveTheMeter) {
     ASSERT_EQ(vxsim_load_profile(good.path.c_str()), ME_SUCCESS) << vxsim_last_error();
     EXPECT_STREQ(vxsim_last_error(), "");
     EXPECT_EQ(meter().serial, "ABC1234567");
+}
+
+// Files written before record types had words give them as numbers; those read as the words do.
+TEST_F(Profiles, RecordTypesReadByNumberAsByWord) {
+    const MeterProfile p = defaultProfile(7);
+    TempFile file;
+    writeProfileFile(p, file.path);
+    std::stringstream text;
+    text << std::ifstream(file.path).rdbuf();
+    std::string numbered = text.str();
+    std::size_t at = 0;
+    for (const RECORD_DATA& r : p.binaryDatalog) {
+        at = numbered.find("<record type=\"", at) + 14;
+        const std::size_t end = numbered.find('"', at);
+        ASSERT_TRUE(std::isalpha(static_cast<unsigned char>(numbered[at]))) << numbered.substr(at, end - at);
+        numbered.replace(at, end - at, std::to_string(r.recType));
+    }
+    std::ofstream(file.path) << numbered;
+    EXPECT_EQ(readProfileFile(file.path), p);
 }
 
 using Controls = SimTest;

@@ -62,8 +62,8 @@ TEST(BinaryDatalog, DefaultMeterLogDecodesRecordByRecordWithEveryKnownType) {
         ASSERT_EQ(GetMeterDatalogRecordData(log.get(), std::int16_t(i), &r), ME_SUCCESS) << i;
         ASSERT_TRUE(same(r, p.binaryDatalog[std::size_t(i)])) << "record " << i;
         types.insert(r.recType);
-        if (r.recType == 20 && r.mealSegment == 4) types.insert(-4);  // alcohol
-        if (r.recType == 36 && r.height == -1.0) types.insert(-36);   // missing height
+        if (r.recType == VX_REC_CARBS_FATS && r.mealSegment == 4) types.insert(-4);  // alcohol
+        if (r.recType == VX_REC_WEIGHT_HEIGHT && r.height == -1.0) types.insert(-36);   // missing height
     }
     EXPECT_EQ(types, (std::set<int>{-36, -4, 0, 10, 11, 12, 13, 20, 21, 30, 31, 32, 33, 34, 35, 36, 37, 38, 45, 52}));
 }
@@ -85,9 +85,9 @@ TEST(BinaryDatalog, FillsTheWholeBufferAndRefusesOneRecordMore) {
 TEST(BinaryDatalog, RefusesValuesItCannotHoldExactlyAndNamesTheRecord) {
     RECORD_DATA flagged = glucose(100, 1), fraction{}, foreign{}, missing{};
     flagged.stressFlag = 300;                                // beyond one byte
-    fraction.recType = 11, fraction.insulinDosage = 2.125;   // more than two decimals
-    foreign.recType = 11, foreign.carbs = 5;                 // not carried by this type
-    missing.recType = 11, missing.insulinDosage = -1.0;      // held: a missing value
+    fraction.recType = VX_REC_INSULIN, fraction.insulinDosage = 2.125;   // more than two decimals
+    foreign.recType = VX_REC_INSULIN, foreign.carbs = 5;                 // not carried by this type
+    missing.recType = VX_REC_INSULIN, missing.insulinDosage = -1.0;      // held: a missing value
     auto log = std::make_unique<METER_BIN_DATALOG>();
     for (const RECORD_DATA& r : {fraction, foreign})
         EXPECT_THROW(encodeBinaryDatalog({r}, *log), std::invalid_argument);
