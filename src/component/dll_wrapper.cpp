@@ -7,11 +7,11 @@
 #include <filesystem>
 
 #include "component/dll_impl.h"
-#include "component/err_propagator.h"
-#include "component/request_frame.h"
-#include "documents/discovery.h"
-#include "documents/readings_document.h"
-#include "documents/settings_requests.h"
+#include "errors/err_propagator.h"
+#include "requests/request_frame.h"
+#include "requests/discovery.h"
+#include "requests/readings_document.h"
+#include "requests/settings_requests.h"
 
 namespace varnel {
 

@@ -8,7 +8,7 @@
 #include <thread>
 #include <utility>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "platform/message_pump.h"
 
 namespace varnel::detail {

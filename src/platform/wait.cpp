@@ -3,7 +3,7 @@
 #include <limits>
 #include <vector>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "platform/message_pump.h"
 #include "varnel/clock.h"
 

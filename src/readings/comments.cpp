@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cctype>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 
 namespace varnel::detail {
 

@@ -6,7 +6,7 @@
 #include <optional>
 #include <utility>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "readings/meter_reads.h"
 #include "util/helpers.h"
 

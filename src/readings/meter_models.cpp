@@ -1,6 +1,6 @@
 #include "readings/meter_models.h"
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "settings/clock_group.h"
 #include "settings/general_group.h"
 #include "settings/medication_groups.h"

@@ -1,6 +1,6 @@
 #include "readings/results.h"
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 
 namespace varnel::detail {
 

@@ -1,6 +1,6 @@
 #include "session/meter_dll.h"
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "platform/wait.h"
 #include "util/helpers.h"
 

@@ -1,6 +1,6 @@
 #include "settings/clock_group.h"
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "readings/meter_reads.h"
 #include "util/helpers.h"
 

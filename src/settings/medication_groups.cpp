@@ -4,7 +4,7 @@
 #include <iterator>
 #include <string>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <string>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 
 namespace varnel::detail {
 

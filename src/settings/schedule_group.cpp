@@ -2,7 +2,7 @@
 
 #include <string>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 
 namespace varnel::detail {
 

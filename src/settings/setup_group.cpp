@@ -1,6 +1,6 @@
 #include "settings/setup_group.h"
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "readings/meter_fns.h"
 
 namespace varnel::detail {

@@ -1,6 +1,6 @@
 #include "settings/targets_group.h"
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 
 namespace varnel::detail {
 

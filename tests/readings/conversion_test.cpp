@@ -1,6 +1,6 @@
 #include <gtest/gtest.h>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "readings/meter_fns.h"
 #include "simulator.h"
 #include "support/sim_transport.h"

@@ -4,7 +4,7 @@
 #include <set>
 #include <typeinfo>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "readings/meter_models.h"
 #include "settings/clock_group.h"
 #include "settings/general_group.h"

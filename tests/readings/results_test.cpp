@@ -1,6 +1,6 @@
 #include <gtest/gtest.h>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "readings/results.h"
 
 using namespace varnel;

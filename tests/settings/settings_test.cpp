@@ -2,7 +2,7 @@
 
 #include <map>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "settings/clock_group.h"
 #include "settings/general_group.h"
 #include "settings/medication_groups.h"

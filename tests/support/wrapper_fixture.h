@@ -10,7 +10,7 @@
 #include <string>
 #include <vector>
 
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 #include "platform/message_pump.h"
 #include "simulator.h"
 #include "support/sim_transport.h"

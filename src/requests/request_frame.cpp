@@ -1,9 +1,9 @@
-#include "component/request_frame.h"
+#include "requests/request_frame.h"
 
 #include <algorithm>
 
-#include "component/err_propagator.h"
-#include "component/error_description.h"
+#include "errors/err_propagator.h"
+#include "errors/error_description.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {

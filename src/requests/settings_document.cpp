@@ -9,14 +9,14 @@
 #include <string>
 #include <string_view>
 
-#include "component/err_propagator.h"
-#include "component/error_description.h"
-#include "component/request_frame.h"
-#include "documents/discovery.h"
-#include "documents/document_values.h"
-#include "documents/option_elements.h"
-#include "documents/option_tables.h"
-#include "documents/settings_requests.h"
+#include "errors/err_propagator.h"
+#include "errors/error_description.h"
+#include "requests/request_frame.h"
+#include "requests/discovery.h"
+#include "requests/document_values.h"
+#include "requests/option_elements.h"
+#include "requests/option_tables.h"
+#include "requests/settings_requests.h"
 #include "settings/clock_group.h"
 #include "settings/medication_groups.h"
 #include "settings/schedule_group.h"

@@ -1,13 +1,13 @@
-#include "documents/discovery.h"
+#include "requests/discovery.h"
 
 #include <charconv>
 #include <cmath>
 #include <cstdio>
 #include <string_view>
 
-#include "component/err_propagator.h"
-#include "component/request_frame.h"
-#include "documents/document_values.h"
+#include "errors/err_propagator.h"
+#include "requests/request_frame.h"
+#include "requests/document_values.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {

@@ -1,6 +1,6 @@
 #include "varnel/return_codes.h"
 
-#include "component/error_description.h"
+#include "errors/error_description.h"
 
 namespace varnel {
 

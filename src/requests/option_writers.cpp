@@ -1,11 +1,11 @@
-#include "session/option_writers.h"
+#include "requests/option_writers.h"
 
 #include <iterator>
 #include <optional>
 
-#include "component/err_propagator.h"
-#include "component/error_description.h"
-#include "documents/option_tables.h"
+#include "errors/err_propagator.h"
+#include "errors/error_description.h"
+#include "requests/option_tables.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {

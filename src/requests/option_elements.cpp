@@ -1,11 +1,11 @@
-#include "documents/option_elements.h"
+#include "requests/option_elements.h"
 
 #include <algorithm>
 #include <string_view>
 
-#include "component/error_description.h"
-#include "component/request_frame.h"
-#include "documents/option_tables.h"
+#include "errors/error_description.h"
+#include "requests/request_frame.h"
+#include "requests/option_tables.h"
 
 namespace varnel::detail {
 

@@ -4,7 +4,7 @@
 #include <pugixml.hpp>
 #include <sstream>
 
-#include "documents/readings_entries.h"
+#include "requests/readings_entries.h"
 #include "varnel/component_error.h"
 
 using namespace varnel;

@@ -2,7 +2,7 @@
 
 #include <sstream>
 
-#include "session/option_writers.h"
+#include "requests/option_writers.h"
 #include "support/wrapper_fixture.h"
 
 using namespace varnel;

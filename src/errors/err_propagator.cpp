@@ -1,4 +1,4 @@
-#include "component/err_propagator.h"
+#include "errors/err_propagator.h"
 
 #include <cmath>
 #include <limits>

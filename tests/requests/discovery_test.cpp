@@ -1,6 +1,6 @@
 #include <gtest/gtest.h>
 
-#include "documents/discovery.h"
+#include "requests/discovery.h"
 #include "support/wrapper_fixture.h"
 
 using namespace varnel;

@@ -1,4 +1,4 @@
-#include "component/error_description.h"
+#include "errors/error_description.h"
 
 #include <algorithm>
 #include <iterator>

@@ -1,6 +1,6 @@
 // setDeviceSettings: writes a device configuration document, as the client
 // edited it, to the meter it describes.
-#include "documents/apply_settings.h"
+#include "requests/apply_settings.h"
 
 #include <algorithm>
 #include <cmath>
@@ -8,12 +8,12 @@
 #include <iterator>
 #include <optional>
 
-#include "component/err_propagator.h"
-#include "component/error_description.h"
-#include "component/request_frame.h"
-#include "documents/document_values.h"
-#include "documents/option_tables.h"
-#include "documents/settings_requests.h"
+#include "errors/err_propagator.h"
+#include "errors/error_description.h"
+#include "requests/request_frame.h"
+#include "requests/document_values.h"
+#include "requests/option_tables.h"
+#include "requests/settings_requests.h"
 #include "settings/clock_group.h"
 #include "util/helpers.h"
 

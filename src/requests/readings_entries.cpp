@@ -1,4 +1,4 @@
-#include "documents/readings_entries.h"
+#include "requests/readings_entries.h"
 
 #include <algorithm>
 #include <array>
@@ -9,8 +9,8 @@
 #include <cstdio>
 #include <string>
 
-#include "component/err_propagator.h"
-#include "documents/document_values.h"
+#include "errors/err_propagator.h"
+#include "requests/document_values.h"
 
 namespace varnel::detail {
 

@@ -4,8 +4,8 @@
 #include <map>
 #include <stdexcept>
 
-#include "component/err_propagator.h"
-#include "component/error_description.h"
+#include "errors/err_propagator.h"
+#include "errors/error_description.h"
 #include "support/wrapper_fixture.h"
 
 using namespace varnel;

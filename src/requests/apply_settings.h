@@ -7,7 +7,7 @@
 
 #include "readings/meter_models.h"
 #include "session/meter_dll.h"
-#include "session/option_writers.h"
+#include "requests/option_writers.h"
 #include "varnel/xml_wrapper.h"
 
 namespace varnel::detail {

@@ -1,4 +1,4 @@
-#include "documents/document_values.h"
+#include "requests/document_values.h"
 
 #include <algorithm>
 #include <array>

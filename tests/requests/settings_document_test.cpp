@@ -5,7 +5,7 @@
 #include <functional>
 #include <optional>
 
-#include "component/error_description.h"
+#include "errors/error_description.h"
 #include "support/wrapper_fixture.h"
 
 using namespace varnel;

@@ -1,10 +1,10 @@
-#include "documents/readings_document.h"
+#include "requests/readings_document.h"
 
 #include <string>
 
-#include "component/request_frame.h"
-#include "documents/discovery.h"
-#include "documents/readings_entries.h"
+#include "requests/request_frame.h"
+#include "requests/discovery.h"
+#include "requests/readings_entries.h"
 #include "readings/results.h"
 #include "util/helpers.h"
 #include "varnel/unique_checker.h"

@@ -4,9 +4,9 @@
 #include <iterator>
 #include <optional>
 
-#include "component/err_propagator.h"
-#include "documents/apply_settings.h"
-#include "documents/option_tables.h"
+#include "errors/err_propagator.h"
+#include "requests/apply_settings.h"
+#include "requests/option_tables.h"
 #include "settings/medication_groups.h"
 #include "settings/schedule_group.h"
 #include "settings/targets_group.h"
