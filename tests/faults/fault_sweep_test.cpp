@@ -532,6 +532,7 @@ TEST_P(FaultSweep, EveryFailureIsReportedAndNothingIsLost) {
                                        function + " call " + std::to_string(k) + "/" + std::to_string(count) +
                                        (persistent ? " persistent: " : " once: ") + wrong);
             }
+    RecordProperty("faulty_runs", runs);
     std::string all;
     for (const std::string& line : offences) all += line + "\n";
     EXPECT_TRUE(offences.empty()) << offences.size() << " of " << runs << " faulty runs went wrong:\n" << all;
