@@ -2,7 +2,7 @@
 # Installs what is missing, builds everything and runs the whole test suite
 # (build/); then the same suite built with AddressSanitizer and
 # UndefinedBehaviorSanitizer, which stop at the first finding (build-asan/);
-# then each fuzz target for a minute on its seed corpus (build-fuzz/).
+# then each fuzz target for a minute (VARNEL_FUZZ_SECONDS) on its seed corpus (build-fuzz/).
 # Every stage runs; the command fails when any of them failed.
 set -uo pipefail
 cd "$(dirname "$0")/.."
