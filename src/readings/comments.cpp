@@ -1,9 +1,9 @@
 #include "readings/comments.h"
 
 #include <algorithm>
-#include <cctype>
 
 #include "errors/err_propagator.h"
+#include "util/helpers.h"
 
 namespace varnel::detail {
 
@@ -11,12 +11,6 @@ namespace {
 
 // Raised when a key is already taken by another comment.
 constexpr std::int32_t kDuplicateKey = 457;
-
-bool sameKey(std::string_view a, std::string_view b) {
-    return std::equal(a.begin(), a.end(), b.begin(), b.end(), [](unsigned char x, unsigned char y) {
-        return std::tolower(x) == std::tolower(y);
-    });
-}
 
 }  // namespace
 
@@ -41,7 +35,7 @@ CommentPtr CommentsCollection::Add(std::int32_t lngId, std::int32_t enmValue, st
 
 std::vector<CommentsCollection::Entry>::const_iterator CommentsCollection::find(std::string_view key) const {
     return std::find_if(entries_.begin(), entries_.end(),
-                        [&](const Entry& e) { return sameKey(e.key, key); });
+                        [&](const Entry& e) { return EqualsNoCase(e.key, key); });
 }
 
 CommentPtr CommentsCollection::Item(std::int32_t index) const {

@@ -65,7 +65,7 @@ FirmwareText splitFirmware(const std::string& firmware) {
 }
 
 const char* meterDisplayName(std::int32_t meterType) {
-    if (meterType < 1 || meterType > 8) return kDisplayNames[0];
+    if (!IsMeterType(meterType)) return kDisplayNames[0];
     return kDisplayNames[meterType];
 }
 
@@ -105,10 +105,7 @@ std::int32_t discoverDevice(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XML
 
         connInfo.SelectElement("Ports");
         const std::string kind = connInfo.GetChildName(connInfo.GetChildCount() - 1);
-        std::string upper = kind;
-        for (char& c : upper)
-            if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 'a' + 'A');
-        if (upper != "COM") {
+        if (!EqualsNoCase(kind, "COM")) {
             req.report(ME_NOT_SUPPORTED, ME_UNSUPPORTED_PORTS, kind + " is Unsupported");
             return ME_UNSUPPORTED_PORTS;
         }
