@@ -14,17 +14,13 @@ constexpr std::int32_t kDuplicateKey = 457;
 
 }  // namespace
 
-CommentPtr CommentsCollection::Add(std::int32_t lngId, std::int32_t enmValue, std::int32_t,
-                                   const std::string& strLabel, bool blnEditable,
-                                   const std::string& strKey) {
+CommentPtr CommentsCollection::Add(std::int32_t lngId, std::int32_t enmValue, const std::string& strKey) {
     return guarded("CommentsCollection", "Add", [&]() -> CommentPtr {
         for (const Entry& e : entries_)
             if (e.comment->Id() == lngId) return nullptr;
         auto comment = std::make_shared<Comment>();
         comment->setId(lngId);
-        comment->setLabel(strLabel);
         comment->setValue(enmValue);
-        comment->setEditable(blnEditable);
         std::string key = strKey.empty() ? std::to_string(lngId) : strKey;
         if (find(key) != entries_.end())
             raise(kDuplicateKey, "This key is already associated with an element of this collection");
