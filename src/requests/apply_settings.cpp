@@ -141,6 +141,7 @@ void applyDevInit(ApplyContext& ctx) {
 
 std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
                                XMLWrapper& deviceCfg, XMLWrapper& status) {
+    // Traced under the reading request's name, as clients have always seen it.
     Request req(owner, "getDeviceSettings", udtMeterRec, &status);
     return req.run([&]() -> std::int32_t {
         MeterDll& session = req.session;

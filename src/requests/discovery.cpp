@@ -55,6 +55,7 @@ FirmwareText splitFirmware(const std::string& firmware) {
     const std::string year = Trim(rest);
     if (!year.empty()) {
         const double y = ToNumber(year);
+        // Two-digit years: the oldest firmware dates from the 1990s, so 90-99 are those and the rest 2000s.
         if (y >= 90 && y <= 99)
             out.year = "19" + year;
         else if (y >= 0 && y < 90)
