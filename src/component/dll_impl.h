@@ -28,7 +28,6 @@ struct DllWrapper::Impl {
     void RaiseProgress(std::int16_t percent);
     void raiseComplete();
 
-    std::int16_t lowerLimit() const { return lowerLimit_; }
 
     std::shared_ptr<detail::Transport> transport;
     detail::MeterDll mobjMeterDll;

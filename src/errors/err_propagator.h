@@ -14,7 +14,6 @@ namespace varnel::detail {
 
 // One error: the latest number, description, line and routine, and the trace.
 struct IError {
-    std::string ClassName;  // never filled by the builder
     std::int32_t ErrorNo = 0;
     std::string ErrorDesc;
     std::string ErrorTrace;  // outermost routine first, each followed by " --> "

@@ -132,13 +132,6 @@ TimerControl::~TimerControl() {
     for (const auto& slot : state_->slots) slot->live = false;
 }
 
-std::uint32_t TimerControl::interval() const { return state_->interval; }
-
-void TimerControl::setInterval(std::uint32_t ms) {
-    state_->interval = ms;
-    if (state_->enabled) state_->restart();
-}
-
 bool TimerControl::enabled() const { return state_->enabled; }
 
 void TimerControl::setEnabled(bool on) {

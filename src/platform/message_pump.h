@@ -61,9 +61,6 @@ public:
     TimerControl(const TimerControl&) = delete;
     TimerControl& operator=(const TimerControl&) = delete;
 
-    std::uint32_t interval() const;
-    // Changing the interval of an enabled timer starts it afresh.
-    void setInterval(std::uint32_t ms);
     bool enabled() const;
     // Enabling starts the interval now; enabling an enabled timer keeps its schedule.
     void setEnabled(bool on);

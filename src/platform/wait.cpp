@@ -38,8 +38,8 @@ std::int32_t clsWait::MsgWaitObj(std::int32_t interval, std::span<WaitEvent* con
         std::int32_t remaining = noTimeLimit;
         if (limited) {
             remaining = static_cast<std::int32_t>(end - clock.tickCount());
-            const bool expired = (remaining ^ interval) > 0 ? remaining > interval : remaining < 0;
-            if (expired) return waitTimeout;
+            // Negative: the end has passed. More than was asked for: the tick count went back. Both end the wait.
+            if (remaining < 0 || remaining > interval) return waitTimeout;
         }
 
         std::int32_t status;

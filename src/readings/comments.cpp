@@ -1,9 +1,9 @@
 #include "readings/comments.h"
 
 #include <algorithm>
-#include <cctype>
 
 #include "errors/err_propagator.h"
+#include "util/helpers.h"
 
 namespace varnel::detail {
 
@@ -12,25 +12,15 @@ namespace {
 // Raised when a key is already taken by another comment.
 constexpr std::int32_t kDuplicateKey = 457;
 
-bool sameKey(std::string_view a, std::string_view b) {
-    return std::equal(a.begin(), a.end(), b.begin(), b.end(), [](unsigned char x, unsigned char y) {
-        return std::tolower(x) == std::tolower(y);
-    });
-}
-
 }  // namespace
 
-CommentPtr CommentsCollection::Add(std::int32_t lngId, std::int32_t enmValue, std::int32_t,
-                                   const std::string& strLabel, bool blnEditable,
-                                   const std::string& strKey) {
+CommentPtr CommentsCollection::Add(std::int32_t lngId, std::int32_t enmValue, const std::string& strKey) {
     return guarded("CommentsCollection", "Add", [&]() -> CommentPtr {
         for (const Entry& e : entries_)
             if (e.comment->Id() == lngId) return nullptr;
         auto comment = std::make_shared<Comment>();
         comment->setId(lngId);
-        comment->setLabel(strLabel);
         comment->setValue(enmValue);
-        comment->setEditable(blnEditable);
         std::string key = strKey.empty() ? std::to_string(lngId) : strKey;
         if (find(key) != entries_.end())
             raise(kDuplicateKey, "This key is already associated with an element of this collection");
@@ -41,7 +31,7 @@ CommentPtr CommentsCollection::Add(std::int32_t lngId, std::int32_t enmValue, st
 
 std::vector<CommentsCollection::Entry>::const_iterator CommentsCollection::find(std::string_view key) const {
     return std::find_if(entries_.begin(), entries_.end(),
-                        [&](const Entry& e) { return sameKey(e.key, key); });
+                        [&](const Entry& e) { return EqualsNoCase(e.key, key); });
 }
 
 CommentPtr CommentsCollection::Item(std::int32_t index) const {

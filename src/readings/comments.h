@@ -9,23 +9,17 @@
 
 namespace varnel::detail {
 
-// One comment: its code (Id), a value, a label and whether the user may edit it.
+// One comment: its code (Id) and a value.
 class Comment {
 public:
     std::int32_t Value() const { return value_; }
     void setValue(std::int32_t v) { value_ = v; }
-    const std::string& Label() const { return label_; }
-    void setLabel(std::string v) { label_ = std::move(v); }
     std::int32_t Id() const { return id_; }
     void setId(std::int32_t v) { id_ = v; }
-    bool Editable() const { return editable_; }
-    void setEditable(bool v) { editable_ = v; }
 
 private:
     std::int32_t value_ = 0;
-    std::string label_;
     std::int32_t id_ = 0;
-    bool editable_ = false;
 };
 
 using CommentPtr = std::shared_ptr<Comment>;
@@ -33,15 +27,9 @@ using CommentPtr = std::shared_ptr<Comment>;
 // Keyed, ordered comments; positions are 1-based and keys ignore letter case.
 class CommentsCollection {
 public:
-    std::int32_t ResultId() const { return resultId_; }
-    void setResultId(std::int32_t v) { resultId_ = v; }
-
     // Adds a comment for code id under strKey (or the code as decimal text when strKey is
     // empty); nothing is added and nullptr returned when a comment with that code exists.
-    // enmFlag is accepted for callers' sake and not kept.
-    CommentPtr Add(std::int32_t lngId, std::int32_t enmValue, std::int32_t enmFlag,
-                   const std::string& strLabel = {}, bool blnEditable = false,
-                   const std::string& strKey = {});
+    CommentPtr Add(std::int32_t lngId, std::int32_t enmValue, const std::string& strKey = {});
 
     // The comment at a 1-based position or under a key; nullptr when there is none.
     CommentPtr Item(std::int32_t index) const;
@@ -65,7 +53,6 @@ private:
     };
     std::vector<Entry>::const_iterator find(std::string_view key) const;
 
-    std::int32_t resultId_ = 0;
     std::vector<Entry> entries_;
 };
 

@@ -162,9 +162,9 @@ void glucoseRecord(const BinaryRecord& r) {
     glucose->setResultType(w.alternateSiteFlag == 1 ? 11 : w.controlFlag == 1 ? 21 : 10);
     auto comments = glucose->Comments();
     constexpr std::int32_t kExerciseComments[] = {11, 10, 12};
-    if (w.exerciseLabel >= 1 && w.exerciseLabel <= 3) comments->Add(kExerciseComments[w.exerciseLabel - 1], 1, 1);
+    if (w.exerciseLabel >= 1 && w.exerciseLabel <= 3) comments->Add(kExerciseComments[w.exerciseLabel - 1], 1);
     for (auto [flag, code] : kGlucoseFlagComments)
-        if (w.*flag == 1) comments->Add(code, 1, 1);
+        if (w.*flag == 1) comments->Add(code, 1);
     r.out.Add(glucose);
 }
 
@@ -469,7 +469,7 @@ void clsMeterFns::unreadable(std::int16_t code) {
     ++unreadableCount_;
 }
 
-bool clsMeterFns::NonFastmeterUpload(std::string&, std::int16_t&, ResultCollection& objresultcol) {
+bool clsMeterFns::NonFastmeterUpload(ResultCollection& objresultcol) {
     return guarded(kClass, "NonFastmeterUpload", [&] {
         const METER_DATALOG& log = *recordDatalog_;
         recordCount_ = log.recordCount;
@@ -525,7 +525,7 @@ void clsMeterFns::convertRecord(const data_rec& record, const DateTime& date, Re
         auto glucose = measured(make(std::make_shared<Glucose>()));
         glucose->setResultType(type);
         glucose->setCalibration(test.Sample_detected == 1 ? 2 : 1);
-        glucose->Comments()->Add(test.Event_code, 1, 1);
+        glucose->Comments()->Add(test.Event_code, 1);
         out.Add(glucose);
     } else if (record.D_Type == 2) {
         if (test.T_Type < 0 || test.T_Type > 14 || test.Medication == 0) return;
@@ -548,8 +548,7 @@ void clsMeterFns::convertRecord(const data_rec& record, const DateTime& date, Re
     }
 }
 
-bool clsMeterFns::Fastmeterupload(std::string&, std::int16_t&, ResultCollection& objresultcol,
-                                  const std::vector<std::string>& OralMedsArray,
+bool clsMeterFns::Fastmeterupload(ResultCollection& objresultcol, const std::vector<std::string>& OralMedsArray,
                                   const std::vector<std::string>& InsulinsArray) {
     return guarded(kClass, "Fastmeterupload", [&] {
         METER_BIN_DATALOG& log = *binaryDatalog_;

@@ -52,15 +52,13 @@ public:
     METER_DATALOG& recordDatalog() { return *recordDatalog_; }
     METER_BIN_DATALOG& binaryDatalog() { return *binaryDatalog_; }
 
-    // Converts the record datalog into objresultcol. Serial number and device type are not used.
+    // Converts the record datalog into objresultcol.
     // A record that cannot be dated is counted as unreadable and skipped; false when any was.
-    bool NonFastmeterUpload(std::string& MSerialnumber, std::int16_t& MDevicetype,
-                            ResultCollection& objresultcol);
+    bool NonFastmeterUpload(ResultCollection& objresultcol);
     // Converts the binary datalog into objresultcol; the arrays are the meter's oral-medication
     // and insulin names, zero-based. A record that cannot be decoded or dated is counted as
     // unreadable and skipped, the others are still converted; false when any was.
-    bool Fastmeterupload(std::string& MSerialnumber, std::int16_t& MDevicetype,
-                         ResultCollection& objresultcol, const std::vector<std::string>& OralMedsArray,
+    bool Fastmeterupload(ResultCollection& objresultcol, const std::vector<std::string>& OralMedsArray,
                          const std::vector<std::string>& InsulinsArray);
     // A health note of the decoded record taken at date, in the given groups.
     std::shared_ptr<HealthNotes> getNewHealthNote(std::int32_t groupId, std::int32_t meterGroupId,

@@ -83,11 +83,8 @@ std::int16_t StandardMeterModel::GetReadingFromMeter() {
     return guarded(className(), "GetReadingFromMeter", [&] { return meterFns().GetNonFastMeterReading(); });
 }
 
-bool StandardMeterModel::MeterUpload(std::string& MSerialnumber, std::int16_t& MDevicetype,
-                                     ResultCollection& objresultcol) {
-    return guarded(className(), "MeterUpload", [&] {
-        return meterFns().NonFastmeterUpload(MSerialnumber, MDevicetype, objresultcol);
-    });
+bool StandardMeterModel::MeterUpload(ResultCollection& objresultcol) {
+    return guarded(className(), "MeterUpload", [&] { return meterFns().NonFastmeterUpload(objresultcol); });
 }
 
 clsCVMorvex::clsCVMorvex()
@@ -106,12 +103,11 @@ std::int16_t clsCVMorvex::GetReadingFromMeter() {
     });
 }
 
-bool clsCVMorvex::MeterUpload(std::string& MSerialnumber, std::int16_t& MDevicetype,
-                              ResultCollection& objresultcol) {
+bool clsCVMorvex::MeterUpload(ResultCollection& objresultcol) {
     return guarded(className(), "MeterUpload", [&] {
         std::vector<std::string> oralMeds = groupAs<Group_OralMeds>(eGroupOralMeds).OralMedsArray();
         std::vector<std::string> insulins = groupAs<Group_Insulins>(eGroupInsulins).InsulinsArray();
-        return meterFns().Fastmeterupload(MSerialnumber, MDevicetype, objresultcol, oralMeds, insulins);
+        return meterFns().Fastmeterupload(objresultcol, oralMeds, insulins);
     });
 }
 

@@ -25,8 +25,7 @@ public:
     // Uploads the meter's datalog into the meter-functions object: 0 or the transport's code.
     virtual std::int16_t GetReadingFromMeter() = 0;
     // Converts the uploaded datalog into results added to objresultcol.
-    virtual bool MeterUpload(std::string& MSerialnumber, std::int16_t& MDevicetype,
-                             ResultCollection& objresultcol) = 0;
+    virtual bool MeterUpload(ResultCollection& objresultcol) = 0;
     // Initialises and reads every group, reporting progress; the first failing
     // group's code ends it.
     std::int16_t MeterSetup();
@@ -68,8 +67,7 @@ public:
     explicit StandardMeterModel(const char* className);
 
     std::int16_t GetReadingFromMeter() override;
-    bool MeterUpload(std::string& MSerialnumber, std::int16_t& MDevicetype,
-                     ResultCollection& objresultcol) override;
+    bool MeterUpload(ResultCollection& objresultcol) override;
 };
 
 // Meter type 7 and any unknown type: all six groups, binary datalog.
@@ -80,8 +78,7 @@ public:
     // Uploads, then (only after a successful upload) reads the oral-medication
     // and insulin names the conversion needs.
     std::int16_t GetReadingFromMeter() override;
-    bool MeterUpload(std::string& MSerialnumber, std::int16_t& MDevicetype,
-                     ResultCollection& objresultcol) override;
+    bool MeterUpload(ResultCollection& objresultcol) override;
 };
 
 // A class-name text usable as a template argument.

@@ -187,9 +187,7 @@ public:
     void setCalibration(std::int32_t v) { calibration_ = v; }
     // Reading either list while it holds none starts a new, empty one.
     std::shared_ptr<CommentsCollection> Comments() const { return held(comments_); }
-    void setComments(std::shared_ptr<CommentsCollection> v) { comments_ = std::move(v); }
     std::shared_ptr<CommentsCollection> events() const { return held(events_); }
-    void setEvents(std::shared_ptr<CommentsCollection> v) { events_ = std::move(v); }
 
 private:
     static std::shared_ptr<CommentsCollection> held(std::shared_ptr<CommentsCollection>& list) {
@@ -206,24 +204,18 @@ class InsulinInjection final : public ResultOf<ResultKind::InsulinInjection> {
 public:
     const std::string& InsulinName() const { return name_; }
     void setInsulinName(std::string v) { name_ = std::move(v); }
-    const std::string& Abbreviation() const { return abbreviation_; }
-    void setAbbreviation(std::string v) { abbreviation_ = std::move(v); }
 
 private:
     std::string name_;
-    std::string abbreviation_;
 };
 
 class OralMeds final : public ResultOf<ResultKind::OralMeds> {
 public:
     const std::string& OralMedsName() const { return name_; }
     void setOralMedsName(std::string v) { name_ = std::move(v); }
-    const std::string& Abbreviation() const { return abbreviation_; }
-    void setAbbreviation(std::string v) { abbreviation_ = std::move(v); }
 
 private:
     std::string name_;
-    std::string abbreviation_;
 };
 
 // An exercise session; its ResultType is the exercise level and it has no Value.
@@ -267,18 +259,11 @@ public:
     ResultPtr Item(std::int32_t index) const;
     std::int32_t Count() const { return static_cast<std::int32_t>(items_.size()); }
 
-    const std::string& MeterSerialNo() const { return meterSerialNo_; }
-    void setMeterSerialNo(std::string v) { meterSerialNo_ = std::move(v); }
-    std::int16_t DeviceType() const { return deviceType_; }
-    void setDeviceType(std::int16_t v) { deviceType_ = v; }
-
     std::vector<ResultPtr>::const_iterator begin() const { return items_.begin(); }
     std::vector<ResultPtr>::const_iterator end() const { return items_.end(); }
 
 private:
     std::vector<ResultPtr> items_;
-    std::string meterSerialNo_;
-    std::int16_t deviceType_ = 0;
 };
 
 }  // namespace varnel::detail

@@ -75,11 +75,6 @@ constexpr SettingsItem kItems[] = {
 // Elements the client may send back as it read them, which are never written.
 constexpr const char* kReadOnlyItems[] = {"GlucErrRange", "GlucRange", "GlucCalib"};
 
-bool validType(const std::string& text) {
-    const double type = ToNumber(text);
-    return type > 0 && type <= 8;
-}
-
 bool wholeNumber(double v) { return std::floor(v) == v; }
 
 // The clock of "Settings/Clock/Val", refused with a message when it is not a
@@ -146,6 +141,7 @@ void applyDevInit(ApplyContext& ctx) {
 
 std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
                                XMLWrapper& deviceCfg, XMLWrapper& status) {
+    // Traced under the reading request's name, as clients have always seen it.
     Request req(owner, "getDeviceSettings", udtMeterRec, &status);
     return req.run([&]() -> std::int32_t {
         MeterDll& session = req.session;
@@ -171,7 +167,7 @@ std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, 
         const std::string infoSerial = deviceInfo.GetChildValue("SN");
         if (infoSerial.empty()) return badParameter(" ; Device SN from Device Info XML is invalid");
         const std::string infoType = deviceInfo.GetChildValue("TypeID");
-        if (!validType(infoType)) return badParameter(" ; Device Type from Device Info XML is invalid");
+        if (!IsMeterType(ToNumber(infoType))) return badParameter(" ; Device Type from Device Info XML is invalid");
 
         deviceCfg.MoveToRoot();
         if (deviceCfg.GetRootName() != "DeviceSettings") return invalidXml(" ;");
@@ -179,7 +175,7 @@ std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, 
         deviceCfg.MoveToChild("DeviceInfo");
         const std::string cfgType = deviceCfg.GetChildValue("TypeID");
         deviceCfg.MoveToRoot();
-        if (!validType(cfgType)) return badParameter(" ; Device Type from Device Info XML is invalid");
+        if (!IsMeterType(ToNumber(cfgType))) return badParameter(" ; Device Type from Device Info XML is invalid");
         deviceCfg.SelectElement("DeviceInfo");
         const std::string cfgSerial = deviceCfg.GetChildValue("SN");
         deviceCfg.MoveToRoot();
@@ -194,7 +190,7 @@ std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, 
         if (const std::int32_t c = session.checkmeter(udtMeterRec)) return stop(ME_FAIL, c, ErrorDescription(c));
 
         const std::string meterSerial = session.LastMeterSerialNo();
-        if (LowerCase(meterSerial) != LowerCase(cfgSerial))
+        if (!EqualsNoCase(meterSerial, cfgSerial))
             return different(" ; Device SN from Device settings XML - " + cfgSerial + " Device SN from device - " +
                              meterSerial + " do not match");
         const std::int16_t meterType = session.storedRecord().M_Type;
@@ -204,7 +200,7 @@ std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, 
         if (ToNumber(infoType) != meterType)
             return different(" ; Device Type from Device Info XML - " + infoType + " Device Type from device - " +
                              std::to_string(meterType) + " do not match");
-        if (LowerCase(meterSerial) != LowerCase(infoSerial))
+        if (!EqualsNoCase(meterSerial, infoSerial))
             return different(" ; Device SN from Device Info XML - " + infoSerial + " Device SN from device - " +
                              meterSerial + " do not match");
 

@@ -55,6 +55,7 @@ FirmwareText splitFirmware(const std::string& firmware) {
     const std::string year = Trim(rest);
     if (!year.empty()) {
         const double y = ToNumber(year);
+        // Two-digit years: the oldest firmware dates from the 1990s, so 90-99 are those and the rest 2000s.
         if (y >= 90 && y <= 99)
             out.year = "19" + year;
         else if (y >= 0 && y < 90)
@@ -65,7 +66,7 @@ FirmwareText splitFirmware(const std::string& firmware) {
 }
 
 const char* meterDisplayName(std::int32_t meterType) {
-    if (meterType < 1 || meterType > 8) return kDisplayNames[0];
+    if (!IsMeterType(meterType)) return kDisplayNames[0];
     return kDisplayNames[meterType];
 }
 
@@ -105,10 +106,7 @@ std::int32_t discoverDevice(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XML
 
         connInfo.SelectElement("Ports");
         const std::string kind = connInfo.GetChildName(connInfo.GetChildCount() - 1);
-        std::string upper = kind;
-        for (char& c : upper)
-            if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 'a' + 'A');
-        if (upper != "COM") {
+        if (!EqualsNoCase(kind, "COM")) {
             req.report(ME_NOT_SUPPORTED, ME_UNSUPPORTED_PORTS, kind + " is Unsupported");
             return ME_UNSUPPORTED_PORTS;
         }

@@ -108,9 +108,8 @@ std::int32_t getReadings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWra
 
         owner.PercentLimit(100);
         ResultCollection results;
-        std::string serial = session.LastMeterSerialNo();
-        std::int16_t type = session.LastMeterType();
-        meter->MeterUpload(serial, type, results);
+        // False only says some records were unreadable; that is reported below, after the identity checks.
+        meter->MeterUpload(results);
         owner.resetPercentage();
         UniqueChecker checker;
 

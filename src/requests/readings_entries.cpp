@@ -413,7 +413,7 @@ bool ProcessCommentsAsPerDeviceType(Glucose& result, std::int16_t deviceType) {
         bool taken = id == 0;
         if (!taken && deviceType == 1) {
             // These meters' codes are events, not comments.
-            result.events()->Add(id, 1, 0, "", true);
+            result.events()->Add(id, 1);
             taken = true;
         } else if (!taken && deviceType == 2 && ((id >= 2 && id <= 7) || id == 9 || id == 10)) {
             // These meters give the meal slot as a comment code; a later one wins.

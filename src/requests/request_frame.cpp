@@ -13,12 +13,6 @@ namespace {
 // An Error_code the client sets to keep the meter open on failure paths.
 constexpr std::int16_t kKeepSessionOpen = -50;
 
-std::string lowerCase(std::string s) {
-    for (char& c : s)
-        if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-    return s;
-}
-
 }  // namespace
 
 void reportStatus(XMLWrapper& status, std::int32_t major, std::int32_t minor, const std::string& description) {
@@ -68,8 +62,7 @@ bool Request::readIdentity(XMLWrapper& deviceInfo) {
     }
     typeText_ = deviceInfo.GetChildValue("TypeID");
     deviceInfo.MoveToRoot();
-    const double type = ToNumber(typeText_);
-    if (!(type > 0 && type <= 8)) {
+    if (!IsMeterType(ToNumber(typeText_))) {
         fail(ME_BAD_PARAMETER, " ; Device Type from Device Info XML is invalid");
         return false;
     }
@@ -84,7 +77,7 @@ std::int32_t Request::checkMeter() {
 
 std::int32_t Request::compareIdentity() {
     const std::string different = ErrorDescription(ME_DIFFERENT_DEVICE);
-    if (lowerCase(session.LastMeterSerialNo()) != lowerCase(serialNumber_)) {
+    if (!EqualsNoCase(session.LastMeterSerialNo(), serialNumber_)) {
         report(ME_DIFFERENT_DEVICE, ME_DIFFERENT_DEVICE,
                different + " ; Device SN from Device Info XML - " + serialNumber_ + " Device SN from device - " +
                    session.LastMeterSerialNo() + " do not match");

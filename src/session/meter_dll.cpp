@@ -34,7 +34,6 @@ MeterDll::~MeterDll() {
 }
 
 std::int16_t MeterDll::identify(Step step, METER_REC& udtMeterRec) {
-    isProcessing_ = true;
     working_ = udtMeterRec;
     std::int16_t code = 0;
     if (step == Step::Find) {
@@ -66,7 +65,6 @@ std::int16_t MeterDll::identify(Step step, METER_REC& udtMeterRec) {
         isInitialised_ = true;
         Meter_.reset();
     }
-    isProcessing_ = false;
     return code;
 }
 
@@ -112,6 +110,7 @@ bool MeterDll::initialise() {
 
 bool MeterDll::MeterClose(METER_REC& udtMeterRec) {
     return guarded(kClass, "MeterClose", [&] {
+        // The exit code tells the tickle and the close that the session ends; the caller's record keeps it.
         udtMeterRec.Error_code = ME_QUIT;
         transport_->vb_Tickle_Meter(udtMeterRec);
         WaitSeconds(1.0f);

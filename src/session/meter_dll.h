@@ -62,14 +62,9 @@ public:
     std::int16_t COMPort_Detected() const { return storedRecord().port.com_number; }
 
     bool isInitialised() const { return isInitialised_; }
-    bool isProcessing() const { return isProcessing_; }
-    std::int16_t COMPort_Pref() const { return COMPort_Pref_; }
     void setCOMPort_Pref(std::int16_t port) { COMPort_Pref_ = port; }
-    bool CanContinue() const { return CanContinue_; }
-    void setCanContinue(bool value) { CanContinue_ = value; }
     // The model object of the last identified meter, or null.
     std::shared_ptr<MeterModel> Meter() const { return Meter_; }
-    void setMeter(std::shared_ptr<MeterModel> meter) { Meter_ = std::move(meter); }
     const std::string& LastMeterSerialNo() const { return LastMeterSerialNo_; }
     std::int16_t LastMeterType() const { return LastMeterType_; }
     // The code of the last firmware read of find or init: 0 when the stored Firmware_number is the meter's.
@@ -100,10 +95,8 @@ private:
 
     std::int16_t DevInitialised_ = 0;
     bool isInitialised_ = false;
-    bool isProcessing_ = false;
     std::int16_t COMPort_Pref_ = 0;
     std::shared_ptr<MeterModel> Meter_;
-    bool CanContinue_ = true;
     std::string LastMeterSerialNo_;
     std::int16_t LastMeterType_ = 0;
     std::int16_t FirmwareCode_ = 0;

@@ -42,14 +42,14 @@ std::int16_t setOralMedFavourites(Transport& t, METER_REC& rec, const std::int16
 
 const MedicationTable kInsulins = {
     "Group_Insulins", 21, 3, 11,
-    "InsulinName", "FavInsulin", "InsulinNameChanged", "isInsulinChangeable",
+    "InsulinName", "FavInsulin", "isInsulinChangeable",
     &Transport::GetInsulinName, &Transport::SetInsulinName,
     getInsulinFavourites, setInsulinFavourites,
 };
 
 const MedicationTable kOralMeds = {
     "Group_OralMeds", 15, 5, 6,
-    "OralMedName", "FavOralMed", "OralMedNameChanged", "isOralMedChangeable",
+    "OralMedName", "FavOralMed", "isOralMedChangeable",
     &Transport::GetOralMedicationName, &Transport::SetOralMedicationName,
     getOralMedFavourites, setOralMedFavourites,
 };
@@ -144,11 +144,6 @@ void MedicationGroup::setFavourite(std::int32_t position, std::int16_t value) {
 
 bool MedicationGroup::nameChanged(std::int32_t position) const {
     return inRange(position, table_.count) && changed_[static_cast<std::size_t>(position - 1)];
-}
-
-void MedicationGroup::setNameChanged(std::int32_t position, bool value) {
-    guarded(table_.className, table_.changedRoutine,
-            [&] { changed_[slotOf(position, table_.count)] = value; });
 }
 
 bool MedicationGroup::changeable(std::int32_t position) {

@@ -19,7 +19,6 @@ struct MedicationTable {
     std::int32_t firstCustom;     // first position saveToMeter writes back
     const char* nameRoutine;
     const char* favouriteRoutine;
-    const char* changedRoutine;
     const char* changeableRoutine;
     std::int16_t (Transport::*getName)(METER_REC&, INSULIN_OR_ORAL_MED_NAME_TYPE&);
     std::int16_t (Transport::*setName)(METER_REC&, INSULIN_OR_ORAL_MED_NAME_TYPE&);
@@ -52,11 +51,9 @@ protected:
     std::int16_t favourite(std::int32_t position) const;
     void setFavourite(std::int32_t position, std::int16_t value);
     bool nameChanged(std::int32_t position) const;
-    void setNameChanged(std::int32_t position, bool changed);
     bool changeable(std::int32_t position);
     // Slots 0..count: position p is slot p-1, the last slot is spare.
     std::vector<std::string> names() const { return names_; }
-    std::vector<std::int16_t> favourites() const { return favourites_; }
 
 private:
     void clearValues() override;
@@ -79,9 +76,7 @@ public:
     void setFavInsulin(std::int32_t position, std::int16_t value) { setFavourite(position, value); }
     std::int32_t FavInsulinCount() const { return favouriteCount(); }
     bool InsulinNameChanged(std::int32_t position) const { return nameChanged(position); }
-    void setInsulinNameChanged(std::int32_t position, bool value) { setNameChanged(position, value); }
     std::vector<std::string> InsulinsArray() const { return names(); }
-    std::vector<std::int16_t> FavInsulinsArray() const { return favourites(); }
     // False only for a name the meter marks as not changeable.
     bool isInsulinChangeable(std::int32_t position) { return changeable(position); }
 };
@@ -97,9 +92,7 @@ public:
     void setFavOralMed(std::int32_t position, std::int16_t value) { setFavourite(position, value); }
     std::int32_t FavOralMedsCount() const { return favouriteCount(); }
     bool OralMedNameChanged(std::int32_t position) const { return nameChanged(position); }
-    void setOralMedNameChanged(std::int32_t position, bool value) { setNameChanged(position, value); }
     std::vector<std::string> OralMedsArray() const { return names(); }
-    std::vector<std::int16_t> FavOralMedsArray() const { return favourites(); }
     // False only for a name the meter marks as not changeable.
     bool isOralMedChangeable(std::int32_t position) { return changeable(position); }
 };

@@ -78,8 +78,4 @@ bool Group_Schedule::ScheduleTimeChanged(std::int32_t segment) const {
     return isSegment(segment) && changed_[static_cast<std::size_t>(segment - 1)];
 }
 
-void Group_Schedule::setScheduleTimeChanged(std::int32_t segment, bool changed) {
-    guarded(kClass, "ScheduleTimeChanged", [&] { changed_[slotOf(segment)] = changed; });
-}
-
 }  // namespace varnel::detail

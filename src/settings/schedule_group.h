@@ -27,7 +27,6 @@ public:
     // Keeps hour and quarter hour (later minutes and seconds are dropped) and marks the segment changed.
     void setScheduleTime(std::int32_t segment, const DateTime& time);
     bool ScheduleTimeChanged(std::int32_t segment) const;
-    void setScheduleTimeChanged(std::int32_t segment, bool changed);
 
 private:
     static constexpr std::int32_t kSegments = 7;

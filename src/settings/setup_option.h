@@ -27,8 +27,6 @@ public:
     // Stores the value and marks the option modified.
     void setValue(Variant value);
 
-    // Always "yes".
-    std::string KeyText() const { return "yes"; }
     // The option's name for its Key; "" for a key outside 0-18.
     std::string KeyName() const;
 

@@ -2,7 +2,6 @@
 
 #include <chrono>
 #include <cmath>
-#include <cstdio>
 
 namespace varnel::detail {
 
@@ -49,17 +48,5 @@ int DateTime::day() const { return int(unsigned(civil(dayNumber()).day())); }
 int DateTime::hour() const { return int((seconds_ - std::int64_t(dayNumber()) * 86400) / 3600); }
 int DateTime::minute() const { return int((seconds_ - std::int64_t(dayNumber()) * 86400) / 60 % 60); }
 int DateTime::second() const { return int((seconds_ - std::int64_t(dayNumber()) * 86400) % 60); }
-
-int DateTime::weekday() const {
-    // Day 0 was a Saturday.
-    return int(((dayNumber() % 7) + 7 + 6) % 7) + 1;
-}
-
-std::string DateTime::iso() const {
-    char buf[32];
-    std::snprintf(buf, sizeof buf, "%04d-%02d-%02dT%02d:%02d:%02d", year(), month(), day(), hour(),
-                  minute(), second());
-    return buf;
-}
 
 }  // namespace varnel::detail

@@ -32,14 +32,9 @@ public:
     int hour() const;
     int minute() const;
     int second() const;
-    // 1 = Sunday ... 7 = Saturday.
-    int weekday() const;
 
     DateTime datePart() const { return DateTime(std::int64_t(dayNumber()) * 86400); }
     DateTime addSeconds(std::int64_t s) const { return DateTime(seconds_ + s); }
-
-    // "yyyy-mm-ddThh:mm:ss"
-    std::string iso() const;
 
     auto operator<=>(const DateTime&) const = default;
 

@@ -8,6 +8,7 @@
 #include <optional>
 
 #include "util/codepage.h"
+#include "varnel/records.h"
 
 namespace varnel::detail {
 
@@ -22,14 +23,6 @@ std::string_view trim(std::string_view s) {
 }
 
 bool isDigit(char c) { return c >= '0' && c <= '9'; }
-
-char lowerAscii(char c) { return (c >= 'A' && c <= 'Z') ? char(c - 'A' + 'a') : c; }
-
-bool equalsNoCase(std::string_view a, std::string_view b) {
-    return a.size() == b.size() &&
-           std::equal(a.begin(), a.end(), b.begin(),
-                      [](char x, char y) { return lowerAscii(x) == lowerAscii(y); });
-}
 
 // Sign, digits with at most one point (at least one digit), optional exponent with digits.
 bool hasNumberSyntax(std::string_view s) {
@@ -93,7 +86,7 @@ constexpr std::array<std::string_view, 12> kMonthNames = {"Jan", "Feb", "Mar", "
 int monthByName(std::string_view s) {
     s = trim(s);
     for (std::size_t i = 0; i < kMonthNames.size(); ++i)
-        if (equalsNoCase(s, kMonthNames[i])) return int(i) + 1;
+        if (EqualsNoCase(s, kMonthNames[i])) return int(i) + 1;
     return 0;
 }
 
@@ -124,7 +117,7 @@ std::optional<DateLayout> layoutOf(std::string_view text, std::string_view separ
     for (std::size_t i = 0; i < 3; ++i) {
         std::string_view p = trim(patternParts[i]);
         if (p.empty()) continue;
-        switch (lowerAscii(p.front())) {
+        switch (LowerAscii(p.front())) {
         case 'y':
             if (!layout.year) layout.year = textParts[i];
             break;
@@ -159,10 +152,17 @@ thread_local bool continueFlag = true;
 
 std::string Trim(std::string_view text) { return std::string(trim(text)); }
 
+char LowerAscii(char c) { return (c >= 'A' && c <= 'Z') ? char(c - 'A' + 'a') : c; }
+
 std::string LowerCase(std::string_view text) {
     std::string s(text);
-    std::transform(s.begin(), s.end(), s.begin(), lowerAscii);
+    std::transform(s.begin(), s.end(), s.begin(), LowerAscii);
     return s;
+}
+
+bool EqualsNoCase(std::string_view a, std::string_view b) {
+    return a.size() == b.size() &&
+           std::equal(a.begin(), a.end(), b.begin(), [](char x, char y) { return LowerAscii(x) == LowerAscii(y); });
 }
 
 std::string Abbreviated(std::string_view text) {
@@ -299,6 +299,8 @@ bool IsValidDay(std::string_view text, std::string_view separator, std::string_v
 bool GetContinueFlag() { return continueFlag; }
 
 void SetContinueFlag(bool value) { continueFlag = value; }
+
+bool IsMeterType(double type) { return type > int{eNoMeter} && type <= int{eParvix}; }
 
 void getMinMaxDates(int meterType, std::int32_t& minDate, std::int32_t& maxDate) {
     for (const MinMaxDates& r : kClockRanges) {

@@ -38,8 +38,13 @@ std::optional<std::int16_t> Int16Value(double value);
 
 // The text without the blanks (spaces, tabs, line ends) at either end.
 std::string Trim(std::string_view text);
+// The character in lower case when it is an ASCII capital; every other byte as it is.
+// No locale takes part, so a UTF-8 byte is never changed.
+char LowerAscii(char c);
 // The text with its ASCII capitals in lower case.
 std::string LowerCase(std::string_view text);
+// True when the texts differ at most in the case of ASCII letters.
+bool EqualsNoCase(std::string_view a, std::string_view b);
 // A client's text as a message quotes it: its first 40 UTF-8 characters, and
 // "..." when there were more, so that a huge value cannot swell a report.
 std::string Abbreviated(std::string_view text);
@@ -81,6 +86,11 @@ bool IsValidDay(std::string_view text, std::string_view separator, std::string_v
 // The calling thread's continue flag: long loops stop early when it is false. Starts true.
 bool GetContinueFlag();
 void SetContinueFlag(bool value);
+
+// True for a meter type of the family: above eNoMeter (0), up to eParvix (8). Documents give the
+// type as a number text, so a fraction in that range passes here; the identity check, which
+// compares it with the meter's own type, refuses it.
+bool IsMeterType(double type);
 
 // First and last serial day of the clock range the meter type accepts; any other
 // type leaves both untouched.

@@ -1,22 +1,11 @@
 #include "varnel/unique_checker.h"
 
-#include <algorithm>
+#include "util/helpers.h"
 
 namespace varnel {
 
-namespace {
-
-std::string foldCase(const std::string& s) {
-    std::string folded(s);
-    std::transform(folded.begin(), folded.end(), folded.begin(),
-                   [](char c) { return (c >= 'A' && c <= 'Z') ? char(c - 'A' + 'a') : c; });
-    return folded;
-}
-
-}  // namespace
-
 bool UniqueChecker::AddValue(const std::string& value) {
-    auto [at, added] = folded_.insert(foldCase(value));
+    auto [at, added] = folded_.insert(detail::LowerCase(value));
     if (!added) return false;
     try {
         values_.push_back(value);

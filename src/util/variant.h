@@ -12,6 +12,4 @@ namespace varnel::detail {
 
 using Variant = std::variant<std::monostate, std::int32_t, double, DateTime, std::string>;
 
-inline bool isEmpty(const Variant& v) { return std::holds_alternative<std::monostate>(v); }
-
 }  // namespace varnel::detail

@@ -21,9 +21,9 @@ TEST(ErrPropagator, TraceGrowsOutermostFirstAndCleanupSeesIt) {
     });
     EXPECT_EQ(trace, std::to_string(errc::subscript_out_of_range) + " outer --> mid --> inner --> ");
     EXPECT_EQ(seen, "mid --> inner --> ");
-    // The shared error holds the latest routine, the inner trace as its description and no class.
+    // The shared error holds the latest routine and the inner trace as its description.
     const IError& e = errPropagator().error();
-    EXPECT_EQ(e.ErrorDesc + "|" + e.FunctionName + "|" + e.ClassName, "mid --> inner --> |outer|");
+    EXPECT_EQ(e.ErrorDesc + "|" + e.FunctionName, "mid --> inner --> |outer");
 
     // Started afresh, the next trace does not carry this one.
     EXPECT_EQ(test::unexpectedTrace([] { guarded("X", "getReadings", [] { raise(errc::missing_object, "boom"); }); }),

@@ -14,8 +14,6 @@ namespace {
 struct Conversion : ::testing::Test {
     clsMeterFns fns{test::simTransport()};
     ResultCollection results;
-    std::string serial;
-    std::int16_t type = 7;
     std::vector<std::string> oralMeds{"Metformin", "Glipizide"}, insulins{"Humalog"};
     std::vector<RECORD_DATA> records;
 
@@ -29,7 +27,7 @@ struct Conversion : ::testing::Test {
     }
     bool convertBinary() {
         sim::encodeBinaryDatalog(records, fns.binaryDatalog());
-        return fns.Fastmeterupload(serial, type, results, oralMeds, insulins);
+        return fns.Fastmeterupload(results, oralMeds, insulins);
     }
     template <class R>
     R& at(int i) { return dynamic_cast<R&>(*results.Item(i)); }
@@ -142,7 +140,7 @@ TEST_F(Conversion, UnreadableRecordsAreCountedAndSkipped) {
     sim::corruptBinaryRecord(fns.binaryDatalog(), 2);
     fns.binaryDatalog().corruptedCount = -3;
     fns.binaryDatalog().maxRecordsForMeter = 500;
-    EXPECT_FALSE(fns.Fastmeterupload(serial, type, results, oralMeds, insulins));
+    EXPECT_FALSE(fns.Fastmeterupload(results, oralMeds, insulins));
     std::vector<int> days;
     for (const auto& r : results) days.push_back(r->DateTime().day());
     EXPECT_EQ(days, (std::vector<int>{1, 2, 4}));
@@ -156,7 +154,7 @@ TEST_F(Conversion, UnreadableRecordsAreCountedAndSkipped) {
     log.ValidRecordCount = 2;
     results = {};
     sim::injectFault("convert_from_seconds", 1, ME_COM_ERROR, true);
-    EXPECT_FALSE(fns.NonFastmeterUpload(serial, type, results));
+    EXPECT_FALSE(fns.NonFastmeterUpload(results));
     sim::clearFaults();
     EXPECT_EQ(results.Count(), 0);
     EXPECT_EQ(std::tuple(fns.corruptedCount(), fns.unreadableCount(), fns.unreadableCode()),
@@ -183,7 +181,7 @@ TEST_F(Conversion, RecordDatalogRows) {
     std::copy(std::begin(rows), std::end(rows), log.DataLog);
     log.recordCount = 11;
     log.ValidRecordCount = 10;
-    ASSERT_TRUE(fns.NonFastmeterUpload(serial, type, results));
+    ASSERT_TRUE(fns.NonFastmeterUpload(results));
     EXPECT_EQ(column(), (Types{0, 20, 10, 21, 50, 41, 30}));
     EXPECT_EQ(std::tuple(fns.recordCount(), fns.corruptedCount()), std::tuple(11, 1));
     EXPECT_EQ(at<Error>(1).Value(), 111);
@@ -201,20 +199,20 @@ TEST_F(Conversion, RecordDatalogNeverReadsPastItsBuffer) {
     std::fill(std::begin(log.DataLog), std::end(log.DataLog), entry(1, 0));
     log.DataLog[3] = entry(1, 16);  // a test type beyond the table
     log.recordCount = 5;
-    EXPECT_THROW(fns.NonFastmeterUpload(serial, type, results), ComponentError);
+    EXPECT_THROW(fns.NonFastmeterUpload(results), ComponentError);
     EXPECT_EQ(results.Count(), 3);
 
     results = {};
     log.DataLog[3] = entry(1, 0);
     log.recordCount = 300;
     errPropagator().reset();
-    EXPECT_THROW(fns.NonFastmeterUpload(serial, type, results), ComponentError);
+    EXPECT_THROW(fns.NonFastmeterUpload(results), ComponentError);
     EXPECT_EQ(errPropagator().error().ErrorTrace, "NonFastmeterUpload --> ");
     EXPECT_EQ(results.Count(), 255);
 
     results = {};
     log.recordCount = -4;
-    EXPECT_TRUE(fns.NonFastmeterUpload(serial, type, results));
+    EXPECT_TRUE(fns.NonFastmeterUpload(results));
     EXPECT_EQ(results.Count(), 0);
     EXPECT_EQ(fns.corruptedCount(), 0);
 }
@@ -225,7 +223,7 @@ TEST_F(Conversion, TwoDigitYearWindow) {
     for (int i = 0; i < 3; ++i)
         log.DataLog[i] = entry(1, 0), log.DataLog[i].D_Time = sim::secondsOf(years[i], 12, 31, 23, 58, 59);
     log.recordCount = 3;
-    ASSERT_TRUE(fns.NonFastmeterUpload(serial, type, results));
+    ASSERT_TRUE(fns.NonFastmeterUpload(results));
     for (int i = 0; i < 3; ++i)
         EXPECT_EQ(results.Item(i + 1)->DateTime(), *DateTime::fromParts(i == 1 ? 1930 : years[i], 12, 31, 23, 58, 59));
 }

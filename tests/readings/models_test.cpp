@@ -22,8 +22,6 @@ namespace {
 struct Models : test::SimSession {
     std::unique_ptr<MeterModel> model;
     std::vector<int> progress;
-    std::string serial;
-    std::int16_t type = 0;
 
     void open(int type) {
         connect(type);
@@ -81,7 +79,7 @@ TEST_F(Models, MorvexReadsTheNamesOnlyAfterASuccessfulUpload) {
     EXPECT_EQ(insulins.InsulinName(12), m.insulinNames[11].bytes);
     EXPECT_EQ(group<Group_OralMeds>(3).OralMedName(6), m.oralMedNames[5].bytes);
     ResultCollection results;
-    EXPECT_TRUE(model->MeterUpload(serial, type, results));
+    EXPECT_TRUE(model->MeterUpload(results));
     // Injections name the meter's own insulins, taken from the table just read.
     std::set<std::string> known, named;
     for (const auto& slot : m.insulinNames) known.insert(slot.bytes);
@@ -114,7 +112,7 @@ TEST_F(Models, SetupReportsProgressPerGroupAndStopsAtTheFirstFailure) {
         // Then its datalog uploads and converts.
         ResultCollection results;
         ASSERT_EQ(model->GetReadingFromMeter(), 0);
-        EXPECT_TRUE(model->MeterUpload(serial, type, results));
+        EXPECT_TRUE(model->MeterUpload(results));
         EXPECT_GT(results.Count(), 0);
     }
 }

@@ -17,8 +17,6 @@ struct Progress : ::testing::Test {
     std::shared_ptr<test::FakeTransport> fake = std::make_shared<test::FakeTransport>();
     clsMeterFns fns{fake};
     std::vector<int> raised;
-    std::string serial;
-    std::int16_t type = 1;
 
     void SetUp() override {
         setThreadClock(clock);
@@ -45,7 +43,7 @@ struct Progress : ::testing::Test {
     void convert(std::int16_t records) {
         fns.recordDatalog().recordCount = records;
         ResultCollection out;
-        ASSERT_TRUE(fns.NonFastmeterUpload(serial, type, out));
+        ASSERT_TRUE(fns.NonFastmeterUpload(out));
     }
 };
 

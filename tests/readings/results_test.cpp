@@ -28,7 +28,6 @@ TEST(ResultRecords, DefaultsAndCommentListsThatAreNeverMissing) {
                          HealthNotes().Value(), hbA1C().ResultType(), Alcohol().ResultType()),
               std::tuple(3, 3, 0, 1, 80, 54));
     EXPECT_EQ(g.Comments()->Count(), 0);
-    g.setComments(nullptr);
     EXPECT_NE(g.Comments(), nullptr);
     EXPECT_NE(g.events(), nullptr);
 }
@@ -36,15 +35,15 @@ TEST(ResultRecords, DefaultsAndCommentListsThatAreNeverMissing) {
 TEST(CommentsCollection, OneCommentPerCodeAndKeysIgnoringCase) {
     errPropagator().reset();
     CommentsCollection c;
-    auto first = c.Add(11, 1, 1);
+    auto first = c.Add(11, 1);
     ASSERT_NE(first, nullptr);
-    EXPECT_EQ(c.Add(11, 7, 1, "again", true, "other"), nullptr);
-    auto labelled = c.Add(14, 2, 0, "hypo", true, "Hypo");
+    EXPECT_EQ(c.Add(11, 7, "other"), nullptr);
+    auto labelled = c.Add(14, 2, "Hypo");
     EXPECT_EQ(c.Item("hypo"), labelled);
     EXPECT_EQ(c.Item("14"), nullptr);
     EXPECT_EQ((std::vector{c.Item(0), c.Item(2), c.Item(3)}), (std::vector<CommentPtr>{nullptr, labelled, nullptr}));
     try {
-        c.Add(15, 1, 1, "", false, "HYPO");
+        c.Add(15, 1, "HYPO");
         FAIL() << "a key taken by another code was accepted";
     } catch (const ComponentError& e) {
         EXPECT_EQ(e.description(), "Add --> ");

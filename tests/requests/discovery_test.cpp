@@ -114,7 +114,8 @@ TEST_F(Discovery, AFailedIdentityReadIsAReportedFailure) {
         // A failed search before does not keep the next one from uploading.
         EXPECT_EQ(discoverOn("5"), ME_NO_DEVICE);
         EXPECT_EQ(discoverOn("2"), ME_SUCCESS);
-        const pugi::xml_node info = parsed(device)->document_element().child("DeviceInfo");
+        const auto doc = parsed(device);  // the node below lives only as long as its document
+        const pugi::xml_node info = doc->document_element().child("DeviceInfo");
         EXPECT_EQ(info.child_value("SN"), sim::meter().serial);
         EXPECT_EQ(info.child_value("MasterSWVer"), detail::splitFirmware(sim::meter().firmware).version);
     }

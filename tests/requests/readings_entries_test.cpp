@@ -48,7 +48,7 @@ struct Datalog {
 
     Glucose& glucose(std::initializer_list<std::int32_t> codes, std::int32_t slot = 0) {
         Glucose& g = add<Glucose>(10, 100);
-        for (auto c : codes) g.Comments()->Add(c, 1, 1);
+        for (auto c : codes) g.Comments()->Add(c, 1);
         g.setSlot(slot);
         return g;
     }
@@ -223,7 +223,7 @@ TEST(ReadingsEntries, GlucoseCommentsAndSlotsByMeterType) {
                                       R"(<Event Txt="EVENT24">24</Event></Comments></Gluc>)");
 
     Datalog seven(7);
-    seven.glucose({1, 8, 10, 14, 25, 99}).events()->Add(5, 1, 0);
+    seven.glucose({1, 8, 10, 14, 25, 99}).events()->Add(5, 1);
     EXPECT_THAT(seven.write()[0],
                 HasSubstr(R"(<Comments><Food Txt="Fasting">1</Food><Food Txt="Different Food">0</Food>)"
                           R"(<Ex Txt="During">2</Ex><Hypo/><Other Txt="Other1">1</Other>)"
@@ -239,7 +239,7 @@ TEST(ReadingsEntries, GlucoseCommentsAndSlotsByMeterType) {
                                 R"(<Comments><Ex Txt="Before">0</Ex></Comments></Gluc>)");
     for (std::int16_t type : {6, 8}) {
         Datalog quiet(type);
-        quiet.glucose({13}).events()->Add(4, 1, 0);
+        quiet.glucose({13}).events()->Add(4, 1);
         EXPECT_THAT(quiet.write()[0], Not(HasSubstr("Comments"))) << type;
     }
 }

@@ -3,7 +3,9 @@
 #include <cstdint>
 #include <optional>
 #include <string>
+#include <limits>
 #include <thread>
+#include <tuple>
 
 #include "util/helpers.h"
 #include "varnel/unique_checker.h"
@@ -167,4 +169,24 @@ TEST(UniqueChecker, FoldsAsciiCaseKeepsOrderAndClears) {
     EXPECT_TRUE(checker.AddValue("ABC"));
     EXPECT_FALSE(checker.AddValue("abc"));
     EXPECT_EQ(checker.Values(), std::vector<std::string>{"ABC"});
+}
+
+// Serials, keys, port kinds and month names fold ASCII only: bytes of other characters must never
+// match across case, whatever locale the client process runs under.
+TEST(CaseFold, AsciiLettersOnly) {
+    EXPECT_EQ(LowerCase("AbZ@[`{09 \xC3\x89"), "abz@[`{09 \xC3\x89");
+    for (auto [a, b, equal] : {std::tuple{"SN123ab", "sn123AB", true}, {"com", "COM", true}, {"", "", true},
+                               {"abc", "abcd", false}, {"abc", "ab", false}, {"@", "`", false}, {"[", "{", false},
+                               {"\xC3\xA9", "\xC3\x89", false}, {"I", "\xC4\xB1", false}})
+        EXPECT_EQ(EqualsNoCase(a, b), equal) << a << " / " << b;
+}
+
+// The type a document or a meter names: the family's eight members, a fraction among them only
+// for the identity check to refuse later, and nothing else.
+TEST(MeterType, FamilyRangeOnly) {
+    for (double type : {1.0, 2.0, 7.0, 8.0, 0.5, 7.5})
+        EXPECT_TRUE(IsMeterType(type)) << type;
+    for (double type : {0.0, -0.0, -1.0, 8.0001, 9.0, 65535.0, std::numeric_limits<double>::quiet_NaN(),
+                        std::numeric_limits<double>::infinity()})
+        EXPECT_FALSE(IsMeterType(type)) << type;
 }
