@@ -144,7 +144,7 @@ void applyDevInit(ApplyContext& ctx) {
 
 }  // namespace
 
-std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
+std::int32_t setDeviceSettings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
                                XMLWrapper& deviceCfg, XMLWrapper& status) {
     Request req(owner, "getDeviceSettings", udtMeterRec, &status);
     return req.run([&]() -> std::int32_t {

@@ -39,8 +39,8 @@ std::int16_t GetAllGeneralSettings(MeterDll& session, METER_REC& udtMeterRec, XM
     return r;
 }
 
-Request::Request(DllWrapper::Impl& owner, const char* traceName, METER_REC& udtMeterRec, XMLWrapper* status)
-    : owner(owner), session(owner.mobjMeterDll), rec(udtMeterRec), traceName_(traceName), status_(status) {
+Request::Request(RequestContext& owner, const char* traceName, METER_REC& udtMeterRec, XMLWrapper* status)
+    : owner(owner), session(owner.session), rec(udtMeterRec), traceName_(traceName), status_(status) {
     errPropagator().reset();
 }
 
@@ -149,7 +149,7 @@ void Request::unexpected() {
 ItemProgress::ItemProgress(std::int32_t count)
     : step_(count > 0 ? roundToInt16(100.0 / count) : std::int16_t{0}) {}
 
-void ItemProgress::advance(DllWrapper::Impl& owner) {
+void ItemProgress::advance(RequestContext& owner) {
     percent_ = static_cast<std::int16_t>(std::min(percent_ + step_, 100));
     owner.RaiseProgress(percent_);
 }

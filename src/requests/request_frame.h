@@ -7,7 +7,7 @@
 #include <cstdint>
 #include <string>
 
-#include "component/dll_impl.h"
+#include "requests/request_context.h"
 #include "platform/message_pump.h"
 #include "varnel/records.h"
 #include "varnel/xml_wrapper.h"
@@ -36,7 +36,7 @@ class ItemProgress {
 public:
     explicit ItemProgress(std::int32_t count = 0);
     // Counts one more item done and raises the new percentage.
-    void advance(DllWrapper::Impl& owner);
+    void advance(RequestContext& owner);
 
 private:
     std::int16_t step_;
@@ -47,7 +47,7 @@ private:
 class Request {
 public:
     // status is null only for closeMeter, which reports nothing and closes whatever Error_code says.
-    Request(DllWrapper::Impl& owner, const char* traceName, METER_REC& udtMeterRec, XMLWrapper* status);
+    Request(RequestContext& owner, const char* traceName, METER_REC& udtMeterRec, XMLWrapper* status);
 
     // Runs body (which returns the request's code) under the unexpected-error
     // handler: status -17/-16 with the error and VBTrace, the session closed
@@ -80,7 +80,7 @@ public:
     // Raises onComplete and gives result back.
     std::int32_t complete(std::int32_t result);
 
-    DllWrapper::Impl& owner;
+    RequestContext& owner;
     MeterDll& session;
     METER_REC& rec;
 
