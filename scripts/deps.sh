@@ -1,7 +1,9 @@
 #!/usr/bin/env bash
-# Installs the Debian packages Varnel builds with, when any is missing.
+# Installs the Debian packages Varnel builds and tests with, when any is missing:
+# the compilers, the libraries, and clang's sanitizer and libFuzzer runtimes.
 set -euo pipefail
-packages=(cmake g++ make libpugixml-dev libgtest-dev libgmock-dev libbenchmark-dev libcli11-dev)
+packages=(cmake g++ make libpugixml-dev libgtest-dev libgmock-dev libbenchmark-dev libcli11-dev
+          clang libclang-rt-14-dev libxml2-dev)
 missing=()
 for p in "${packages[@]}"; do
   dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q "install ok installed" || missing+=("$p")

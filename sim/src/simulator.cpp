@@ -162,4 +162,9 @@ int callCount(const std::string& function) {
     return state().calls(function);
 }
 
+std::vector<std::string> faultableFunctions() {
+    const auto names = detail::faultableFunctions();
+    return {names.begin(), names.end()};
+}
+
 }  // namespace varnel::sim

@@ -129,5 +129,7 @@ MeterProfile meter();
 bool portOpen();
 // Calls of the named transport function since the last reset or profile load.
 int callCount(const std::string& function);
+// The names injectFault accepts: every transport function that reports a status.
+std::vector<std::string> faultableFunctions();
 
 }  // namespace varnel::sim

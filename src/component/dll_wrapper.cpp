@@ -3,14 +3,41 @@
 #include <dlfcn.h>
 
 #include <filesystem>
+#include <string>
+#include <vector>
 
 #include "requests/discovery.h"
 #include "requests/meter_actions.h"
 #include "requests/readings_document.h"
 #include "requests/request_context.h"
 #include "requests/settings_requests.h"
+#include "varnel/clock.h"
 
 namespace varnel {
+
+namespace {
+
+// Where the shipped transport library may be: beside libvarnel, in a varnel/
+// directory beside it (install layouts), then wherever the loader's own search
+// finds it. The shared library is located through a symbol only it defines (the
+// clock slot), so programs that also link the component's units statically, and
+// sanitizer runtimes that stand in for the loader's caller, look in the same place.
+std::vector<std::string> transportCandidates() {
+    std::vector<std::string> candidates;
+    Dl_info info{};
+    if (dladdr(reinterpret_cast<void*>(&threadClock), &info) && info.dli_fname) {
+        std::error_code ec;
+        std::filesystem::path dir = std::filesystem::path(info.dli_fname).parent_path();
+        const std::filesystem::path absolute = std::filesystem::absolute(dir, ec);
+        if (!ec) dir = absolute;
+        candidates.push_back((dir / VARNEL_TRANSPORT_NAME).string());
+        candidates.push_back((dir / "varnel" / VARNEL_TRANSPORT_NAME).string());
+    }
+    candidates.push_back(VARNEL_TRANSPORT_NAME);
+    return candidates;
+}
+
+}  // namespace
 
 // What a DllWrapper keeps between requests. Only inline members, so nothing of
 // it is exported with the class it is nested in.
@@ -19,7 +46,7 @@ struct DllWrapper::Impl {
     detail::RequestContext context;
 };
 
-DllWrapper::DllWrapper() : DllWrapper(defaultTransportPath()) {}
+DllWrapper::DllWrapper() : DllWrapper(detail::loadTransport(transportCandidates())) {}
 
 DllWrapper::DllWrapper(const std::string& transportPath)
     : DllWrapper(detail::loadTransport(transportPath)) {}
@@ -80,14 +107,12 @@ void DllWrapper::setOnProgress(std::function<void(std::int16_t& intPercentDone)>
 void DllWrapper::setOnComplete(std::function<void()> handler) { impl_->context.onComplete = std::move(handler); }
 
 std::string DllWrapper::defaultTransportPath() {
-    Dl_info info{};
-    if (dladdr(reinterpret_cast<void*>(&DllWrapper::defaultTransportPath), &info) && info.dli_fname) {
-        const std::filesystem::path beside =
-            std::filesystem::path(info.dli_fname).parent_path() / VARNEL_TRANSPORT_NAME;
+    const std::vector<std::string> candidates = transportCandidates();
+    for (const std::string& path : candidates) {
         std::error_code ec;
-        if (std::filesystem::is_regular_file(beside, ec)) return beside.string();
+        if (std::filesystem::is_regular_file(path, ec)) return path;
     }
-    return VARNEL_TRANSPORT_NAME;
+    return candidates.back();
 }
 
 }  // namespace varnel

@@ -7,6 +7,7 @@
 #include <optional>
 #include <thread>
 #include <utility>
+#include <vector>
 
 #include "errors/err_propagator.h"
 #include "platform/message_pump.h"
@@ -171,21 +172,32 @@ private:
     std::thread::id hookThread_;
 };
 
-// A library opened by path; closed with the last transport over it.
+// A library opened from the first of its candidate paths that loads; closed with the last transport over it.
 class Library {
 public:
-    explicit Library(std::string path) : path_(std::move(path)) {}
+    explicit Library(std::vector<std::string> paths) : paths_(std::move(paths)) {}
     ~Library() { close(); }
     Library(const Library&) = delete;
     Library& operator=(const Library&) = delete;
 
     // Opens the library and resolves every function; on failure it stays closed, so a later call retries.
     TransportFunctions open() {
-        dlerror();
-        handle_ = dlopen(path_.c_str(), RTLD_NOW | RTLD_LOCAL);
-        if (!handle_)
-            raise(errc::transport_unavailable,
-                  "Cannot load the transport library \"" + path_ + "\": " + lastError());
+        std::string tried;
+        for (const std::string& path : paths_) {
+            dlerror();
+            handle_ = dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL);
+            if (handle_) {
+                path_ = path;
+                break;
+            }
+            tried += (tried.empty() ? "\"" : "; \"") + path + "\": " + lastError();
+        }
+        if (!handle_) {
+            // One path reads as before; several name each place looked at.
+            const std::string what = paths_.size() == 1 ? "Cannot load the transport library "
+                                                        : "Cannot find the transport library; tried ";
+            raise(errc::transport_unavailable, what + tried);
+        }
         TransportFunctions f{};
 #define VARNEL_RESOLVE(name) f.name = reinterpret_cast<decltype(f.name)>(symbol(#name, true));
         VARNEL_REQUIRED_TRANSPORT_FUNCTIONS(VARNEL_RESOLVE)
@@ -217,7 +229,8 @@ private:
         return text ? text : "unknown reason";
     }
 
-    std::string path_;
+    std::vector<std::string> paths_;
+    std::string path_;  // the one opened
     void* handle_ = nullptr;
 };
 
@@ -226,7 +239,11 @@ private:
 }  // namespace
 
 std::shared_ptr<Transport> loadTransport(const std::string& path) {
-    auto library = std::make_shared<Library>(path);
+    return loadTransport(std::vector<std::string>{path});
+}
+
+std::shared_ptr<Transport> loadTransport(std::vector<std::string> candidates) {
+    auto library = std::make_shared<Library>(std::move(candidates));
     return std::make_shared<TableTransport>([library] { return library->open(); });
 }
 

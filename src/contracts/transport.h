@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "varnel/records.h"
 
@@ -105,6 +106,8 @@ public:
 // A transport over a library loaded by path on first use; a missing library
 // or function raises ComponentError naming it.
 std::shared_ptr<Transport> loadTransport(const std::string& path);
+// The same over the first of several paths that loads; the error names every path tried.
+std::shared_ptr<Transport> loadTransport(std::vector<std::string> candidates);
 
 // A transport over functions already in the process (the statically linked simulator).
 std::shared_ptr<Transport> makeTransport(const TransportFunctions& functions);

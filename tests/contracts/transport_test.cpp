@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <array>
+#include <filesystem>
 #include <functional>
 #include <initializer_list>
 #include <stdexcept>
@@ -18,6 +19,7 @@
 #include "support/sim_transport.h"
 #include "varnel/clock.h"
 #include "varnel/component_error.h"
+#include "varnel/dll_wrapper.h"
 
 using namespace varnel;
 using namespace varnel::detail;
@@ -134,6 +136,21 @@ TEST(TransportLoading, WhatIsMissingIsNamedOnFirstUse) {
     expectUnavailable([&] { makeTransport(table)->initialize_meter_structure(rec); }, {"\"find_meter\""});
     auto hookless = loadTransport(RECORDING_TRANSPORT_NO_YIELD_HOOK);  // the hook is optional
     EXPECT_EQ(hookless->vb_Clear_Meter_Datalog(rec), -108);
+}
+
+TEST(TransportLoading, CandidatesAreTriedInOrderAndAllNamedWhenNoneLoads) {
+    METER_REC rec{};
+    const std::string first = "/nonexistent/a/libvantrix_nowhere.so", second = "/nonexistent/b/libvantrix_nowhere.so";
+    expectUnavailable([&] { loadTransport({first, second})->vb_Chk4Meter(rec); }, {first, second});
+    EXPECT_EQ(loadTransport({first, RECORDING_TRANSPORT_FULL})->vb_Clear_Meter_Datalog(rec), -108);
+}
+
+// The default library is the one built beside libvarnel, found from libvarnel's
+// own place whatever the program's run path (sanitizer runtimes ignore it).
+TEST(TransportLoading, TheDefaultLibraryIsFoundBesideTheComponent) {
+    const std::string path = DllWrapper::defaultTransportPath();
+    ASSERT_EQ(path.front(), '/') << path;
+    EXPECT_TRUE(std::filesystem::equivalent(path, VARNEL_TEST_TRANSPORT_PATH)) << path;
 }
 
 // A virtual clock, and Percent_done as each tick of the progress timer saw it.

@@ -1,0 +1,121 @@
+// getReadings over a transport whose datalog answers come from the input:
+// arbitrary record-datalog entries, arbitrary binary datalog bytes for the
+// real record decoder, or arbitrary decoded records. Everything else is the
+// simulated meter. The component must neither crash nor read outside what the
+// transport gave it, and may fail only with a report or a ComponentError.
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <span>
+
+#include "contracts/transport.h"
+#include "harness.h"
+#include "readings.h"
+#include "varnel/component_error.h"
+#include "varnel/vantrix32.h"
+
+namespace {
+
+using varnel::fuzz::ReadingsHeader;
+
+ReadingsHeader header;
+std::span<const std::uint8_t> payload;
+std::size_t nextRecord = 0;  // direct mode: where the next answered record starts
+
+std::int16_t count(const std::uint8_t (&bytes)[2]) {
+    return static_cast<std::int16_t>(bytes[0] | bytes[1] << 8);
+}
+
+void fill(void* target, std::size_t capacity, std::span<const std::uint8_t> from) {
+    std::memcpy(target, from.data(), std::min(capacity, from.size()));
+}
+
+std::int16_t upload(METER_REC* rec, METER_DATALOG* log) {
+    if (!rec || !log) return ME_BAD_PARAMETER;
+    log->recordCount = count(header.count);
+    log->ValidRecordCount = count(header.second);
+    fill(log->DataLog, sizeof log->DataLog, payload);
+    rec->Percent_done = 100;
+    return ME_SUCCESS;
+}
+
+std::int16_t binaryUpload(METER_REC* rec, METER_BIN_DATALOG* log, std::int32_t) {
+    if (!rec || !log) return ME_BAD_PARAMETER;
+    log->recordCount = count(header.count);
+    log->corruptedCount = count(header.second);
+    if (!(header.flags & 1)) fill(log->binBuf, sizeof log->binBuf, payload);
+    nextRecord = 0;
+    rec->Percent_done = 100;
+    return ME_SUCCESS;
+}
+
+std::int16_t record(METER_BIN_DATALOG* log, std::int16_t index, RECORD_DATA* out) {
+    if (!log || !out) return ME_BAD_PARAMETER;
+    if (!(header.flags & 1)) return GetMeterDatalogRecordData(log, index, out);
+    if (nextRecord >= payload.size()) return ME_CHKSUM_ERROR;
+    std::memset(out, 0, sizeof *out);
+    fill(out, sizeof *out, payload.subspan(nextRecord));
+    nextRecord += sizeof *out;
+    return ME_SUCCESS;
+}
+
+std::shared_ptr<varnel::detail::Transport> transport() {
+    return varnel::detail::makeTransport({
+        .initialize_meter_structure = &::initialize_meter_structure,
+        .find_meter = &::find_meter,
+        .initialize_meter_type_structure = &::initialize_meter_type_structure,
+        .vb_Chk4Meter = &::vb_Chk4Meter,
+        .vb_Get_Meter_Firmware = &::vb_Get_Meter_Firmware,
+        .vb_Tickle_Meter = &::vb_Tickle_Meter,
+        .close_meter = &::close_meter,
+        .vb_Clear_Meter_Datalog = &::vb_Clear_Meter_Datalog,
+        .vb_Read_Meter_Options = &::vb_Read_Meter_Options,
+        .vb_Read_Meter_Option = &::vb_Read_Meter_Option,
+        .vb_Set_Meter_Option = &::vb_Set_Meter_Option,
+        .vb_Set_Meter_Options = &::vb_Set_Meter_Options,
+        .vb_Read_Meter_Clock = &::vb_Read_Meter_Clock,
+        .vb_Set_Meter_Clock = &::vb_Set_Meter_Clock,
+        .convert_to_seconds = &::convert_to_seconds,
+        .convert_from_seconds = &::convert_from_seconds,
+        .GetInitializedFlag = &::GetInitializedFlag,
+        .SetInitializedFlag = &::SetInitializedFlag,
+        .GetInsulinName = &::GetInsulinName,
+        .SetInsulinName = &::SetInsulinName,
+        .GetOralMedicationName = &::GetOralMedicationName,
+        .SetOralMedicationName = &::SetOralMedicationName,
+        .GetPredefinedInsulins = &::GetPredefinedInsulins,
+        .SetPredefinedInsulins = &::SetPredefinedInsulins,
+        .GetPredefinedOralMeds = &::GetPredefinedOralMeds,
+        .SetPredefinedOralMeds = &::SetPredefinedOralMeds,
+        .GetMealSegments = &::GetMealSegments,
+        .SetMealSegments = &::SetMealSegments,
+        .GetScheduleSelection = &::GetScheduleSelection,
+        .SetScheduleSelection = &::SetScheduleSelection,
+        .GetTargetRange = &::GetTargetRange,
+        .SetTargetRange = &::SetTargetRange,
+        .GetMeterDatalog = &binaryUpload,
+        .GetMeterDatalogRecordData = &record,
+        .vb_Upload_Meter_Datalog = &upload,
+        .vx_set_yield_hook = &::vx_set_yield_hook,
+    });
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+    using namespace varnel;
+    if (size < sizeof header) return 0;
+    std::memcpy(&header, data, sizeof header);
+    payload = {data + sizeof header, size - sizeof header};
+    fuzz::Discovered meter(transport(), 1 + header.type % 8);
+    if (!meter.found) __builtin_trap();
+    XMLWrapper datalog = fuzz::newDoc(doc_kind::datalog), filter = fuzz::newDoc(doc_kind::filter);
+    bool check = true;
+    try {
+        meter.wrapper.getReadings(meter.rec, meter.device, datalog, filter, meter.status, check);
+        (void)datalog.XML();
+    } catch (const ComponentError&) {
+    }
+    return 0;
+}
