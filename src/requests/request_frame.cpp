@@ -49,10 +49,18 @@ void Request::ensureSession() {
 }
 
 bool Request::readPort(XMLWrapper& deviceInfo) {
+    return usePort(portText(deviceInfo), ME_FAIL, " ; Port number from XML file is invalid");
+}
+
+std::string Request::portText(XMLWrapper& deviceInfo) {
     deviceInfo.SelectElement("PortInfo");
-    const double port = ToNumber(deviceInfo.GetChildValue("PortID"));
+    return deviceInfo.GetChildValue("PortID");
+}
+
+bool Request::usePort(const std::string& text, std::int32_t major, const char* context) {
+    const double port = ToNumber(text);
     if (port < 0) {
-        fail(ME_BAD_PARAMETER, " ; Port number from XML file is invalid");
+        report(major, ME_BAD_PARAMETER, ErrorDescription(ME_BAD_PARAMETER) + context);
         return false;
     }
     session.setCOMPort_Pref(roundToInt16(port));
@@ -68,8 +76,7 @@ bool Request::readIdentity(XMLWrapper& deviceInfo) {
     }
     typeText_ = deviceInfo.GetChildValue("TypeID");
     deviceInfo.MoveToRoot();
-    const double type = ToNumber(typeText_);
-    if (!(type > 0 && type <= 8)) {
+    if (!validType(typeText_)) {
         fail(ME_BAD_PARAMETER, " ; Device Type from Device Info XML is invalid");
         return false;
     }
@@ -83,22 +90,33 @@ std::int32_t Request::checkMeter() {
 }
 
 std::int32_t Request::compareIdentity() {
-    const std::string different = ErrorDescription(ME_DIFFERENT_DEVICE);
-    if (lowerCase(session.LastMeterSerialNo()) != lowerCase(serialNumber_)) {
-        report(ME_DIFFERENT_DEVICE, ME_DIFFERENT_DEVICE,
-               different + " ; Device SN from Device Info XML - " + serialNumber_ + " Device SN from device - " +
-                   session.LastMeterSerialNo() + " do not match");
-        return ME_DIFFERENT_DEVICE;
-    }
-    const std::int16_t type = session.storedRecord().M_Type;
-    if (ToNumber(typeText_) != type) {
-        // The document says which check failed; the result stays a plain failure.
-        report(ME_DIFFERENT_DEVICE, ME_DIFFERENT_DEVICE,
-               different + " ; Device Type from Device Info XML - " + typeText_ + " Device Type from device - " +
-                   std::to_string(type) + " do not match");
-        return ME_FAIL;
-    }
+    if (!sameSerial(serialNumber_, "Device Info XML")) return ME_DIFFERENT_DEVICE;
+    // The document says which check failed; the result stays a plain failure.
+    if (!sameType(typeText_, "Device Info XML")) return ME_FAIL;
     return 0;
+}
+
+bool Request::sameSerial(const std::string& claimed, const char* source) {
+    const std::string& meter = session.LastMeterSerialNo();
+    if (lowerCase(meter) == lowerCase(claimed)) return true;
+    report(ME_DIFFERENT_DEVICE, ME_DIFFERENT_DEVICE,
+           ErrorDescription(ME_DIFFERENT_DEVICE) + " ; Device SN from " + source + " - " + claimed +
+               " Device SN from device - " + meter + " do not match");
+    return false;
+}
+
+bool Request::sameType(const std::string& claimed, const char* source) {
+    const std::int16_t type = session.storedRecord().M_Type;
+    if (ToNumber(claimed) == type) return true;
+    report(ME_DIFFERENT_DEVICE, ME_DIFFERENT_DEVICE,
+           ErrorDescription(ME_DIFFERENT_DEVICE) + " ; Device Type from " + source + " - " + claimed +
+               " Device Type from device - " + std::to_string(type) + " do not match");
+    return false;
+}
+
+bool Request::validType(const std::string& text) {
+    const double type = ToNumber(text);
+    return type > 0 && type <= 8;
 }
 
 void Request::fail(std::int32_t code, const std::string& context) {

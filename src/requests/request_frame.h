@@ -65,12 +65,23 @@ public:
     void ensureSession();
     // PortID of the device information into COMPort_Pref; false (reported) for a negative port.
     bool readPort(XMLWrapper& deviceInfo);
+    // The PortID text of the device information, for a request that checks it later.
+    static std::string portText(XMLWrapper& deviceInfo);
+    // The port of portText into COMPort_Pref; false for a negative port, reported
+    // as major with ME_BAD_PARAMETER and context.
+    bool usePort(const std::string& text, std::int32_t major, const char* context);
     // SN and TypeID of the device information, kept for compareIdentity; false (reported) when invalid.
     bool readIdentity(XMLWrapper& deviceInfo);
     // Asks the meter who it is: 0, or its code (reported).
     std::int32_t checkMeter();
     // Compares the identified meter with the document: 0, or the result (reported) for a mismatch.
     std::int32_t compareIdentity();
+    // Compares the identified meter's serial number or type with what a document
+    // named source (e.g. "Device Info XML") claims; false (reported) for a mismatch.
+    bool sameSerial(const std::string& claimed, const char* source);
+    bool sameType(const std::string& claimed, const char* source);
+    // A meter type text the component knows (1-8).
+    static bool validType(const std::string& text);
 
     // Major -17, minor code, desc(code) followed by context.
     void fail(std::int32_t code, const std::string& context = {});
