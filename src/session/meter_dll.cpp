@@ -115,11 +115,14 @@ bool MeterDll::MeterClose(METER_REC& udtMeterRec) {
         udtMeterRec.Error_code = ME_QUIT;
         transport_->vb_Tickle_Meter(udtMeterRec);
         WaitSeconds(1.0f);
-        transport_->close_meter(udtMeterRec);
+        const std::int16_t closed = transport_->close_meter(udtMeterRec);
         WaitSeconds(2.0f);
         Meter_.reset();
         isInitialised_ = false;
-        return true;
+        // A port the library could not release is a failure the caller must hear of; the code
+        // goes to the stored record so that LastError tells it.
+        if (closed != 0) mobjMeterFns->MeterRec.Error_code = closed;
+        return closed == 0;
     });
 }
 

@@ -35,7 +35,8 @@ public:
     std::int16_t initMeter(METER_REC& udtMeterRec);
     // Empties the working record; always true.
     bool initialise();
-    // Releases the meter (on the caller's record, leaving ME_QUIT in its Error_code); always true.
+    // Releases the meter (on the caller's record, leaving ME_QUIT in its Error_code); false when
+    // the library could not release it, its code then in LastError.
     bool MeterClose(METER_REC& udtMeterRec);
     // Erases the meter's memory, relaying its progress; true on success.
     bool clearMeter();
