@@ -72,9 +72,8 @@ public:
     // Path of the simulated transport library shipped with Varnel, as the default constructor loads it.
     static std::string defaultTransportPath();
 
-    struct Impl;
-
 private:
+    struct Impl;
     std::unique_ptr<Impl> impl_;
 };
 

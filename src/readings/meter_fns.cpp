@@ -7,7 +7,7 @@
 #include <utility>
 
 #include "errors/err_propagator.h"
-#include "readings/meter_reads.h"
+#include "contracts/meter_reads.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {
@@ -375,7 +375,7 @@ void convertBinaryRecord(const BinaryRecord& r, const DateTime& date) {
 }  // namespace
 
 clsMeterFns::clsMeterFns(std::shared_ptr<Transport> sessionTransport)
-    : transport(std::move(sessionTransport)),
+    : MeterLink{{}, std::move(sessionTransport)},
       recordDatalog_(std::make_unique<METER_DATALOG>()),
       binaryDatalog_(std::make_unique<METER_BIN_DATALOG>()),
       mobjTimer(frmTimer().tmrStatus()) {

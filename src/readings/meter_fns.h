@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "contracts/meter_link.h"
 #include "contracts/transport.h"
 #include "platform/message_pump.h"
 #include "readings/results.h"
@@ -16,7 +17,8 @@
 
 namespace varnel::detail {
 
-class clsMeterFns {
+// The session record and transport are its MeterLink, which settings groups take.
+class clsMeterFns : public MeterLink {
 public:
     explicit clsMeterFns(std::shared_ptr<Transport> sessionTransport);
     clsMeterFns(const clsMeterFns&) = delete;
@@ -31,12 +33,6 @@ public:
 
     // Raised with a percentage during uploads, conversions and model set-up.
     std::function<void(std::int16_t&)> onProgress;
-
-    // The session's meter record, passed to every transport call made through this object.
-    METER_REC MeterRec{};
-
-    // The session's transport; settings groups initialised with this object use it too.
-    std::shared_ptr<Transport> transport;
 
     // Counts of the last conversion.
     std::int32_t recordCount() const { return recordCount_; }

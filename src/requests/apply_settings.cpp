@@ -137,133 +137,147 @@ void applyDevInit(ApplyContext& ctx) {
         ctx.outcome.bSuccess = true;
 }
 
+// The identity the two documents claim, read before the meter is asked.
+struct Claims {
+    std::string port;
+    std::string infoSerial, infoType;
+    std::string cfgSerial, cfgType;
+};
+
+// Reports a failure that ends the request (as a plain failure, whatever its major code); always false.
+bool stop(Request& req, std::int32_t major, std::int32_t minor, const std::string& context) {
+    req.report(major, minor, ErrorDescription(minor) + context);
+    return false;
+}
+
+// Reads the serial number and type both documents claim; false (reported) when one is missing or invalid.
+bool validate(Request& req, XMLWrapper& deviceInfo, XMLWrapper& deviceCfg, Claims& c) {
+    deviceInfo.SelectElement("DeviceInfo");
+    c.infoSerial = deviceInfo.GetChildValue("SN");
+    if (c.infoSerial.empty())
+        return stop(req, ME_FAIL, ME_BAD_PARAMETER, " ; Device SN from Device Info XML is invalid");
+    c.infoType = deviceInfo.GetChildValue("TypeID");
+    if (!Request::validType(c.infoType))
+        return stop(req, ME_FAIL, ME_BAD_PARAMETER, " ; Device Type from Device Info XML is invalid");
+
+    deviceCfg.MoveToRoot();
+    if (deviceCfg.GetRootName() != "DeviceSettings")
+        return stop(req, ME_FAIL, ME_INVALID_XMLWRAPPOBJ, " ;");
+    if (deviceCfg.CountElements("DeviceInfo") != 1)
+        return stop(req, ME_FAIL, ME_INVALID_XMLWRAPPOBJ, " ;DeviceInfo missing in Device settings");
+    deviceCfg.MoveToChild("DeviceInfo");
+    c.cfgType = deviceCfg.GetChildValue("TypeID");
+    deviceCfg.MoveToRoot();
+    // The settings document's type is refused with the device information's text.
+    if (!Request::validType(c.cfgType))
+        return stop(req, ME_FAIL, ME_BAD_PARAMETER, " ; Device Type from Device Info XML is invalid");
+    deviceCfg.SelectElement("DeviceInfo");
+    c.cfgSerial = deviceCfg.GetChildValue("SN");
+    deviceCfg.MoveToRoot();
+    if (c.cfgSerial.empty())
+        return stop(req, ME_FAIL, ME_BAD_PARAMETER, " ; Device SN from Device settings XML is invalid");
+    return true;
+}
+
+// Attaches to the meter on the claimed port and checks it is the one both
+// documents describe; false (reported) when it is not.
+bool identify(Request& req, METER_REC& udtMeterRec, const Claims& c) {
+    if (!req.usePort(c.port, ME_COM_ERROR, " ; Port number from XML is invalid")) return false;
+    req.session.initMeter(udtMeterRec);
+    if (req.checkMeter() != 0) return false;
+    return req.sameSerial(c.cfgSerial, "Device settings XML") && req.sameType(c.cfgType, "Device settings XML") &&
+           req.sameType(c.infoType, "Device Info XML") && req.sameSerial(c.infoSerial, "Device Info XML");
+}
+
+// Writes the "Settings" items the meter type accepts, in kItems order, and
+// refuses the others into the outcome; false (reported) when the document
+// lacks an element a write needs or the meter has no model.
+bool apply(Request& req, XMLWrapper& deviceCfg, XMLWrapper& status, WriteOutcome& outcome) {
+    const auto invalidXml = [&](const std::string& context) {
+        return stop(req, ME_FAIL, ME_INVALID_XMLWRAPPOBJ, context);
+    };
+    MeterDll& session = req.session;
+    const std::int16_t meterType = session.storedRecord().M_Type;
+    deviceCfg.MoveToRoot();
+    if (deviceCfg.CountElements("Settings") != 1) return invalidXml(" ;Settings missing in Device settings");
+    deviceCfg.MoveToChild("Settings");
+    const std::int32_t children = deviceCfg.GetChildCount();
+    if (children == 0) return invalidXml("");
+
+    bool wanted[std::size(kItems)] = {};
+    int accepted = 0;
+    for (std::int32_t i = 0; i < children; ++i) {
+        const std::string name = deviceCfg.GetChildName(i);
+        const auto item = std::find_if(std::begin(kItems), std::end(kItems), [&](const SettingsItem& it) {
+            return name == it.name || (it.alias && name == it.alias);
+        });
+        if (item != std::end(kItems) && has(item->acceptedFor, meterType)) {
+            wanted[item - std::begin(kItems)] = true;
+            ++accepted;
+        } else if (std::find(std::begin(kReadOnlyItems), std::end(kReadOnlyItems), name) !=
+                   std::end(kReadOnlyItems)) {
+            outcome.refuse(name + " value is read only;");
+        } else {
+            outcome.refuse(name + " is not supported;");
+        }
+    }
+
+    std::shared_ptr<MeterModel> meter = session.Meter();
+    ItemProgress progress(accepted);
+    if (!meter) return stop(req, ME_FAIL, ME_NO_DEVICE, "");
+
+    // One stage of 0-100, whatever an earlier request left.
+    req.owner.resetPercentage();
+    req.owner.PercentLimit(100);
+    ApplyContext ctx{session, *meter, deviceCfg, outcome};
+    for (std::size_t i = 0; i < std::size(kItems); ++i) {
+        if (!wanted[i]) continue;
+        MissingElement missing;
+        bool written = true;
+        switch (kItems[i].write) {
+            case Write::clock: written = false; missing = applyClock(ctx, written); break;
+            case Write::option: writeOption(session, kItems[i].option, deviceCfg, status, outcome); break;
+            case Write::devInit: applyDevInit(ctx); break;
+            case Write::insulins: missing = applyInsulins(ctx); break;
+            case Write::pills: missing = applyOralMeds(ctx); break;
+            case Write::schedule: missing = applySchedule(ctx); break;
+            case Write::targets: missing = applyTargets(ctx); break;
+        }
+        // The writes made so far stay made; the refusals gathered so far are told too.
+        if (missing)
+            return invalidXml(" ;" + *missing + " missing in Device settings" +
+                              (outcome.strError.empty() ? "" : ";" + outcome.strError));
+        if (!written) continue;
+        progress.advance(req.owner);
+    }
+    return true;
+}
+
+// The one summary of the writes: partial success, failure or success.
+void reportOutcome(Request& req, const WriteOutcome& outcome) {
+    if (outcome.bFailure && outcome.bSuccess)
+        req.report(ME_PARTIALSUCCESS, ME_PARTIALSUCCESS, ErrorDescription(ME_PARTIALSUCCESS) + ";" + outcome.strError);
+    else if (outcome.bFailure)
+        req.report(ME_FAIL, ME_FAIL, ErrorDescription(ME_FAIL) + ";" + outcome.strError);
+    else
+        req.report(ME_SUCCESS, ME_SUCCESS, ErrorDescription(ME_SUCCESS));
+}
+
 }  // namespace
 
-std::int32_t setDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
+std::int32_t setDeviceSettings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
                                XMLWrapper& deviceCfg, XMLWrapper& status) {
-    // Traced under the reading request's name, as clients have always seen it.
+    // Traced under the name of the request it shares its handler with.
     Request req(owner, "getDeviceSettings", udtMeterRec, &status);
     return req.run([&]() -> std::int32_t {
-        MeterDll& session = req.session;
-        WriteOutcome outcome;
-        const auto stop = [&](std::int32_t major, std::int32_t minor, const std::string& description) {
-            req.report(major, minor, description);
-            return req.complete(ME_FAIL);
-        };
-        const auto badParameter = [&](const char* context) {
-            return stop(ME_FAIL, ME_BAD_PARAMETER, ErrorDescription(ME_BAD_PARAMETER) + context);
-        };
-        const auto invalidXml = [&](const std::string& context) {
-            return stop(ME_FAIL, ME_INVALID_XMLWRAPPOBJ, ErrorDescription(ME_INVALID_XMLWRAPPOBJ) + context);
-        };
-        const auto different = [&](const std::string& context) {
-            return stop(ME_DIFFERENT_DEVICE, ME_DIFFERENT_DEVICE, ErrorDescription(ME_DIFFERENT_DEVICE) + context);
-        };
-
-        deviceInfo.SelectElement("PortInfo");
-        const std::string portText = deviceInfo.GetChildValue("PortID");
+        Claims claims;
+        claims.port = Request::portText(deviceInfo);
         req.ensureSession();
-        deviceInfo.SelectElement("DeviceInfo");
-        const std::string infoSerial = deviceInfo.GetChildValue("SN");
-        if (infoSerial.empty()) return badParameter(" ; Device SN from Device Info XML is invalid");
-        const std::string infoType = deviceInfo.GetChildValue("TypeID");
-        if (!IsMeterType(ToNumber(infoType))) return badParameter(" ; Device Type from Device Info XML is invalid");
-
-        deviceCfg.MoveToRoot();
-        if (deviceCfg.GetRootName() != "DeviceSettings") return invalidXml(" ;");
-        if (deviceCfg.CountElements("DeviceInfo") != 1) return invalidXml(" ;DeviceInfo missing in Device settings");
-        deviceCfg.MoveToChild("DeviceInfo");
-        const std::string cfgType = deviceCfg.GetChildValue("TypeID");
-        deviceCfg.MoveToRoot();
-        if (!IsMeterType(ToNumber(cfgType))) return badParameter(" ; Device Type from Device Info XML is invalid");
-        deviceCfg.SelectElement("DeviceInfo");
-        const std::string cfgSerial = deviceCfg.GetChildValue("SN");
-        deviceCfg.MoveToRoot();
-        if (cfgSerial.empty()) return badParameter(" ; Device SN from Device settings XML is invalid");
-
-        const double port = ToNumber(portText);
-        if (port < 0)
-            return stop(ME_COM_ERROR, ME_BAD_PARAMETER,
-                        ErrorDescription(ME_BAD_PARAMETER) + " ; Port number from XML is invalid");
-        session.setCOMPort_Pref(roundToInt16(port));
-        session.initMeter(udtMeterRec);
-        if (const std::int32_t c = session.checkmeter(udtMeterRec)) return stop(ME_FAIL, c, ErrorDescription(c));
-
-        const std::string meterSerial = session.LastMeterSerialNo();
-        if (!EqualsNoCase(meterSerial, cfgSerial))
-            return different(" ; Device SN from Device settings XML - " + cfgSerial + " Device SN from device - " +
-                             meterSerial + " do not match");
-        const std::int16_t meterType = session.storedRecord().M_Type;
-        if (ToNumber(cfgType) != meterType)
-            return different(" ; Device Type from Device settings XML - " + cfgType + " Device Type from device - " +
-                             std::to_string(meterType) + " do not match");
-        if (ToNumber(infoType) != meterType)
-            return different(" ; Device Type from Device Info XML - " + infoType + " Device Type from device - " +
-                             std::to_string(meterType) + " do not match");
-        if (!EqualsNoCase(meterSerial, infoSerial))
-            return different(" ; Device SN from Device Info XML - " + infoSerial + " Device SN from device - " +
-                             meterSerial + " do not match");
-
-        deviceCfg.MoveToRoot();
-        if (deviceCfg.CountElements("Settings") != 1) return invalidXml(" ;Settings missing in Device settings");
-        deviceCfg.MoveToChild("Settings");
-        const std::int32_t children = deviceCfg.GetChildCount();
-        if (children == 0) return invalidXml("");
-
-        bool wanted[std::size(kItems)] = {};
-        int accepted = 0;
-        for (std::int32_t i = 0; i < children; ++i) {
-            const std::string name = deviceCfg.GetChildName(i);
-            const auto item = std::find_if(std::begin(kItems), std::end(kItems), [&](const SettingsItem& it) {
-                return name == it.name || (it.alias && name == it.alias);
-            });
-            if (item != std::end(kItems) && has(item->acceptedFor, meterType)) {
-                wanted[item - std::begin(kItems)] = true;
-                ++accepted;
-            } else if (std::find(std::begin(kReadOnlyItems), std::end(kReadOnlyItems), name) !=
-                       std::end(kReadOnlyItems)) {
-                outcome.refuse(name + " value is read only;");
-            } else {
-                outcome.refuse(name + " is not supported;");
-            }
-        }
-
-        std::shared_ptr<MeterModel> meter = session.Meter();
-        ItemProgress progress(accepted);
-        if (!meter) return stop(ME_FAIL, ME_NO_DEVICE, ErrorDescription(ME_NO_DEVICE));
-
-        // One stage of 0-100, whatever an earlier request left.
-        owner.resetPercentage();
-        owner.PercentLimit(100);
-        ApplyContext ctx{session, *meter, deviceCfg, outcome};
-        for (std::size_t i = 0; i < std::size(kItems); ++i) {
-            if (!wanted[i]) continue;
-            MissingElement missing;
-            bool written = true;
-            switch (kItems[i].write) {
-                case Write::clock: written = false; missing = applyClock(ctx, written); break;
-                case Write::option: writeOption(session, kItems[i].option, deviceCfg, status, outcome); break;
-                case Write::devInit: applyDevInit(ctx); break;
-                case Write::insulins: missing = applyInsulins(ctx); break;
-                case Write::pills: missing = applyOralMeds(ctx); break;
-                case Write::schedule: missing = applySchedule(ctx); break;
-                case Write::targets: missing = applyTargets(ctx); break;
-            }
-            // The writes made so far stay made; the refusals gathered so far are told too.
-            if (missing)
-                return invalidXml(" ;" + *missing + " missing in Device settings" +
-                                  (outcome.strError.empty() ? "" : ";" + outcome.strError));
-            if (!written) continue;
-            progress.advance(owner);
-        }
-
-        if (outcome.bFailure && outcome.bSuccess)
-            req.report(ME_PARTIALSUCCESS, ME_PARTIALSUCCESS,
-                       ErrorDescription(ME_PARTIALSUCCESS) + ";" + outcome.strError);
-        else if (outcome.bFailure)
-            req.report(ME_FAIL, ME_FAIL, ErrorDescription(ME_FAIL) + ";" + outcome.strError);
-        else
-            req.report(ME_SUCCESS, ME_SUCCESS, ErrorDescription(ME_SUCCESS));
+        if (!validate(req, deviceInfo, deviceCfg, claims)) return req.complete(ME_FAIL);
+        if (!identify(req, udtMeterRec, claims)) return req.complete(ME_FAIL);
+        WriteOutcome outcome;
+        if (!apply(req, deviceCfg, status, outcome)) return req.complete(ME_FAIL);
+        reportOutcome(req, outcome);
         status.MoveToRoot();
         return req.complete(ME_SUCCESS);
     });

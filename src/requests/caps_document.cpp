@@ -417,7 +417,7 @@ private:
 
 }  // namespace
 
-std::int32_t getDeviceCaps(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
+std::int32_t getDeviceCaps(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
                            XMLWrapper& deviceCaps, bool blnFetchAllInfo, XMLWrapper& status, bool& blnCheckMeter) {
     Request req(owner, "getDeviceCaps", udtMeterRec, &status);
     return req.run([&]() -> std::int32_t {

@@ -98,7 +98,7 @@ IdentityFailure writeDeviceDescription(XMLWrapper& doc, MeterDll& session) {
     return {};
 }
 
-std::int32_t discoverDevice(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
+std::int32_t discoverDevice(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
                             XMLWrapper& connInfo, XMLWrapper& status) {
     Request req(owner, "discoverDevice", udtMeterRec, &status);
     return req.run([&]() -> std::int32_t {

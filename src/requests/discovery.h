@@ -5,7 +5,7 @@
 #include <cstdint>
 #include <string>
 
-#include "component/dll_impl.h"
+#include "requests/request_context.h"
 #include "varnel/records.h"
 #include "varnel/xml_wrapper.h"
 
@@ -43,7 +43,7 @@ IdentityFailure identityFailure(const MeterDll& session);
 IdentityFailure writeDeviceDescription(XMLWrapper& doc, MeterDll& session);
 
 // Looks for a meter on the first port of the connection document and describes it.
-std::int32_t discoverDevice(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
+std::int32_t discoverDevice(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
                             XMLWrapper& connInfo, XMLWrapper& status);
 
 }  // namespace varnel::detail

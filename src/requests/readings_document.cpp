@@ -69,7 +69,7 @@ void writeTransferSummary(XMLWrapper& datalog, MeterDll& session) {
 
 }  // namespace
 
-std::int32_t getReadings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
+std::int32_t getReadings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
                          XMLWrapper& datalog, XMLWrapper&, XMLWrapper& status, bool& blnCheckMeter) {
     Request req(owner, "getReadings", udtMeterRec, &status);
     return req.run([&]() -> std::int32_t {

@@ -3,14 +3,14 @@
 
 #include <cstdint>
 
-#include "component/dll_impl.h"
+#include "requests/request_context.h"
 #include "varnel/records.h"
 #include "varnel/xml_wrapper.h"
 
 namespace varnel::detail {
 
 // Writes the device section, the transfer summary and one entry per reading; the filter is not read.
-std::int32_t getReadings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
+std::int32_t getReadings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
                          XMLWrapper& datalog, XMLWrapper& filter, XMLWrapper& status, bool& blnCheckMeter);
 
 }  // namespace varnel::detail

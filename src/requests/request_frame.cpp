@@ -33,8 +33,8 @@ std::int16_t GetAllGeneralSettings(MeterDll& session, METER_REC& udtMeterRec, XM
     return r;
 }
 
-Request::Request(DllWrapper::Impl& owner, const char* traceName, METER_REC& udtMeterRec, XMLWrapper* status)
-    : owner(owner), session(owner.mobjMeterDll), rec(udtMeterRec), traceName_(traceName), status_(status) {
+Request::Request(RequestContext& owner, const char* traceName, METER_REC& udtMeterRec, XMLWrapper* status)
+    : owner(owner), session(owner.session), rec(udtMeterRec), traceName_(traceName), status_(status) {
     errPropagator().reset();
 }
 
@@ -43,10 +43,18 @@ void Request::ensureSession() {
 }
 
 bool Request::readPort(XMLWrapper& deviceInfo) {
+    return usePort(portText(deviceInfo), ME_FAIL, " ; Port number from XML file is invalid");
+}
+
+std::string Request::portText(XMLWrapper& deviceInfo) {
     deviceInfo.SelectElement("PortInfo");
-    const double port = ToNumber(deviceInfo.GetChildValue("PortID"));
+    return deviceInfo.GetChildValue("PortID");
+}
+
+bool Request::usePort(const std::string& text, std::int32_t major, const char* context) {
+    const double port = ToNumber(text);
     if (port < 0) {
-        fail(ME_BAD_PARAMETER, " ; Port number from XML file is invalid");
+        report(major, ME_BAD_PARAMETER, ErrorDescription(ME_BAD_PARAMETER) + context);
         return false;
     }
     session.setCOMPort_Pref(roundToInt16(port));
@@ -62,7 +70,7 @@ bool Request::readIdentity(XMLWrapper& deviceInfo) {
     }
     typeText_ = deviceInfo.GetChildValue("TypeID");
     deviceInfo.MoveToRoot();
-    if (!IsMeterType(ToNumber(typeText_))) {
+    if (!validType(typeText_)) {
         fail(ME_BAD_PARAMETER, " ; Device Type from Device Info XML is invalid");
         return false;
     }
@@ -76,22 +84,32 @@ std::int32_t Request::checkMeter() {
 }
 
 std::int32_t Request::compareIdentity() {
-    const std::string different = ErrorDescription(ME_DIFFERENT_DEVICE);
-    if (!EqualsNoCase(session.LastMeterSerialNo(), serialNumber_)) {
-        report(ME_DIFFERENT_DEVICE, ME_DIFFERENT_DEVICE,
-               different + " ; Device SN from Device Info XML - " + serialNumber_ + " Device SN from device - " +
-                   session.LastMeterSerialNo() + " do not match");
-        return ME_DIFFERENT_DEVICE;
-    }
-    const std::int16_t type = session.storedRecord().M_Type;
-    if (ToNumber(typeText_) != type) {
-        // The document says which check failed; the result stays a plain failure.
-        report(ME_DIFFERENT_DEVICE, ME_DIFFERENT_DEVICE,
-               different + " ; Device Type from Device Info XML - " + typeText_ + " Device Type from device - " +
-                   std::to_string(type) + " do not match");
-        return ME_FAIL;
-    }
+    if (!sameSerial(serialNumber_, "Device Info XML")) return ME_DIFFERENT_DEVICE;
+    // The document says which check failed; the result stays a plain failure.
+    if (!sameType(typeText_, "Device Info XML")) return ME_FAIL;
     return 0;
+}
+
+bool Request::sameSerial(const std::string& claimed, const char* source) {
+    const std::string& meter = session.LastMeterSerialNo();
+    if (EqualsNoCase(meter, claimed)) return true;
+    report(ME_DIFFERENT_DEVICE, ME_DIFFERENT_DEVICE,
+           ErrorDescription(ME_DIFFERENT_DEVICE) + " ; Device SN from " + source + " - " + claimed +
+               " Device SN from device - " + meter + " do not match");
+    return false;
+}
+
+bool Request::sameType(const std::string& claimed, const char* source) {
+    const std::int16_t type = session.storedRecord().M_Type;
+    if (ToNumber(claimed) == type) return true;
+    report(ME_DIFFERENT_DEVICE, ME_DIFFERENT_DEVICE,
+           ErrorDescription(ME_DIFFERENT_DEVICE) + " ; Device Type from " + source + " - " + claimed +
+               " Device Type from device - " + std::to_string(type) + " do not match");
+    return false;
+}
+
+bool Request::validType(const std::string& text) {
+    return IsMeterType(ToNumber(text));
 }
 
 void Request::fail(std::int32_t code, const std::string& context) {
@@ -142,7 +160,7 @@ void Request::unexpected() {
 ItemProgress::ItemProgress(std::int32_t count)
     : step_(count > 0 ? roundToInt16(100.0 / count) : std::int16_t{0}) {}
 
-void ItemProgress::advance(DllWrapper::Impl& owner) {
+void ItemProgress::advance(RequestContext& owner) {
     percent_ = static_cast<std::int16_t>(std::min(percent_ + step_, 100));
     owner.RaiseProgress(percent_);
 }

@@ -7,7 +7,7 @@
 #include <cstdint>
 #include <string>
 
-#include "component/dll_impl.h"
+#include "requests/request_context.h"
 #include "platform/message_pump.h"
 #include "varnel/records.h"
 #include "varnel/xml_wrapper.h"
@@ -36,7 +36,7 @@ class ItemProgress {
 public:
     explicit ItemProgress(std::int32_t count = 0);
     // Counts one more item done and raises the new percentage.
-    void advance(DllWrapper::Impl& owner);
+    void advance(RequestContext& owner);
 
 private:
     std::int16_t step_;
@@ -47,7 +47,7 @@ private:
 class Request {
 public:
     // status is null only for closeMeter, which reports nothing and closes whatever Error_code says.
-    Request(DllWrapper::Impl& owner, const char* traceName, METER_REC& udtMeterRec, XMLWrapper* status);
+    Request(RequestContext& owner, const char* traceName, METER_REC& udtMeterRec, XMLWrapper* status);
 
     // Runs body (which returns the request's code) under the unexpected-error
     // handler: status -17/-16 with the error and VBTrace, the session closed
@@ -65,12 +65,23 @@ public:
     void ensureSession();
     // PortID of the device information into COMPort_Pref; false (reported) for a negative port.
     bool readPort(XMLWrapper& deviceInfo);
+    // The PortID text of the device information, for a request that checks it later.
+    static std::string portText(XMLWrapper& deviceInfo);
+    // The port of portText into COMPort_Pref; false for a negative port, reported
+    // as major with ME_BAD_PARAMETER and context.
+    bool usePort(const std::string& text, std::int32_t major, const char* context);
     // SN and TypeID of the device information, kept for compareIdentity; false (reported) when invalid.
     bool readIdentity(XMLWrapper& deviceInfo);
     // Asks the meter who it is: 0, or its code (reported).
     std::int32_t checkMeter();
     // Compares the identified meter with the document: 0, or the result (reported) for a mismatch.
     std::int32_t compareIdentity();
+    // Compares the identified meter's serial number or type with what a document
+    // named source (e.g. "Device Info XML") claims; false (reported) for a mismatch.
+    bool sameSerial(const std::string& claimed, const char* source);
+    bool sameType(const std::string& claimed, const char* source);
+    // A meter type text the component knows (1-8).
+    static bool validType(const std::string& text);
 
     // Major -17, minor code, desc(code) followed by context.
     void fail(std::int32_t code, const std::string& context = {});
@@ -80,7 +91,7 @@ public:
     // Raises onComplete and gives result back.
     std::int32_t complete(std::int32_t result);
 
-    DllWrapper::Impl& owner;
+    RequestContext& owner;
     MeterDll& session;
     METER_REC& rec;
 

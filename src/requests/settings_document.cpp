@@ -514,7 +514,7 @@ SettingsRequest::Exit SettingsRequest::settingsMissing() {
 
 }  // namespace
 
-std::int32_t getDeviceSettings(DllWrapper::Impl& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
+std::int32_t getDeviceSettings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
                                XMLWrapper& deviceCfg, bool blnFetchAllInfo, XMLWrapper& status,
                                bool& blnCheckMeter) {
     Request req(owner, "getDeviceSettings", udtMeterRec, &status);

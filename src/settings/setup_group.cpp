@@ -1,12 +1,11 @@
 #include "settings/setup_group.h"
 
 #include "errors/err_propagator.h"
-#include "readings/meter_fns.h"
 
 namespace varnel::detail {
 
-bool ISetupGroup::ISetupGroup_initialise(clsMeterFns& meterFns) {
-    return guarded(className(), "ISetupGroup_initialise", [&] { return initialise(meterFns); });
+bool ISetupGroup::ISetupGroup_initialise(const MeterLink& link) {
+    return guarded(className(), "ISetupGroup_initialise", [&] { return initialise(link); });
 }
 
 bool ISetupGroup::ISetupGroup_readFromMeter() {
@@ -17,10 +16,10 @@ bool ISetupGroup::ISetupGroup_saveToMeter() {
     return guarded(className(), "ISetupGroup_saveToMeter", [&] { return saveToMeter() != 0; });
 }
 
-bool ISetupGroup::initialise(clsMeterFns& meterFns) {
+bool ISetupGroup::initialise(const MeterLink& link) {
     return guarded(className(), "initialise", [&] {
-        rec_ = meterFns.MeterRec;
-        transport_ = meterFns.transport;
+        rec_ = link.MeterRec;
+        transport_ = link.transport;
         clearValues();
         return false;
     });

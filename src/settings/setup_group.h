@@ -5,12 +5,11 @@
 #include <cstdint>
 #include <memory>
 
+#include "contracts/meter_link.h"
 #include "contracts/transport.h"
 #include "varnel/records.h"
 
 namespace varnel::detail {
-
-class clsMeterFns;
 
 // Group numbers under which MeterSettings keeps each group.
 enum enmSettingGroups : std::int32_t {
@@ -30,13 +29,13 @@ public:
 
     // Takes a copy of the session's meter record (not refreshed afterwards) and
     // starts the group's values afresh; always false.
-    bool initialise(clsMeterFns& meterFns);
+    bool initialise(const MeterLink& link);
     // 0, or the record copy's Error_code when the transport failed.
     virtual std::int16_t readFromMeter() = 0;
     virtual std::int16_t saveToMeter() = 0;
 
     // The interface's view of the same operations: false means success.
-    bool ISetupGroup_initialise(clsMeterFns& meterFns);
+    bool ISetupGroup_initialise(const MeterLink& link);
     bool ISetupGroup_readFromMeter();
     bool ISetupGroup_saveToMeter();
 

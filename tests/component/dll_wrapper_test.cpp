@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <utility>
 
-#include "component/dll_impl.h"
+#include "requests/request_context.h"
 #include "support/fake_transport.h"
 #include "support/wrapper_fixture.h"
 
@@ -13,7 +13,7 @@ using namespace varnel::test;
 namespace {
 
 TEST(ProgressStage, StagesHalvesToEvenAndDroppedEvents) {
-    DllWrapper::Impl impl{std::make_shared<FakeTransport>()};
+    detail::RequestContext impl{std::make_shared<FakeTransport>()};
     std::vector<int> raised;
     impl.onProgress = [&](std::int16_t& p) { raised.push_back(p); };
     auto raise = [&](std::initializer_list<std::int16_t> values) {

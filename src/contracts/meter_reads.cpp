@@ -1,4 +1,4 @@
-#include "readings/meter_reads.h"
+#include "contracts/meter_reads.h"
 
 namespace varnel::detail {
 

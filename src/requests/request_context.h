@@ -1,5 +1,5 @@
-// What a DllWrapper holds between requests: the transport, the meter session,
-// the progress stage and the client's event handlers.
+// What a request needs from the DllWrapper it runs in: the meter session, the
+// progress stage that maps the session's percentages, and the client's events.
 #pragma once
 
 #include <cstdint>
@@ -8,14 +8,15 @@
 
 #include "contracts/transport.h"
 #include "session/meter_dll.h"
-#include "varnel/dll_wrapper.h"
 
-namespace varnel {
+namespace varnel::detail {
 
-struct DllWrapper::Impl {
-    explicit Impl(std::shared_ptr<detail::Transport> transport);
-    Impl(const Impl&) = delete;
-    Impl& operator=(const Impl&) = delete;
+class RequestContext {
+public:
+    explicit RequestContext(std::shared_ptr<Transport> transport);
+    // The session reports progress through this object.
+    RequestContext(const RequestContext&) = delete;
+    RequestContext& operator=(const RequestContext&) = delete;
 
     // End of the current progress stage, 0-100.
     std::int16_t PercentLimit() const { return upperLimit_; }
@@ -28,9 +29,7 @@ struct DllWrapper::Impl {
     void RaiseProgress(std::int16_t percent);
     void raiseComplete();
 
-
-    std::shared_ptr<detail::Transport> transport;
-    detail::MeterDll mobjMeterDll;
+    MeterDll session;
     std::function<void(std::int16_t&)> onProgress;
     std::function<void()> onComplete;
 
@@ -39,4 +38,4 @@ private:
     std::int16_t lowerLimit_ = 0;  // -1: the next stage starts at 0
 };
 
-}  // namespace varnel
+}  // namespace varnel::detail

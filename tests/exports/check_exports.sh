@@ -1,0 +1,25 @@
+#!/bin/sh
+# Fails when the shared library exports anything beyond the public API of
+# include/varnel: internal classes, implementation structs, standard-library
+# template instances.
+set -eu
+lib=${1:?usage: check_exports.sh LIBRARY}
+public='Clock|ManualClock|ComponentError|DllWrapper|UniqueChecker|XMLWrapper'
+functions='threadClock|setThreadClock|returnCodeText'
+
+symbols=$(nm -DC --defined-only "$lib" | sed 's/^[0-9a-fA-F]* [A-Za-z] //')
+[ -n "$symbols" ] || { echo "exports: $lib exports nothing"; exit 1; }
+
+outside=$(printf '%s\n' "$symbols" | grep -Ev \
+    -e "^varnel::($public)::[A-Za-z_~]" \
+    -e "^varnel::($functions)(\[abi:cxx11\])?\(" \
+    -e "^(typeinfo|typeinfo name|vtable) for varnel::($public)$" || true)
+# Names (not parameter types) of implementation structs, internals and private members.
+hidden=$(printf '%s\n' "$symbols" | grep -E '^[^(]*(::Impl\b|varnel::detail::|::edit\(|::view\()' || true)
+
+if [ -n "$outside$hidden" ]; then
+    echo "exports: $lib exports names outside the public API:"
+    printf '%s\n' "$outside" "$hidden" | sed '/^$/d' | sort -u
+    exit 1
+fi
+echo "exports: $(printf '%s\n' "$symbols" | wc -l) public names, nothing else"
