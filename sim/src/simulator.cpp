@@ -49,7 +49,11 @@ std::int32_t State::clock() {
         anchorTick_ = now;
         return clockAtAnchor_;
     }
-    return clockAtAnchor_ + elapsed / 1000;
+    // Whole seconds move into the anchor, so the time last read is where another clock takes over.
+    const std::int32_t seconds = elapsed / 1000;
+    clockAtAnchor_ += seconds;
+    anchorTick_ += static_cast<std::uint32_t>(seconds) * 1000u;
+    return clockAtAnchor_;
 }
 
 void State::setClock(std::int32_t seconds) {
