@@ -10,11 +10,22 @@
 #include <vector>
 
 #include "simulator.h"
-#include "varnel/clock.h"
+#include "varnel/vantrix32.h"
 
 namespace varnel::sim {
+// The caller's yield hook, if it set one.
 void yieldToCaller();
-}
+// The calling thread's clock: the caller's hook, else the library's own steady clock.
+std::uint32_t callerTicks();
+void callerSleep(std::uint32_t ms);
+// Which clock that is, to notice when the caller hands over another one.
+struct CallerClock {
+    vx_tick_fn tick = nullptr;
+    void* context = nullptr;
+    bool operator==(const CallerClock&) const = default;
+};
+CallerClock callerClock();
+}  // namespace varnel::sim
 
 namespace varnel::sim::detail {
 
@@ -64,7 +75,7 @@ private:
     MeterProfile meter_;
     // The meter clock runs with the calling thread's clock from an anchor.
     std::int32_t clockAtAnchor_ = 0;
-    const Clock* anchorClock_ = nullptr;
+    CallerClock anchorClock_;
     std::uint32_t anchorTick_ = 0;
     std::vector<Fault> faults_;
     std::map<std::string, int> calls_;
@@ -82,7 +93,7 @@ void State::transfer(METER_REC& rec, std::size_t bytes, std::uint32_t extraMs, P
     rec.Percent_done = 0;
     do {
         const auto step = static_cast<std::uint32_t>(std::min<std::uint64_t>(kChunkMs, total - done));
-        threadClock().sleep(step);
+        callerSleep(step);
         done += step;
         const double fraction = total ? double(done) / double(total) : 1.0;
         progress(fraction);

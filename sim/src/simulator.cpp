@@ -1,6 +1,8 @@
 // The simulator's state and its C++ controls.
 #include <algorithm>
 #include <cstring>
+#include <type_traits>
+#include <vector>
 
 #include "meter_state.h"
 
@@ -8,20 +10,21 @@ namespace varnel::sim {
 namespace detail {
 
 namespace {
-constexpr const char* kFaultable[] = {
-    "initialize_meter_structure", "find_meter", "initialize_meter_type_structure",
-    "vb_Chk4Meter", "vb_Get_Meter_Firmware", "vb_Tickle_Meter", "close_meter",
-    "vb_Clear_Meter_Datalog", "vb_Read_Meter_Options", "vb_Read_Meter_Option",
-    "vb_Set_Meter_Option", "vb_Set_Meter_Options", "vb_Read_Meter_Clock", "vb_Set_Meter_Clock",
-    "convert_from_seconds", "GetInitializedFlag", "SetInitializedFlag", "GetInsulinName",
-    "SetInsulinName", "GetOralMedicationName", "SetOralMedicationName", "GetPredefinedInsulins",
-    "SetPredefinedInsulins", "GetPredefinedOralMeds", "SetPredefinedOralMeds", "GetMealSegments",
-    "SetMealSegments", "GetScheduleSelection", "SetScheduleSelection", "GetTargetRange",
-    "SetTargetRange", "GetMeterDatalog", "GetMeterDatalogRecordData", "vb_Upload_Meter_Datalog",
-};
+// Every transport function that reports a status; convert_to_seconds answers seconds instead.
+std::vector<const char*> statusFunctions() {
+    std::vector<const char*> names;
+#define VARNEL_SIM_STATUS_FUNCTION(ret, name, ...) \
+    if (std::is_same_v<ret, std::int16_t>) names.push_back(#name);
+    VX_METER_FUNCTIONS(VARNEL_SIM_STATUS_FUNCTION)
+#undef VARNEL_SIM_STATUS_FUNCTION
+    return names;
+}
 }  // namespace
 
-std::span<const char* const> faultableFunctions() { return kFaultable; }
+std::span<const char* const> faultableFunctions() {
+    static const std::vector<const char*> names = statusFunctions();
+    return names;
+}
 
 State& state() {
     static State s;
@@ -37,23 +40,26 @@ void State::load(MeterProfile profile) {
 }
 
 std::int32_t State::clock() {
-    Clock& c = threadClock();
-    const std::uint32_t now = c.tickCount();
+    const CallerClock c = callerClock();
+    const std::uint32_t now = callerTicks();
     const auto elapsed = static_cast<std::int32_t>(now - anchorTick_);
     // Another clock (a test's virtual one, another thread's) starts from where the meter stood.
-    if (&c != anchorClock_ || elapsed < 0) {
-        anchorClock_ = &c;
+    if (c != anchorClock_ || elapsed < 0) {
+        anchorClock_ = c;
         anchorTick_ = now;
         return clockAtAnchor_;
     }
-    return clockAtAnchor_ + elapsed / 1000;
+    // Whole seconds move into the anchor, so the time last read is where another clock takes over.
+    const std::int32_t seconds = elapsed / 1000;
+    clockAtAnchor_ += seconds;
+    anchorTick_ += static_cast<std::uint32_t>(seconds) * 1000u;
+    return clockAtAnchor_;
 }
 
 void State::setClock(std::int32_t seconds) {
-    Clock& c = threadClock();
     clockAtAnchor_ = seconds;
-    anchorClock_ = &c;
-    anchorTick_ = c.tickCount();
+    anchorClock_ = callerClock();
+    anchorTick_ = callerTicks();
     meter_.clock = seconds;
 }
 

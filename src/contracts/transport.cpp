@@ -11,138 +11,46 @@
 
 #include "errors/err_propagator.h"
 #include "platform/message_pump.h"
+#include "varnel/clock.h"
 
 namespace varnel::detail {
 
 namespace {
 
-// Every function a transport must have, in the order of TransportFunctions.
-#define VARNEL_REQUIRED_TRANSPORT_FUNCTIONS(X)                                                    \
-    X(initialize_meter_structure) X(find_meter) X(initialize_meter_type_structure)               \
-    X(vb_Chk4Meter) X(vb_Get_Meter_Firmware) X(vb_Tickle_Meter) X(close_meter)                   \
-    X(vb_Clear_Meter_Datalog) X(vb_Read_Meter_Options) X(vb_Read_Meter_Option)                   \
-    X(vb_Set_Meter_Option) X(vb_Set_Meter_Options) X(vb_Read_Meter_Clock) X(vb_Set_Meter_Clock)  \
-    X(convert_to_seconds) X(convert_from_seconds) X(GetInitializedFlag) X(SetInitializedFlag)    \
-    X(GetInsulinName) X(SetInsulinName) X(GetOralMedicationName) X(SetOralMedicationName)        \
-    X(GetPredefinedInsulins) X(SetPredefinedInsulins) X(GetPredefinedOralMeds)                   \
-    X(SetPredefinedOralMeds) X(GetMealSegments) X(SetMealSegments) X(GetScheduleSelection)       \
-    X(SetScheduleSelection) X(GetTargetRange) X(SetTargetRange) X(GetMeterDatalog)               \
-    X(GetMeterDatalogRecordData) X(vb_Upload_Meter_Datalog)
-
 void requireComplete(const TransportFunctions& f) {
-#define VARNEL_REQUIRE(name) \
+#define VARNEL_REQUIRE(ret, name, ...) \
     if (!f.name) raise(errc::transport_unavailable, "The transport has no function \"" #name "\"");
-    VARNEL_REQUIRED_TRANSPORT_FUNCTIONS(VARNEL_REQUIRE)
+    VX_METER_FUNCTIONS(VARNEL_REQUIRE)
 #undef VARNEL_REQUIRE
 }
+
+// The calling thread's clock, lent to a transport library. The context only
+// tells threads apart: each thread's calls go to that thread's clock.
+std::uint32_t tickFromTransport(void*) { return threadClock().tickCount(); }
+void sleepFromTransport(void*, std::uint32_t ms) { threadClock().sleep(ms); }
+thread_local char t_clockOwner;
+
+// An argument as the table's C function takes it: single objects by address.
+#define VARNEL_C_ARG(kind, type, name) , VARNEL_C_ARG_##kind(name)
+#define VARNEL_C_ARG_REC(name) &name
+#define VARNEL_C_ARG_VALUE(name) name
+#define VARNEL_C_ARG_IN(name) &name
+#define VARNEL_C_ARG_OUT(name) &name
+#define VARNEL_C_ARG_INOUT(name) &name
+#define VARNEL_C_ARG_IN_LIST(name) name
+#define VARNEL_C_ARG_OUT_LIST(name) name
 
 // A transport over a table of functions, obtained on first use.
 class TableTransport final : public Transport {
 public:
     explicit TableTransport(std::function<TransportFunctions()> load) : load_(std::move(load)) {}
 
-    std::int16_t initialize_meter_structure(METER_REC& rec) override {
-        return call(&TransportFunctions::initialize_meter_structure, &rec);
+#define VARNEL_FORWARD(ret, name, ...)                                    \
+    ret name(VARNEL_CXX_PARAMS(__VA_ARGS__)) override {                   \
+        return call(&TransportFunctions::name VX_EACH(VARNEL_C_ARG, __VA_ARGS__)); \
     }
-    std::int16_t find_meter(METER_REC& rec, std::int32_t found[11], std::int16_t ports[11]) override {
-        return call(&TransportFunctions::find_meter, &rec, found, ports);
-    }
-    std::int16_t initialize_meter_type_structure(METER_REC& rec, std::int16_t type) override {
-        return call(&TransportFunctions::initialize_meter_type_structure, &rec, type);
-    }
-    std::int16_t vb_Chk4Meter(METER_REC& rec) override { return call(&TransportFunctions::vb_Chk4Meter, &rec); }
-    std::int16_t vb_Get_Meter_Firmware(METER_REC& rec) override {
-        return call(&TransportFunctions::vb_Get_Meter_Firmware, &rec);
-    }
-    std::int16_t vb_Tickle_Meter(METER_REC& rec) override { return call(&TransportFunctions::vb_Tickle_Meter, &rec); }
-    std::int16_t close_meter(METER_REC& rec) override { return call(&TransportFunctions::close_meter, &rec); }
-    std::int16_t vb_Clear_Meter_Datalog(METER_REC& rec) override {
-        return call(&TransportFunctions::vb_Clear_Meter_Datalog, &rec);
-    }
-    std::int16_t vb_Read_Meter_Options(METER_REC& rec) override {
-        return call(&TransportFunctions::vb_Read_Meter_Options, &rec);
-    }
-    std::int16_t vb_Read_Meter_Option(METER_REC& rec, std::int16_t option) override {
-        return call(&TransportFunctions::vb_Read_Meter_Option, &rec, option);
-    }
-    std::int16_t vb_Set_Meter_Option(METER_REC& rec, std::int16_t option, std::int16_t value) override {
-        return call(&TransportFunctions::vb_Set_Meter_Option, &rec, option, value);
-    }
-    std::int16_t vb_Set_Meter_Options(METER_REC& rec, SETTINGS_REC& settings) override {
-        return call(&TransportFunctions::vb_Set_Meter_Options, &rec, &settings);
-    }
-    std::int16_t vb_Read_Meter_Clock(METER_REC& rec, std::int32_t& seconds) override {
-        return call(&TransportFunctions::vb_Read_Meter_Clock, &rec, &seconds);
-    }
-    std::int16_t vb_Set_Meter_Clock(METER_REC& rec, std::int32_t seconds) override {
-        return call(&TransportFunctions::vb_Set_Meter_Clock, &rec, seconds);
-    }
-    std::int32_t convert_to_seconds(TIME_REC& time) override {
-        return call(&TransportFunctions::convert_to_seconds, &time);
-    }
-    std::int16_t convert_from_seconds(std::int32_t seconds, TIME_REC& time) override {
-        return call(&TransportFunctions::convert_from_seconds, seconds, &time);
-    }
-    std::int16_t GetInitializedFlag(METER_REC& rec, std::int16_t& flag) override {
-        return call(&TransportFunctions::GetInitializedFlag, &rec, &flag);
-    }
-    std::int16_t SetInitializedFlag(METER_REC& rec, std::int16_t flag) override {
-        return call(&TransportFunctions::SetInitializedFlag, &rec, flag);
-    }
-    std::int16_t GetInsulinName(METER_REC& rec, INSULIN_OR_ORAL_MED_NAME_TYPE& name) override {
-        return call(&TransportFunctions::GetInsulinName, &rec, &name);
-    }
-    std::int16_t SetInsulinName(METER_REC& rec, INSULIN_OR_ORAL_MED_NAME_TYPE& name) override {
-        return call(&TransportFunctions::SetInsulinName, &rec, &name);
-    }
-    std::int16_t GetOralMedicationName(METER_REC& rec, INSULIN_OR_ORAL_MED_NAME_TYPE& name) override {
-        return call(&TransportFunctions::GetOralMedicationName, &rec, &name);
-    }
-    std::int16_t SetOralMedicationName(METER_REC& rec, INSULIN_OR_ORAL_MED_NAME_TYPE& name) override {
-        return call(&TransportFunctions::SetOralMedicationName, &rec, &name);
-    }
-    std::int16_t GetPredefinedInsulins(METER_REC& rec, PREDEFINED_INSULINS_TYPE& v) override {
-        return call(&TransportFunctions::GetPredefinedInsulins, &rec, &v);
-    }
-    std::int16_t SetPredefinedInsulins(METER_REC& rec, PREDEFINED_INSULINS_TYPE& v) override {
-        return call(&TransportFunctions::SetPredefinedInsulins, &rec, &v);
-    }
-    std::int16_t GetPredefinedOralMeds(METER_REC& rec, PREDEFINED_ORAL_MEDS_TYPE& v) override {
-        return call(&TransportFunctions::GetPredefinedOralMeds, &rec, &v);
-    }
-    std::int16_t SetPredefinedOralMeds(METER_REC& rec, PREDEFINED_ORAL_MEDS_TYPE& v) override {
-        return call(&TransportFunctions::SetPredefinedOralMeds, &rec, &v);
-    }
-    std::int16_t GetMealSegments(METER_REC& rec, MEAL_SEGMENTS_TYPE& v) override {
-        return call(&TransportFunctions::GetMealSegments, &rec, &v);
-    }
-    std::int16_t SetMealSegments(METER_REC& rec, MEAL_SEGMENTS_TYPE& v) override {
-        return call(&TransportFunctions::SetMealSegments, &rec, &v);
-    }
-    std::int16_t GetScheduleSelection(METER_REC& rec, std::int16_t& selection) override {
-        return call(&TransportFunctions::GetScheduleSelection, &rec, &selection);
-    }
-    std::int16_t SetScheduleSelection(METER_REC& rec, std::int16_t selection) override {
-        return call(&TransportFunctions::SetScheduleSelection, &rec, selection);
-    }
-    std::int16_t GetTargetRange(METER_REC& rec, std::int16_t& befLow, std::int16_t& befHigh,
-                                std::int16_t& aftLow, std::int16_t& aftHigh, std::int16_t& hypo) override {
-        return call(&TransportFunctions::GetTargetRange, &rec, &befLow, &befHigh, &aftLow, &aftHigh, &hypo);
-    }
-    std::int16_t SetTargetRange(METER_REC& rec, std::int16_t befLow, std::int16_t befHigh,
-                                std::int16_t aftLow, std::int16_t aftHigh, std::int16_t hypo) override {
-        return call(&TransportFunctions::SetTargetRange, &rec, befLow, befHigh, aftLow, aftHigh, hypo);
-    }
-    std::int16_t GetMeterDatalog(METER_REC& rec, METER_BIN_DATALOG& datalog, std::int32_t startSeconds) override {
-        return call(&TransportFunctions::GetMeterDatalog, &rec, &datalog, startSeconds);
-    }
-    std::int16_t GetMeterDatalogRecordData(METER_BIN_DATALOG& datalog, std::int16_t index,
-                                           RECORD_DATA& record) override {
-        return call(&TransportFunctions::GetMeterDatalogRecordData, &datalog, index, &record);
-    }
-    std::int16_t vb_Upload_Meter_Datalog(METER_REC& rec, METER_DATALOG& datalog) override {
-        return call(&TransportFunctions::vb_Upload_Meter_Datalog, &rec, &datalog);
-    }
+    VX_METER_FUNCTIONS(VARNEL_FORWARD)
+#undef VARNEL_FORWARD
 
 private:
     // Runs one function; an error of a tick handler that ran while it yielded follows its return.
@@ -159,9 +67,10 @@ private:
             requireComplete(table);
             table_ = table;
         }
-        // The library keeps one hook per thread: give it this thread's pump.
-        if (table_->vx_set_yield_hook && hookThread_ != std::this_thread::get_id()) {
-            table_->vx_set_yield_hook(&pumpFromTransport, nullptr);
+        // The library keeps its hooks per thread: give it this thread's pump and clock.
+        if (hookThread_ != std::this_thread::get_id()) {
+            if (table_->vx_set_yield_hook) table_->vx_set_yield_hook(&pumpFromTransport, nullptr);
+            if (table_->vx_set_clock_hook) lendThreadClock(table_->vx_set_clock_hook);
             hookThread_ = std::this_thread::get_id();
         }
         return *table_;
@@ -199,10 +108,12 @@ public:
             raise(errc::transport_unavailable, what + tried);
         }
         TransportFunctions f{};
-#define VARNEL_RESOLVE(name) f.name = reinterpret_cast<decltype(f.name)>(symbol(#name, true));
-        VARNEL_REQUIRED_TRANSPORT_FUNCTIONS(VARNEL_RESOLVE)
+#define VARNEL_RESOLVE(ret, name, ...) f.name = reinterpret_cast<decltype(f.name)>(symbol(#name, true));
+        VX_METER_FUNCTIONS(VARNEL_RESOLVE)
 #undef VARNEL_RESOLVE
-        f.vx_set_yield_hook = reinterpret_cast<decltype(f.vx_set_yield_hook)>(symbol("vx_set_yield_hook", false));
+#define VARNEL_RESOLVE_HOOK(ret, name, ...) f.name = reinterpret_cast<decltype(f.name)>(symbol(#name, false));
+        VX_HOOK_FUNCTIONS(VARNEL_RESOLVE_HOOK)
+#undef VARNEL_RESOLVE_HOOK
         return f;
     }
 
@@ -234,8 +145,6 @@ private:
     void* handle_ = nullptr;
 };
 
-#undef VARNEL_REQUIRED_TRANSPORT_FUNCTIONS
-
 }  // namespace
 
 std::shared_ptr<Transport> loadTransport(const std::string& path) {
@@ -249,6 +158,10 @@ std::shared_ptr<Transport> loadTransport(std::vector<std::string> candidates) {
 
 std::shared_ptr<Transport> makeTransport(const TransportFunctions& functions) {
     return std::make_shared<TableTransport>([functions] { return functions; });
+}
+
+void lendThreadClock(decltype(&::vx_set_clock_hook) setClockHook) {
+    setClockHook(&tickFromTransport, &sleepFromTransport, &t_clockOwner);
 }
 
 }  // namespace varnel::detail

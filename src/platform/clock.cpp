@@ -1,6 +1,5 @@
-// The real clock and the per-thread clock slot. This unit lives only in the
-// shared library, so that the component and a transport library loaded beside
-// it always see the same clock.
+// The real clock and the per-thread clock slot. A transport library gets this
+// clock through its clock hook, never by linking the component.
 #include "varnel/clock.h"
 
 #include <chrono>

@@ -1,6 +1,6 @@
 # Transport libraries the loading tests open by path: a complete one, one
-# lacking a required function and one lacking the optional yield hook.
-foreach(variant IN ITEMS full no_chk4meter no_yield_hook)
+# lacking a required function and one without the optional hooks.
+foreach(variant IN ITEMS full no_chk4meter no_hooks)
   set(recording_lib recording_transport_${variant})
   string(TOUPPER ${variant} recording_variant)
   add_library(${recording_lib} SHARED ${dir}/recording_transport.c)

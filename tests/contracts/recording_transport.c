@@ -1,81 +1,92 @@
-/* A transport library for the loading tests: every function records its name and
- * by-value numbers and returns its own code; the getters also fill their outputs. */
+/* A transport library for the loading tests, generated from the function list:
+ * every function records its name and each argument (numbers by value, objects
+ * and lists by address), fills what it is given to fill with 0x5A bytes and
+ * returns its own code: -101 for the first function of the list, -102 for the
+ * next, and so on. */
 #include <string.h>
 
 #include "varnel/vantrix32.h"
 
-/* Most functions read none of their arguments. */
-#pragma GCC diagnostic ignored "-Wunused-parameter"
-
 #define EXPORT __attribute__((visibility("default")))
+
+/* A library lacking a required function exports it under another name. */
+#ifdef RECORDING_TRANSPORT_NO_CHK4METER_VARIANT
+#define vb_Chk4Meter withheld_vb_Chk4Meter
+#endif
 
 /* What the last call recorded, for the tests to read. */
 EXPORT const char* last_name = "";
-EXPORT int32_t last_values[5];
-static void (*yield_hook)(void*) = 0;
-static void* yield_context = 0;
+EXPORT intptr_t last_args[6];
+EXPORT int last_count;
 
-static int16_t record(const char* name, int16_t code, const int32_t values[5]) {
+static vx_yield_fn yield_hook = 0;
+static void* yield_context = 0;
+static vx_tick_fn tick_hook = 0;
+static vx_sleep_fn sleep_hook = 0;
+static void* clock_context = 0;
+
+static const char* const names[] = {
+#define NAME(ret, name, ...) #name,
+    VX_METER_FUNCTIONS(NAME)
+#undef NAME
+};
+
+static void start(void) {
+    memset(last_args, 0, sizeof last_args);
+    last_count = 0;
+}
+
+static void keep(intptr_t arg) { last_args[last_count++] = arg; }
+
+static int16_t finish(const char* name) {
+    int16_t code = -101;
+    while (strcmp(names[-101 - code], name) != 0) --code;
     last_name = name;
-    memcpy(last_values, values, sizeof last_values);
     return code;
 }
 
-/* A function of the library: does `effect`, records up to five numbers and returns `code`. */
-#define FN(code, fn, params, effect, ...) \
-    int16_t fn params { effect; return record(#fn, code, (const int32_t[5]){__VA_ARGS__}); }
-
-FN(-101, initialize_meter_structure, (METER_REC* rec), , 0)
-FN(-102, find_meter, (METER_REC* rec, int32_t found[11], int16_t ports[11]), , ports[0], ports[1])
-FN(-103, initialize_meter_type_structure, (METER_REC* rec, int16_t type), , type)
-#ifndef RECORDING_TRANSPORT_NO_CHK4METER_VARIANT
-FN(-104, vb_Chk4Meter, (METER_REC* rec), , 0)
-#endif
-FN(-105, vb_Get_Meter_Firmware, (METER_REC* rec), , 0)
-FN(-106, vb_Tickle_Meter, (METER_REC* rec), , 0)
-FN(-107, close_meter, (METER_REC* rec), , 0)
 /* The long operation: lets the caller's messages run twice on the way. */
-int16_t vb_Clear_Meter_Datalog(METER_REC* rec) {
+static void long_operation(METER_REC* rec) {
     rec->Percent_done = 50;
     if (yield_hook) yield_hook(yield_context);
     rec->Percent_done = 100;
     if (yield_hook) yield_hook(yield_context);
-    return record("vb_Clear_Meter_Datalog", -108, (const int32_t[5]){0});
 }
-FN(-109, vb_Read_Meter_Options, (METER_REC* rec), , 0)
-FN(-110, vb_Read_Meter_Option, (METER_REC* rec, int16_t option), , option)
-FN(-111, vb_Set_Meter_Option, (METER_REC* rec, int16_t option, int16_t value), , option, value)
-FN(-112, vb_Set_Meter_Options, (METER_REC* rec, SETTINGS_REC* settings), , 0)
-FN(-113, vb_Read_Meter_Clock, (METER_REC* rec, int32_t* seconds), *seconds = 123456789, 0)
-FN(-114, vb_Set_Meter_Clock, (METER_REC* rec, int32_t seconds), , seconds)
-int32_t convert_to_seconds(TIME_REC* time) {
-    return record("convert_to_seconds", -115, (const int32_t[5]){time->sec, time->min});
-}
-FN(-116, convert_from_seconds, (int32_t seconds, TIME_REC* time), time->sec = (int16_t)(seconds % 60), seconds)
-FN(-117, GetInitializedFlag, (METER_REC* rec, int16_t* flag), *flag = 1, 0)
-FN(-118, SetInitializedFlag, (METER_REC* rec, int16_t flag), , flag)
-FN(-119, GetInsulinName, (METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name), memcpy(name->nameStr, "Rapid", 6), 0)
-FN(-120, SetInsulinName, (METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name), , name->index)
-FN(-121, GetOralMedicationName, (METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name), , 0)
-FN(-122, SetOralMedicationName, (METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name), , name->index)
-FN(-123, GetPredefinedInsulins, (METER_REC* rec, PREDEFINED_INSULINS_TYPE* v), , 0)
-FN(-124, SetPredefinedInsulins, (METER_REC* rec, PREDEFINED_INSULINS_TYPE* v), , 0)
-FN(-125, GetPredefinedOralMeds, (METER_REC* rec, PREDEFINED_ORAL_MEDS_TYPE* v), , 0)
-FN(-126, SetPredefinedOralMeds, (METER_REC* rec, PREDEFINED_ORAL_MEDS_TYPE* v), , 0)
-FN(-127, GetMealSegments, (METER_REC* rec, MEAL_SEGMENTS_TYPE* v), , 0)
-FN(-128, SetMealSegments, (METER_REC* rec, MEAL_SEGMENTS_TYPE* v), , 0)
-FN(-129, GetScheduleSelection, (METER_REC* rec, int16_t* selection), *selection = 2, 0)
-FN(-130, SetScheduleSelection, (METER_REC* rec, int16_t selection), , selection)
-FN(-131, GetTargetRange, (METER_REC* rec, int16_t* bl, int16_t* bh, int16_t* al, int16_t* ah, int16_t* hypo),
-   (*bl = 1, *bh = 2, *al = 3, *ah = 4, *hypo = 5), 0)
-FN(-132, SetTargetRange, (METER_REC* rec, int16_t bl, int16_t bh, int16_t al, int16_t ah, int16_t hypo),
-   , bl, bh, al, ah, hypo)
-FN(-133, GetMeterDatalog, (METER_REC* rec, METER_BIN_DATALOG* datalog, int32_t start), , start)
-FN(-134, GetMeterDatalogRecordData, (METER_BIN_DATALOG* datalog, int16_t index, RECORD_DATA* data), , index)
-FN(-135, vb_Upload_Meter_Datalog, (METER_REC* rec, METER_DATALOG* datalog), , 0)
-#ifndef RECORDING_TRANSPORT_NO_YIELD_HOOK_VARIANT
-void vx_set_yield_hook(void (*hook)(void* context), void* context) {
+
+#define RECORD(kind, type, name) RECORD_##kind(type, name);
+#define RECORD_REC(type, name) keep((intptr_t)name), rec_seen = name
+#define RECORD_VALUE(type, name) keep((intptr_t)name)
+#define RECORD_IN(type, name) keep((intptr_t)name)
+#define RECORD_INOUT(type, name) keep((intptr_t)name)
+#define RECORD_OUT(type, name) keep((intptr_t)name), memset(name, 0x5A, sizeof *name)
+#define RECORD_IN_LIST(type, name) keep((intptr_t)name)
+#define RECORD_OUT_LIST(type, name) keep((intptr_t)name), memset(name, 0x5A, VX_LIST_LENGTH * sizeof *name)
+
+#define DEFINE(ret, name, ...)                                                \
+    EXPORT ret name(VX_C_PARAMS(__VA_ARGS__)) {                               \
+        METER_REC* rec_seen = 0;                                              \
+        start();                                                              \
+        VX_EACH(RECORD, __VA_ARGS__)                                          \
+        if (rec_seen && strcmp(#name, "vb_Clear_Meter_Datalog") == 0) long_operation(rec_seen); \
+        return finish(#name);                                                 \
+    }
+VX_METER_FUNCTIONS(DEFINE)
+
+#ifndef RECORDING_TRANSPORT_NO_HOOKS_VARIANT
+EXPORT void vx_set_yield_hook(vx_yield_fn hook, void* context) {
     yield_hook = hook;
     yield_context = context;
 }
+
+EXPORT void vx_set_clock_hook(vx_tick_fn tick_count, vx_sleep_fn sleep, void* context) {
+    tick_hook = tick_count;
+    sleep_hook = sleep;
+    clock_context = context;
+}
 #endif
+
+/* The caller's time as the library sees it (0 without a clock hook), and a wait on it. */
+EXPORT uint32_t library_now(void) { return tick_hook ? tick_hook(clock_context) : 0; }
+EXPORT void library_sleep(uint32_t ms) {
+    if (sleep_hook) sleep_hook(clock_context, ms);
+}

@@ -8,6 +8,8 @@
 #include <array>
 #include <filesystem>
 #include <functional>
+#include <map>
+#include <memory>
 #include <initializer_list>
 #include <stdexcept>
 #include <string>
@@ -30,9 +32,67 @@ namespace {
 struct Recorder {
     void* handle = dlopen(RECORDING_TRANSPORT_FULL, RTLD_NOW);
     ~Recorder() { dlclose(handle); }
-    const char* const& name = *static_cast<const char**>(dlsym(handle, "last_name"));
-    const std::int32_t* values = static_cast<const std::int32_t*>(dlsym(handle, "last_values"));
+    template <class T>
+    T& get(const char* name) { return *static_cast<T*>(dlsym(handle, name)); }
+    const char* const& name = get<const char*>("last_name");
+    const std::intptr_t* args = &get<std::intptr_t>("last_args");
+    const int& count = get<int>("last_count");
 };
+
+// The arguments of one call, made fresh per parameter: what the library must
+// see of each (its number, or the caller's own object) and which objects it fills.
+struct Arguments {
+    METER_REC rec{};
+    std::map<std::string, std::intptr_t> expected;
+    std::vector<std::pair<const void*, std::size_t>> filled;
+    std::vector<std::shared_ptr<void>> objects;
+    std::int32_t next = 1000;
+
+    METER_REC& record(const char* name) {
+        expected[name] = reinterpret_cast<std::intptr_t>(&rec);
+        return rec;
+    }
+    template <class T>
+    T value(const char* name) {
+        expected[name] = next;
+        return static_cast<T>(next++);
+    }
+    template <class T>
+    T* objects_of(const char* name, std::size_t count, bool fills) {
+        auto block = std::shared_ptr<T[]>(new T[count]{});
+        objects.push_back(block);
+        expected[name] = reinterpret_cast<std::intptr_t>(block.get());
+        if (fills) filled.emplace_back(block.get(), count * sizeof(T));
+        return block.get();
+    }
+};
+
+#define VARNEL_TEST_ARG(kind, type, name) , VARNEL_TEST_ARG_##kind(type, #name)
+#define VARNEL_TEST_ARG_REC(type, name) a.record(name)
+#define VARNEL_TEST_ARG_VALUE(type, name) a.value<type>(name)
+#define VARNEL_TEST_ARG_IN(type, name) *a.objects_of<type>(name, 1, false)
+#define VARNEL_TEST_ARG_INOUT(type, name) *a.objects_of<type>(name, 1, false)
+#define VARNEL_TEST_ARG_OUT(type, name) *a.objects_of<type>(name, 1, true)
+#define VARNEL_TEST_ARG_IN_LIST(type, name) a.objects_of<type>(name, VX_LIST_LENGTH, false)
+#define VARNEL_TEST_ARG_OUT_LIST(type, name) a.objects_of<type>(name, VX_LIST_LENGTH, true)
+#define VARNEL_TEST_PARAM_NAME(kind, type, name) , #name
+
+// Each meter function: its name, its parameters in order and a call through a transport.
+struct Case {
+    const char* name;
+    std::vector<std::string> params;
+    std::function<std::int32_t(Transport&, Arguments&)> call;
+};
+const std::vector<Case>& everyFunction() {
+#define VARNEL_TEST_CASE(ret, fn, ...)                                                         \
+    {#fn, {VX_COMMA_LIST(VX_EACH(VARNEL_TEST_PARAM_NAME, __VA_ARGS__))},                        \
+     [](Transport& t, Arguments& a) -> std::int32_t {                                          \
+         return t.fn(VX_COMMA_LIST(VX_EACH(VARNEL_TEST_ARG, __VA_ARGS__)));                    \
+     }},
+    static const std::vector<Case> cases = {VX_METER_FUNCTIONS(VARNEL_TEST_CASE)};
+#undef VARNEL_TEST_CASE
+    return cases;
+}
 
 // Expects `call` to raise transport_unavailable with a description naming each of `mentions`.
 void expectUnavailable(const std::function<void()>& call, std::initializer_list<std::string> mentions) {
@@ -48,79 +108,24 @@ void expectUnavailable(const std::function<void()>& call, std::initializer_list<
 TEST(TransportLoading, EveryFunctionIsReachedByNameWithItsArguments) {
     auto t = loadTransport(RECORDING_TRANSPORT_FULL);
     Recorder recorder;
-    METER_REC rec{};
-    SETTINGS_REC settings{};
-    TIME_REC time{};
-    INSULIN_OR_ORAL_MED_NAME_TYPE name{};
-    PREDEFINED_INSULINS_TYPE insulins{};
-    PREDEFINED_ORAL_MEDS_TYPE meds{};
-    MEAL_SEGMENTS_TYPE segments{};
-    METER_BIN_DATALOG bin{};
-    RECORD_DATA data{};
-    static METER_DATALOG datalog{};
-    std::int32_t found[11]{}, seconds = 0;
-    std::int16_t ports[11]{3, 4}, flag = 0, selection = 0;
-    std::array<std::int16_t, 5> range{};
-    time.sec = 7, time.min = 8, name.index = 6;  // for the library to read
-
-    // In the library's order, so the codes run from -101 down.
-    struct Case {
-        const char* name;
-        std::function<std::int32_t()> call;
-        std::array<std::int32_t, 5> args;
-    };
-    const Case cases[] = {
-        {"initialize_meter_structure", [&] { return t->initialize_meter_structure(rec); }, {}},
-        {"find_meter", [&] { return t->find_meter(rec, found, ports); }, {3, 4}},
-        {"initialize_meter_type_structure", [&] { return t->initialize_meter_type_structure(rec, 7); }, {7}},
-        {"vb_Chk4Meter", [&] { return t->vb_Chk4Meter(rec); }, {}},
-        {"vb_Get_Meter_Firmware", [&] { return t->vb_Get_Meter_Firmware(rec); }, {}},
-        {"vb_Tickle_Meter", [&] { return t->vb_Tickle_Meter(rec); }, {}},
-        {"close_meter", [&] { return t->close_meter(rec); }, {}},
-        {"vb_Clear_Meter_Datalog", [&] { return t->vb_Clear_Meter_Datalog(rec); }, {}},
-        {"vb_Read_Meter_Options", [&] { return t->vb_Read_Meter_Options(rec); }, {}},
-        {"vb_Read_Meter_Option", [&] { return t->vb_Read_Meter_Option(rec, 4); }, {4}},
-        {"vb_Set_Meter_Option", [&] { return t->vb_Set_Meter_Option(rec, 4, 9); }, {4, 9}},
-        {"vb_Set_Meter_Options", [&] { return t->vb_Set_Meter_Options(rec, settings); }, {}},
-        {"vb_Read_Meter_Clock", [&] { return t->vb_Read_Meter_Clock(rec, seconds); }, {}},
-        {"vb_Set_Meter_Clock", [&] { return t->vb_Set_Meter_Clock(rec, 86400); }, {86400}},
-        {"convert_to_seconds", [&] { return t->convert_to_seconds(time); }, {7, 8}},
-        {"convert_from_seconds", [&] { return t->convert_from_seconds(125, time); }, {125}},
-        {"GetInitializedFlag", [&] { return t->GetInitializedFlag(rec, flag); }, {}},
-        {"SetInitializedFlag", [&] { return t->SetInitializedFlag(rec, 5); }, {5}},
-        {"GetInsulinName", [&] { return t->GetInsulinName(rec, name); }, {}},
-        {"SetInsulinName", [&] { return t->SetInsulinName(rec, name); }, {6}},
-        {"GetOralMedicationName", [&] { return t->GetOralMedicationName(rec, name); }, {}},
-        {"SetOralMedicationName", [&] { return t->SetOralMedicationName(rec, name); }, {6}},
-        {"GetPredefinedInsulins", [&] { return t->GetPredefinedInsulins(rec, insulins); }, {}},
-        {"SetPredefinedInsulins", [&] { return t->SetPredefinedInsulins(rec, insulins); }, {}},
-        {"GetPredefinedOralMeds", [&] { return t->GetPredefinedOralMeds(rec, meds); }, {}},
-        {"SetPredefinedOralMeds", [&] { return t->SetPredefinedOralMeds(rec, meds); }, {}},
-        {"GetMealSegments", [&] { return t->GetMealSegments(rec, segments); }, {}},
-        {"SetMealSegments", [&] { return t->SetMealSegments(rec, segments); }, {}},
-        {"GetScheduleSelection", [&] { return t->GetScheduleSelection(rec, selection); }, {}},
-        {"SetScheduleSelection", [&] { return t->SetScheduleSelection(rec, 3); }, {3}},
-        {"GetTargetRange",
-         [&] { return t->GetTargetRange(rec, range[0], range[1], range[2], range[3], range[4]); }, {}},
-        {"SetTargetRange", [&] { return t->SetTargetRange(rec, 70, 140, 80, 180, 60); }, {70, 140, 80, 180, 60}},
-        {"GetMeterDatalog", [&] { return t->GetMeterDatalog(rec, bin, 5000); }, {5000}},
-        {"GetMeterDatalogRecordData", [&] { return t->GetMeterDatalogRecordData(bin, 12, data); }, {12}},
-        {"vb_Upload_Meter_Datalog", [&] { return t->vb_Upload_Meter_Datalog(rec, datalog); }, {}},
-    };
+    // In the list's order, so the codes run from -101 down.
     std::int32_t code = -101;
-    for (const Case& c : cases) {
+    ASSERT_EQ(everyFunction().size(), 35u);
+    for (const Case& c : everyFunction()) {
         SCOPED_TRACE(c.name);
-        EXPECT_EQ(c.call(), code--);
+        Arguments a;
+        EXPECT_EQ(c.call(*t, a), code--);
         EXPECT_STREQ(recorder.name, c.name);
-        for (int i = 0; i < 5; ++i) EXPECT_EQ(recorder.values[i], c.args[i]) << "argument " << i;
+        // Every argument arrives in its place: numbers as given, objects as the caller's own.
+        ASSERT_EQ(recorder.count, int(c.params.size()));
+        for (std::size_t i = 0; i < c.params.size(); ++i)
+            EXPECT_EQ(recorder.args[i], a.expected.at(c.params[i])) << c.params[i];
+        // What the library fills comes back to the caller.
+        for (const auto& [object, size] : a.filled) {
+            const auto* bytes = static_cast<const unsigned char*>(object);
+            EXPECT_EQ(std::count(bytes, bytes + size, 0x5A), std::ptrdiff_t(size));
+        }
     }
-    // Results come back through the references.
-    EXPECT_EQ(seconds, 123456789);
-    EXPECT_EQ(time.sec, 5);
-    EXPECT_EQ(flag, 1);
-    EXPECT_EQ(selection, 2);
-    EXPECT_EQ(range, (std::array<std::int16_t, 5>{1, 2, 3, 4, 5}));
-    EXPECT_STREQ(reinterpret_cast<const char*>(name.nameStr), "Rapid");
 }
 
 TEST(TransportLoading, WhatIsMissingIsNamedOnFirstUse) {
@@ -134,7 +139,7 @@ TEST(TransportLoading, WhatIsMissingIsNamedOnFirstUse) {
     TransportFunctions table{};
     table.initialize_meter_structure = [](METER_REC*) -> std::int16_t { return 0; };
     expectUnavailable([&] { makeTransport(table)->initialize_meter_structure(rec); }, {"\"find_meter\""});
-    auto hookless = loadTransport(RECORDING_TRANSPORT_NO_YIELD_HOOK);  // the hook is optional
+    auto hookless = loadTransport(RECORDING_TRANSPORT_NO_HOOKS);  // the hooks are optional
     EXPECT_EQ(hookless->vb_Clear_Meter_Datalog(rec), -108);
 }
 
@@ -186,6 +191,22 @@ TEST_F(TransportYield, DueTicksRunWhileTheLibraryYieldsAndTheirErrorsFollowTheCa
     failing.disconnect();
     clock->advance(500);
     EXPECT_EQ(t->vb_Clear_Meter_Datalog(rec), -108);  // the error was reported once
+}
+
+// A library that exports a clock hook runs on the caller's thread clock once it is first used.
+TEST_F(TransportYield, ALoadedLibraryTakesTheCallersClock) {
+    auto t = loadTransport(RECORDING_TRANSPORT_FULL);
+    Recorder recorder;
+    auto now = reinterpret_cast<std::uint32_t (*)()>(dlsym(recorder.handle, "library_now"));
+    auto sleep = reinterpret_cast<void (*)(std::uint32_t)>(dlsym(recorder.handle, "library_sleep"));
+    clock->advance(4321);
+    t->vb_Tickle_Meter(rec);
+    EXPECT_EQ(now(), 4321u);
+    sleep(250);  // the library's wait is the caller's clock moving
+    EXPECT_EQ(clock->tickCount(), 4571u);
+    auto later = std::make_shared<ManualClock>(90000);
+    setThreadClock(later);  // a clock set later is followed too
+    EXPECT_EQ(now(), 90000u);
 }
 
 TEST_F(TransportYield, TheSimulatorsLongOperationsDriveTheTimerThroughTheHook) {

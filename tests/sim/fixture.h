@@ -8,6 +8,7 @@
 #include <memory>
 #include <string>
 
+#include "contracts/transport.h"
 #include "simulator.h"
 #include "varnel/clock.h"
 #include "varnel/vantrix32.h"
@@ -29,11 +30,13 @@ struct SimTest : ::testing::Test {
 
     void SetUp() override {
         varnel::setThreadClock(clock);
+        varnel::detail::lendThreadClock(&vx_set_clock_hook);
         varnel::sim::reset();
     }
     void TearDown() override {
         vx_set_yield_hook(nullptr, nullptr);
         varnel::sim::reset();
+        vx_set_clock_hook(nullptr, nullptr, nullptr);
         varnel::setThreadClock(nullptr);
     }
     // Selects the default meter of a type and finds it on port 1.

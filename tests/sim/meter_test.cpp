@@ -126,6 +126,36 @@ TEST_F(MeterSettings, ClockIsSetAndRuns) {
     EXPECT_EQ(read, t + 5);
 }
 
+// The clock hook is the library's only time source: another clock handed over
+// continues the meter clock from the time last read, and half a hook is no clock at all.
+TEST_F(MeterSettings, TheMeterClockFollowsWhicheverClockTheCallerHandsOver) {
+    connect(7);
+    const std::int32_t t = secondsOf(2010, 7, 4, 12, 0, 0);
+    ASSERT_EQ(vb_Set_Meter_Clock(&rec, t), ME_SUCCESS);
+    const auto read = [&] {
+        std::int32_t seconds = 0;
+        EXPECT_EQ(vb_Read_Meter_Clock(&rec, &seconds), ME_SUCCESS);
+        return seconds - t;
+    };
+    clock->advance(2000);
+    EXPECT_EQ(read(), 2);
+    std::uint32_t other = 7'000'000;  // far ahead of the test's clock
+    const vx_tick_fn tick = [](void* c) { return *static_cast<std::uint32_t*>(c); };
+    const vx_sleep_fn sleep = [](void* c, std::uint32_t ms) { *static_cast<std::uint32_t*>(c) += ms; };
+    vx_set_clock_hook(tick, sleep, &other);
+    EXPECT_EQ(read(), 2);
+    other += 3000;
+    clock->advance(60000);  // no longer the library's clock
+    EXPECT_EQ(read(), 5);
+    const std::uint32_t before = other;
+    EXPECT_EQ(vb_Clear_Meter_Datalog(&rec), ME_SUCCESS);  // waits on the hook's clock
+    EXPECT_GE(other - before, 1500u);
+    const std::int32_t held = read();
+    vx_set_clock_hook(tick, nullptr, &other);  // refused: the library's own clock again
+    other += 9000;
+    EXPECT_EQ(read(), held);
+}
+
 TEST_F(MeterSettings, Type7TablesReadBackAndNamesAreHeldAsBytes) {
     connect(7);
     const std::string full("Basal\xE9" "1234", 10);  // fills the field: no zero byte

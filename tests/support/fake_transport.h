@@ -60,64 +60,41 @@ public:
     }
     void clearLog() { calls_.clear(); }
 
-    using I16 = std::int16_t;
-    I16 initialize_meter_structure(METER_REC& r) override { return run(__func__, &r, {}); }
-    I16 find_meter(METER_REC& r, std::int32_t found[11], I16 ports[11]) override {
-        return run(__func__, &r, {}, *found, *ports);
-    }
-    I16 initialize_meter_type_structure(METER_REC& r, I16 type) override { return run(__func__, &r, {type}); }
-    I16 vb_Chk4Meter(METER_REC& r) override { return run(__func__, &r, {}); }
-    I16 vb_Get_Meter_Firmware(METER_REC& r) override { return run(__func__, &r, {}); }
-    I16 vb_Tickle_Meter(METER_REC& r) override { return run(__func__, &r, {}); }
-    I16 close_meter(METER_REC& r) override { return run(__func__, &r, {}); }
-    I16 vb_Clear_Meter_Datalog(METER_REC& r) override { return run(__func__, &r, {}); }
-    I16 vb_Read_Meter_Options(METER_REC& r) override { return run(__func__, &r, {}); }
-    I16 vb_Read_Meter_Option(METER_REC& r, I16 option) override { return run(__func__, &r, {option}); }
-    I16 vb_Set_Meter_Option(METER_REC& r, I16 option, I16 v) override { return run(__func__, &r, {option, v}); }
-    I16 vb_Set_Meter_Options(METER_REC& r, SETTINGS_REC& s) override { return run(__func__, &r, {}, s); }
-    I16 vb_Read_Meter_Clock(METER_REC& r, std::int32_t& seconds) override { return run(__func__, &r, {}, seconds); }
-    I16 vb_Set_Meter_Clock(METER_REC& r, std::int32_t seconds) override { return run(__func__, &r, {seconds}); }
-    std::int32_t convert_to_seconds(TIME_REC& t) override { return run<std::int32_t>(__func__, nullptr, {}, t); }
-    I16 convert_from_seconds(std::int32_t s, TIME_REC& t) override { return run(__func__, nullptr, {s}, t); }
-    I16 GetInitializedFlag(METER_REC& r, I16& flag) override { return run(__func__, &r, {}, flag); }
-    I16 SetInitializedFlag(METER_REC& r, I16 flag) override { return run(__func__, &r, {flag}); }
-    I16 GetInsulinName(METER_REC& r, INSULIN_OR_ORAL_MED_NAME_TYPE& n) override { return run(__func__, &r, {}, n); }
-    I16 SetInsulinName(METER_REC& r, INSULIN_OR_ORAL_MED_NAME_TYPE& n) override { return run(__func__, &r, {}, n); }
-    I16 GetOralMedicationName(METER_REC& r, INSULIN_OR_ORAL_MED_NAME_TYPE& n) override {
-        return run(__func__, &r, {}, n);
-    }
-    I16 SetOralMedicationName(METER_REC& r, INSULIN_OR_ORAL_MED_NAME_TYPE& n) override {
-        return run(__func__, &r, {}, n);
-    }
-    I16 GetPredefinedInsulins(METER_REC& r, PREDEFINED_INSULINS_TYPE& v) override { return run(__func__, &r, {}, v); }
-    I16 SetPredefinedInsulins(METER_REC& r, PREDEFINED_INSULINS_TYPE& v) override { return run(__func__, &r, {}, v); }
-    I16 GetPredefinedOralMeds(METER_REC& r, PREDEFINED_ORAL_MEDS_TYPE& v) override { return run(__func__, &r, {}, v); }
-    I16 SetPredefinedOralMeds(METER_REC& r, PREDEFINED_ORAL_MEDS_TYPE& v) override { return run(__func__, &r, {}, v); }
-    I16 GetMealSegments(METER_REC& r, MEAL_SEGMENTS_TYPE& v) override { return run(__func__, &r, {}, v); }
-    I16 SetMealSegments(METER_REC& r, MEAL_SEGMENTS_TYPE& v) override { return run(__func__, &r, {}, v); }
-    I16 GetScheduleSelection(METER_REC& r, I16& selection) override { return run(__func__, &r, {}, selection); }
-    I16 SetScheduleSelection(METER_REC& r, I16 selection) override { return run(__func__, &r, {selection}); }
-    // The five limits in argument order: before-meal low, high, after-meal low, high, hypo.
-    I16 GetTargetRange(METER_REC& r, I16& a, I16& b, I16& c, I16& d, I16& e) override {
-        return run(__func__, &r, {}, a, b, c, d, e);
-    }
-    I16 SetTargetRange(METER_REC& r, I16 a, I16 b, I16 c, I16 d, I16 e) override {
-        return run(__func__, &r, {a, b, c, d, e});
-    }
-    I16 GetMeterDatalog(METER_REC& r, METER_BIN_DATALOG& log, std::int32_t start) override {
-        return run(__func__, &r, {start}, log);
-    }
-    I16 GetMeterDatalogRecordData(METER_BIN_DATALOG& log, I16 index, RECORD_DATA& record) override {
-        return run(__func__, nullptr, {index}, log, record);
-    }
-    I16 vb_Upload_Meter_Datalog(METER_REC& r, METER_DATALOG& log) override { return run(__func__, &r, {}, log); }
+    // Every meter function logs its call and runs its script.
+#define VARNEL_FAKE_ARG(kind, type, name) , VARNEL_FAKE_ARG_##kind(name)
+#define VARNEL_FAKE_ARG_REC(name) Rec{&name}
+#define VARNEL_FAKE_ARG_VALUE(name) Value{name}
+#define VARNEL_FAKE_ARG_IN(name) name
+#define VARNEL_FAKE_ARG_OUT(name) name
+#define VARNEL_FAKE_ARG_INOUT(name) name
+#define VARNEL_FAKE_ARG_IN_LIST(name) *name  // a list by its first entry
+#define VARNEL_FAKE_ARG_OUT_LIST(name) *name
+#define VARNEL_FAKE_MEMBER(ret, name, ...) \
+    ret name(VARNEL_CXX_PARAMS(__VA_ARGS__)) override { return run<ret>(#name VX_EACH(VARNEL_FAKE_ARG, __VA_ARGS__)); }
+    VX_METER_FUNCTIONS(VARNEL_FAKE_MEMBER)
+#undef VARNEL_FAKE_MEMBER
 
 private:
-    template <class R = I16, class... Refs>
-    R run(const char* function, METER_REC* rec, std::vector<std::int32_t> values, Refs&... refs) {
-        calls_.push_back({function, values, rec ? std::optional(*rec) : std::nullopt});
-        FakeArgs args{rec, std::move(values), {{&typeid(Refs), static_cast<void*>(&refs)}...}};
-        if (auto effect = effects_.find(function); effect != effects_.end()) effect->second(args);
+    // How each argument is logged: the record by copy, numbers by value, the rest as typed references.
+    struct Rec {
+        METER_REC* rec;
+    };
+    struct Value {
+        std::int32_t value;
+    };
+    static void take(FakeArgs& a, Rec r) { a.rec = r.rec; }
+    static void take(FakeArgs& a, Value v) { a.values.push_back(v.value); }
+    template <class T>
+    static void take(FakeArgs& a, T& ref) {
+        a.refs.emplace_back(&typeid(T), static_cast<void*>(&ref));
+    }
+
+    template <class R, class... Args>
+    R run(const char* function, Args&&... args) {
+        FakeArgs call;
+        (take(call, args), ...);
+        calls_.push_back({function, call.values, call.rec ? std::optional(*call.rec) : std::nullopt});
+        if (auto effect = effects_.find(function); effect != effects_.end()) effect->second(call);
         std::deque<std::int32_t>& queue = codes_[function];
         if (queue.empty()) return 0;
         const std::int32_t code = queue.front();
