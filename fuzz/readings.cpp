@@ -10,6 +10,7 @@
 #include <span>
 
 #include "contracts/transport.h"
+#include "support/sim_transport.h"
 #include "harness.h"
 #include "readings.h"
 #include "varnel/component_error.h"
@@ -61,44 +62,12 @@ std::int16_t record(METER_BIN_DATALOG* log, std::int16_t index, RECORD_DATA* out
 }
 
 std::shared_ptr<varnel::detail::Transport> transport() {
-    return varnel::detail::makeTransport({
-        .initialize_meter_structure = &::initialize_meter_structure,
-        .find_meter = &::find_meter,
-        .initialize_meter_type_structure = &::initialize_meter_type_structure,
-        .vb_Chk4Meter = &::vb_Chk4Meter,
-        .vb_Get_Meter_Firmware = &::vb_Get_Meter_Firmware,
-        .vb_Tickle_Meter = &::vb_Tickle_Meter,
-        .close_meter = &::close_meter,
-        .vb_Clear_Meter_Datalog = &::vb_Clear_Meter_Datalog,
-        .vb_Read_Meter_Options = &::vb_Read_Meter_Options,
-        .vb_Read_Meter_Option = &::vb_Read_Meter_Option,
-        .vb_Set_Meter_Option = &::vb_Set_Meter_Option,
-        .vb_Set_Meter_Options = &::vb_Set_Meter_Options,
-        .vb_Read_Meter_Clock = &::vb_Read_Meter_Clock,
-        .vb_Set_Meter_Clock = &::vb_Set_Meter_Clock,
-        .convert_to_seconds = &::convert_to_seconds,
-        .convert_from_seconds = &::convert_from_seconds,
-        .GetInitializedFlag = &::GetInitializedFlag,
-        .SetInitializedFlag = &::SetInitializedFlag,
-        .GetInsulinName = &::GetInsulinName,
-        .SetInsulinName = &::SetInsulinName,
-        .GetOralMedicationName = &::GetOralMedicationName,
-        .SetOralMedicationName = &::SetOralMedicationName,
-        .GetPredefinedInsulins = &::GetPredefinedInsulins,
-        .SetPredefinedInsulins = &::SetPredefinedInsulins,
-        .GetPredefinedOralMeds = &::GetPredefinedOralMeds,
-        .SetPredefinedOralMeds = &::SetPredefinedOralMeds,
-        .GetMealSegments = &::GetMealSegments,
-        .SetMealSegments = &::SetMealSegments,
-        .GetScheduleSelection = &::GetScheduleSelection,
-        .SetScheduleSelection = &::SetScheduleSelection,
-        .GetTargetRange = &::GetTargetRange,
-        .SetTargetRange = &::SetTargetRange,
-        .GetMeterDatalog = &binaryUpload,
-        .GetMeterDatalogRecordData = &record,
-        .vb_Upload_Meter_Datalog = &upload,
-        .vx_set_yield_hook = &::vx_set_yield_hook,
-    });
+    // The simulator, but for the datalogs, which come from the input.
+    varnel::detail::TransportFunctions f = varnel::test::simFunctions();
+    f.GetMeterDatalog = &binaryUpload;
+    f.GetMeterDatalogRecordData = &record;
+    f.vb_Upload_Meter_Datalog = &upload;
+    return varnel::detail::makeTransport(f);
 }
 
 }  // namespace

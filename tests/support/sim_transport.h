@@ -8,12 +8,15 @@
 
 namespace varnel::test {
 
-inline std::shared_ptr<detail::Transport> simTransport() {
+// Every function of the simulator, for callers that replace a few of them.
+inline detail::TransportFunctions simFunctions() {
     detail::TransportFunctions f{};
 #define VARNEL_SIM_FUNCTION(ret, name, ...) f.name = &::name;
     VX_TRANSPORT_FUNCTIONS(VARNEL_SIM_FUNCTION)
 #undef VARNEL_SIM_FUNCTION
-    return detail::makeTransport(f);
+    return f;
 }
+
+inline std::shared_ptr<detail::Transport> simTransport() { return detail::makeTransport(simFunctions()); }
 
 }  // namespace varnel::test
