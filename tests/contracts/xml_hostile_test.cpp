@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "contracts/xml_index_steps.h"
+#include "support/expect_error.h"
 #include "varnel/component_error.h"
 #include "varnel/xml_wrapper.h"
 
@@ -26,16 +27,7 @@ XMLWrapper kept() {
     return x;
 }
 
-// Runs f, expecting a ComponentError with `number` whose description contains `mentions`.
-void expectError(const std::function<void()>& f, std::int32_t number, const std::string& mentions) {
-    try {
-        f();
-        ADD_FAILURE() << "no error; expected " << number << " mentioning " << mentions;
-    } catch (const ComponentError& e) {
-        EXPECT_EQ(e.number(), number) << e.description();
-        EXPECT_NE(e.description().find(mentions), std::string::npos) << e.description() << " / " << mentions;
-    }
-}
+using test::expectError;
 
 std::string nested(int depth, const std::string& inner = "") {
     std::string open, close;

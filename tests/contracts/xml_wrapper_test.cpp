@@ -13,6 +13,7 @@
 #include <vector>
 
 #include "support/wrapper_fixture.h"
+#include "support/expect_error.h"
 #include "varnel/component_error.h"
 
 using namespace varnel;
@@ -21,16 +22,7 @@ using namespace std::string_literals;
 
 namespace {
 
-// Runs f, expecting a ComponentError with `number` whose description contains `mentions`.
-void expectError(const std::function<void()>& f, std::int32_t number, const std::string& mentions) {
-    try {
-        f();
-        ADD_FAILURE() << "no error; expected " << number << " mentioning " << mentions;
-    } catch (const ComponentError& e) {
-        EXPECT_EQ(e.number(), number) << e.description();
-        EXPECT_NE(e.description().find(mentions), std::string::npos) << e.description() << " / " << mentions;
-    }
-}
+using test::expectError;
 
 // A directory for one test, removed afterwards.
 struct TempDir {
