@@ -19,9 +19,9 @@ namespace {
 
 // Where the shipped transport library may be: beside libvarnel, in a varnel/
 // directory beside it (install layouts), then wherever the loader's own search
-// finds it. The shared library is located through a symbol only it defines (the
-// clock slot), so programs that also link the component's units statically, and
-// sanitizer runtimes that stand in for the loader's caller, look in the same place.
+// finds it. The library locates itself through one of its own symbols (the clock
+// slot), so sanitizer runtimes that stand in for the loader's caller do not move
+// the search; a program linking the units statically looks beside itself.
 std::vector<std::string> transportCandidates() {
     std::vector<std::string> candidates;
     Dl_info info{};

@@ -150,14 +150,6 @@ TEST(TransportLoading, CandidatesAreTriedInOrderAndAllNamedWhenNoneLoads) {
     EXPECT_EQ(loadTransport({first, RECORDING_TRANSPORT_FULL})->vb_Clear_Meter_Datalog(rec), -108);
 }
 
-// The default library is the one built beside libvarnel, found from libvarnel's
-// own place whatever the program's run path (sanitizer runtimes ignore it).
-TEST(TransportLoading, TheDefaultLibraryIsFoundBesideTheComponent) {
-    const std::string path = DllWrapper::defaultTransportPath();
-    ASSERT_EQ(path.front(), '/') << path;
-    EXPECT_TRUE(std::filesystem::equivalent(path, VARNEL_TEST_TRANSPORT_PATH)) << path;
-}
-
 // A virtual clock, and Percent_done as each tick of the progress timer saw it.
 struct TransportYield : ::testing::Test {
     std::shared_ptr<ManualClock> clock = std::make_shared<ManualClock>();

@@ -252,20 +252,4 @@ TEST_F(Readings, AFailedNameReadFailsTheUpload) {
     }
 }
 
-// The transport library itself, found where a client's DllWrapper looks by default.
-TEST(ReadingsOverTheTransportLibrary, DiscoverAndRead) {
-    setThreadClock(std::make_shared<ManualClock>(1000));
-    DllWrapper wrapper;
-    METER_REC rec{};
-    XMLWrapper device = newDoc(doc_kind::device_info), status = newDoc(doc_kind::status);
-    XMLWrapper conn = connectionDoc("1"), datalog = newDoc(doc_kind::datalog), filter = newDoc(doc_kind::filter);
-    bool checked = false;
-    ASSERT_EQ(wrapper.discoverDevice(rec, device, conn, status), ME_SUCCESS);
-    ASSERT_EQ(wrapper.getReadings(rec, device, datalog, filter, status, checked), ME_SUCCESS);
-    EXPECT_EQ(parsed(datalog)->first_element_by_path("Datalog/TransferDetail/Records/Total").text().as_uint(),
-              sim::defaultProfile(eMorvex).binaryDatalog.size());
-    EXPECT_EQ(wrapper.closeMeter(rec), ME_SUCCESS);
-    setThreadClock(nullptr);
-}
-
 }  // namespace

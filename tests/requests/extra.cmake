@@ -1,2 +1,0 @@
-# The readings tests load the simulated transport library by path and by default.
-add_dependencies(${target} vantrix32)
