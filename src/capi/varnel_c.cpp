@@ -29,13 +29,14 @@ struct varnel_component {
 namespace varnel::detail {
 namespace {
 
-// What the client reads after an unexpected error: the trace, ending with the
-// reason the error first arose with (unless the trace already says it).
+// What the client reads after an unexpected error: the routine trace, ending
+// with the reason the error first arose with. Only an error raised through the
+// handler protocol has its reason in the shared error; any other is its own text.
 std::string errorText(const CaughtError& caught) {
-    const std::string& reason = errPropagator().error().Reason;
+    const IError& shared = errPropagator().error();
     std::string text = caught.description;
-    if (!reason.empty() && (text.size() < reason.size() || text.compare(text.size() - reason.size(), reason.size(), reason) != 0))
-        text += reason;
+    if (caught.description != shared.ErrorTrace || shared.Reason.empty()) return text;
+    if (!text.ends_with(shared.Reason)) text += shared.Reason;
     return text;
 }
 

@@ -291,14 +291,16 @@ TEST_F(CInterface, UnexpectedErrorsReachTheClientWithTheirTraceUntilTheNextReque
         static void badAlloc(void*) { throw std::bad_alloc(); }
         static void runtime(void*) { throw std::runtime_error("handler failed"); }
     };
-    for (auto handler : {&Thrower::badAlloc, &Thrower::runtime}) {
-        varnel_on_complete(c, handler, nullptr);
+    struct Raised { void (*handler)(void*); const char* reason; };
+    for (const Raised& r : {Raised{&Thrower::badAlloc, "Out of memory"}, Raised{&Thrower::runtime, "handler failed"}}) {
+        varnel_on_complete(c, r.handler, nullptr);
         fresh();
         DocPtr settings = doc(varnel::doc_kind::device_settings);
         EXPECT_NE(varnel_get_device_settings(c, &rec, device.get(), settings.get(), 1, status.get(), nullptr),
                   ME_SUCCESS);
         EXPECT_EQ(varnel_error_number(c), varnel::errc::internal);
-        EXPECT_NE(varnel_error_text(c), nullptr);
+        const std::string said = varnel_error_text(c) ? varnel_error_text(c) : "(null)";
+        EXPECT_TRUE(said.ends_with(r.reason)) << said;
     }
 }
 
