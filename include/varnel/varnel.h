@@ -40,7 +40,8 @@ VARNEL_API varnel_doc* varnel_doc_new(void);
 VARNEL_API varnel_doc* varnel_doc_new_kind(int32_t kind);
 /* 0 loaded; non-zero when xml is not well-formed (or NULL), the document unchanged. */
 VARNEL_API int varnel_doc_load(varnel_doc* doc, const char* xml);
-/* The document as text, newly allocated ("" when empty); release with varnel_free. NULL for NULL. */
+/* The document as text, newly allocated ("" when empty); release with varnel_free.
+   NULL for a NULL document or when out of memory. */
 VARNEL_API char* varnel_doc_xml(const varnel_doc* doc);
 /* Releases a document; NULL does nothing. */
 VARNEL_API void varnel_doc_free(varnel_doc* doc);

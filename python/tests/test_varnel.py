@@ -61,6 +61,6 @@ def test_failures_raise_the_two_exception_kinds():
     with varnel.Component() as c:
         with pytest.raises(varnel.RequestError):
             c.get_readings()  # nothing discovered yet: refused before reaching the meter
+        c.discover()
         with pytest.raises(ValueError):
-            c.discover()  # a meter is there; the malformed document below is refused before the request
-            c.set_settings("<DeviceSettings>")
+            c.set_settings("<DeviceSettings>")  # refused before the request reaches the meter

@@ -246,8 +246,15 @@ class Component:
     def __enter__(self):
         return self
 
-    def __exit__(self, *exc):
-        self.close()
+    def __exit__(self, exc_type, exc, tb):
+        if exc_type is None:
+            self.close()
+            return False
+        # Already failing: a failure to release the meter must not hide why.
+        try:
+            self.close()
+        except (RequestError, ComponentError):
+            pass
         return False
 
     # --- internals ---
