@@ -3,7 +3,7 @@
 # the compilers, the libraries, and clang's sanitizer and libFuzzer runtimes.
 set -euo pipefail
 packages=(cmake g++ make libpugixml-dev libgtest-dev libgmock-dev libbenchmark-dev libcli11-dev
-          clang libclang-rt-14-dev libxml2-dev)
+          clang libclang-rt-14-dev libxml2-dev python3 python3-pytest)
 missing=()
 for p in "${packages[@]}"; do
   dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q "install ok installed" || missing+=("$p")

@@ -9,11 +9,18 @@ namespace varnel::detail {
 
 IError& ErrPropagator::getError(std::int32_t errorNo, const std::string& errorDesc,
                                 std::int32_t line) {
+    // A handler further out sees the trace it raised as the description; only a new error has a reason.
+    const bool raisedHere = !error_.ErrorTrace.empty() && errorDesc == error_.ErrorTrace;
+    if (!raisedHere) error_.Reason = errorDesc;
     error_.ErrorNo = errorNo;
     error_.ErrorDesc = errorDesc;
     error_.ErrLine = line;
     error_.FunctionName = FunctionName;
     error_.ErrorTrace = FunctionName + " --> " + error_.ErrorTrace;
+    // A transport that cannot be loaded is the one error the client cannot
+    // act on without its reason (the path and the loader's message): the
+    // trace carries it out to the client.
+    if (!raisedHere && errorNo == errc::transport_unavailable) error_.ErrorTrace += errorDesc;
     return error_;
 }
 

@@ -17,6 +17,7 @@ struct IError {
     std::int32_t ErrorNo = 0;
     std::string ErrorDesc;
     std::string ErrorTrace;  // outermost routine first, each followed by " --> "
+    std::string Reason;      // the description the error first arose with (ErrorDesc becomes the trace)
     std::string FunctionName;
     std::int32_t ErrLine = 0;
 };

@@ -1,0 +1,66 @@
+"""The Python package over the built libvarnel and the shipped simulated meters (real time: ~5 s)."""
+import ctypes
+import xml.etree.ElementTree as ET
+
+import pytest
+
+import varnel
+
+
+def test_meter_record_matches_the_c_layout():
+    # records.h pins the size and these offsets; a wrong layout corrupts the record the transport fills.
+    assert ctypes.sizeof(varnel.METER_REC) == 2080
+    assert [getattr(varnel.METER_REC, f).offset for f in ("M_Type", "Error_code", "Serial_number")] == [0, 2, 4]
+
+
+def test_a_whole_session_through_the_package():
+    progress = []
+    with varnel.Component() as c:
+        c.on_progress = progress.append
+        device = c.discover(port=1)
+        assert device.find("PortInfo/PortID").text == "1"
+        assert c.rec.M_Type == int(device.find("DeviceInfo/TypeID").text)
+
+        settings = c.get_settings()
+        assert settings.find("Settings/Clock") is not None
+        listed = c.get_settings(items=["Clock", "Beep"])
+        assert [e.tag for e in listed.find("Settings")] == ["Clock", "Beep"]
+        caps = c.get_caps(items=["Clock"])
+        assert [e.tag for e in caps.find("Settings")] == ["Clock"]
+        assert len(c.get_caps().find("Records")) > 0
+
+        # What was read goes back, as an Element and as text.
+        c.set_settings(settings)
+        c.set_settings(ET.tostring(listed, encoding="unicode"))
+
+        progress.clear()
+        log = c.get_readings()
+        assert len(log.find("Records")) > 0
+        assert progress and progress == sorted(progress) and all(0 < p <= 100 for p in progress)
+
+        c.on_progress = None
+        c.clear_meter()
+        assert len(c.get_readings().find("Records")) == 0
+
+        # A bad port is a failed request with the status document's reasons.
+        with pytest.raises(varnel.RequestError) as failed:
+            c.discover(port=300)
+        assert failed.value.code < 0
+        assert failed.value.descriptions == ["300 is not a valid port"]
+    assert c._handle is None  # closed on leaving the block
+
+
+def test_failures_raise_the_two_exception_kinds():
+    with varnel.Component(transport="/nonexistent/varnel-test/libnotransport.so") as c:
+        with pytest.raises(varnel.ComponentError) as unexpected:
+            c.discover()
+    assert unexpected.value.number == 453
+    assert "/nonexistent/varnel-test/libnotransport.so" in unexpected.value.text
+    assert "cannot open shared object file" in unexpected.value.text
+
+    with varnel.Component() as c:
+        with pytest.raises(varnel.RequestError):
+            c.get_readings()  # nothing discovered yet: refused before reaching the meter
+        c.discover()
+        with pytest.raises(ValueError):
+            c.set_settings("<DeviceSettings>")  # refused before the request reaches the meter

@@ -1,0 +1,215 @@
+// The C interface on the shipped simulated transport library, loaded the way
+// a C client loads it (varnel_new(NULL)), on a virtual clock.
+#include <dlfcn.h>
+#include <gtest/gtest.h>
+
+#include <pugixml.hpp>
+
+#include <memory>
+#include <new>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+#include "varnel/clock.h"
+#include "varnel/component_error.h"
+#include "varnel/dll_wrapper.h"
+#include "varnel/varnel.h"
+
+namespace {
+
+using DocPtr = std::unique_ptr<varnel_doc, decltype(&varnel_doc_free)>;
+const char* const kConnection =
+    "<ConnectionInfo><Ports><COM><PortsToSearch>1</PortsToSearch></COM></Ports></ConnectionInfo>";
+const std::string kMissing = "/nonexistent/varnel-test/libnotransport.so";
+
+DocPtr doc(std::int32_t kind) { return DocPtr(varnel_doc_new_kind(kind), &varnel_doc_free); }
+DocPtr loaded(const char* xml) {
+    DocPtr d(varnel_doc_new(), &varnel_doc_free);
+    EXPECT_EQ(varnel_doc_load(d.get(), xml), 0) << xml;
+    return d;
+}
+std::string text(const varnel_doc* d) {
+    char* xml = varnel_doc_xml(d);
+    std::string out = xml ? xml : "(null)";
+    varnel_free(xml);
+    return out;
+}
+// The number of children of the element at a path ("Datalog/Records").
+std::size_t children(const varnel_doc* d, const char* path) {
+    pugi::xml_document tree;
+    tree.load_string(text(d).c_str());
+    pugi::xml_node n = tree.first_element_by_path(path);
+    return std::distance(n.begin(), n.end());
+}
+
+struct Events {
+    std::vector<int> progress;
+    int completions = 0;
+};
+
+struct CInterface : ::testing::Test {
+    // The transport library the component loads, opened again: the same instance, for its control functions.
+    void* sim = dlopen(VARNEL_TEST_TRANSPORT_PATH, RTLD_NOW | RTLD_LOCAL);
+    varnel_component* c = nullptr;
+    METER_REC rec{};
+    Events events;
+    DocPtr device = doc(1), status = doc(7);
+
+    void SetUp() override {
+        ASSERT_NE(sim, nullptr);
+        varnel::setThreadClock(std::make_shared<varnel::ManualClock>(1000));
+        ASSERT_NE(c = varnel_new(nullptr), nullptr);
+        varnel_on_progress(c, [](int16_t* p, void* e) { static_cast<Events*>(e)->progress.push_back(*p); }, &events);
+        varnel_on_complete(c, [](void* e) { ++static_cast<Events*>(e)->completions; }, &events);
+        ASSERT_EQ(reinterpret_cast<int (*)(int)>(dlsym(sim, "vxsim_select_type"))(4), 0);
+        DocPtr conn = loaded(kConnection);
+        ASSERT_EQ(varnel_discover_device(c, &rec, device.get(), conn.get(), status.get()), ME_SUCCESS);
+    }
+    void TearDown() override {
+        varnel_delete(c);
+        reinterpret_cast<int (*)()>(dlsym(sim, "vxsim_reset"))();
+        dlclose(sim);
+        varnel::setThreadClock(nullptr);
+    }
+    void fresh() {
+        status = doc(7);
+        events = Events{};
+    }
+};
+
+TEST(CDocuments, KindsAndMalformedText) {
+    const char* roots[] = {"Device", "DeviceSettings", "ConnectionInfo", "DeviceCaps", "Datalog", "Filter", "Status"};
+    for (int kind = 1; kind <= 7; ++kind)
+        EXPECT_EQ(text(doc(kind).get()).find(std::string("<") + roots[kind - 1]), 0u) << kind;
+    EXPECT_EQ(varnel_doc_new_kind(99), nullptr);  // refused, not an empty document
+    EXPECT_EQ(text(DocPtr(varnel_doc_new(), &varnel_doc_free).get()), "");
+
+    DocPtr d = loaded("<A><B x=\"1\">t</B></A>");
+    const std::string before = text(d.get());
+    for (const char* bad : {"", "<A>", "<A></B>", "<A x='1' x='2'/>", "<A>&undeclared;</A>", "<A/><B/>",
+                            "<A>\x01</A>", "<!DOCTYPE A [<!ENTITY e \"x\">]><A>&e;</A>", static_cast<const char*>(nullptr)}) {
+        EXPECT_NE(varnel_doc_load(d.get(), bad), 0) << (bad ? bad : "NULL");
+        EXPECT_EQ(text(d.get()), before) << (bad ? bad : "NULL");
+    }
+    EXPECT_NE(varnel_doc_load(nullptr, "<A/>"), 0);
+    EXPECT_EQ(text(nullptr), "(null)");
+    varnel_doc_free(nullptr);
+    varnel_free(nullptr);
+    varnel_delete(nullptr);
+}
+
+TEST_F(CInterface, EveryRequestOnTheSimulator) {
+    DocPtr settings = doc(2), caps = doc(4), datalog = doc(5), after = doc(5), filter = doc(6);
+    int check = -1;
+    fresh();
+    EXPECT_EQ(varnel_get_device_settings(c, &rec, device.get(), settings.get(), 1, status.get(), &check), ME_SUCCESS);
+    EXPECT_TRUE(check == 0 || check == 1) << check;  // written, as a C truth value
+    EXPECT_GT(children(settings.get(), "DeviceSettings/Settings"), 1u);
+    EXPECT_EQ(events.completions, 1);
+    EXPECT_EQ(varnel_get_device_caps(c, &rec, device.get(), caps.get(), 1, status.get(), nullptr), ME_SUCCESS);
+    EXPECT_GT(children(caps.get(), "DeviceCaps/Records"), 0u);
+    // The settings as read go back unchanged.
+    EXPECT_EQ(varnel_set_device_settings(c, &rec, device.get(), settings.get(), status.get()), ME_SUCCESS)
+        << text(status.get());
+
+    fresh();
+    EXPECT_EQ(varnel_get_readings(c, &rec, device.get(), datalog.get(), nullptr, status.get(), &check), ME_SUCCESS);
+    EXPECT_GT(children(datalog.get(), "Datalog/Records"), 0u);
+    EXPECT_EQ(events.completions, 1);
+    ASSERT_FALSE(events.progress.empty());
+    EXPECT_TRUE(std::is_sorted(events.progress.begin(), events.progress.end()));
+
+    EXPECT_EQ(varnel_clear_meter(c, &rec, device.get(), status.get()), ME_SUCCESS) << text(status.get());
+    EXPECT_EQ(varnel_get_readings(c, &rec, device.get(), after.get(), filter.get(), status.get(), nullptr), ME_SUCCESS);
+    EXPECT_EQ(children(after.get(), "Datalog/Records"), 0u);
+
+    // Removed handlers are not called; closing raises no completion either way.
+    varnel_on_progress(c, nullptr, nullptr);
+    varnel_on_complete(c, nullptr, nullptr);
+    fresh();
+    EXPECT_EQ(varnel_clear_meter(c, &rec, device.get(), status.get()), ME_SUCCESS);
+    EXPECT_EQ(varnel_close_meter(c, &rec), ME_SUCCESS);
+    EXPECT_TRUE(events.progress.empty());
+    EXPECT_EQ(events.completions, 0);
+    EXPECT_EQ(varnel_error_text(c), nullptr);
+}
+
+TEST_F(CInterface, MissingArgumentsAreRefusedWithoutTouchingAnything) {
+    fresh();
+    DocPtr conn = loaded(kConnection), d = doc(5);
+    varnel_doc *dv = device.get(), *st = status.get();
+    const std::string statusBefore = text(st), deviceBefore = text(dv);
+    for (std::int32_t got : {
+             varnel_discover_device(nullptr, &rec, dv, conn.get(), st), varnel_discover_device(c, nullptr, dv, conn.get(), st),
+             varnel_discover_device(c, &rec, nullptr, conn.get(), st), varnel_discover_device(c, &rec, dv, nullptr, st),
+             varnel_discover_device(c, &rec, dv, conn.get(), nullptr), varnel_set_device_settings(c, &rec, dv, nullptr, st),
+             varnel_get_device_settings(c, &rec, dv, nullptr, 1, st, nullptr),
+             varnel_get_device_caps(c, &rec, nullptr, d.get(), 1, st, nullptr),
+             varnel_get_readings(c, &rec, dv, nullptr, nullptr, st, nullptr),
+             varnel_get_readings(c, &rec, dv, d.get(), nullptr, nullptr, nullptr),
+             varnel_clear_meter(c, &rec, nullptr, st), varnel_close_meter(c, nullptr), varnel_close_meter(nullptr, &rec)})
+        EXPECT_EQ(got, ME_BAD_PARAMETER);
+    EXPECT_EQ(text(st), statusBefore);
+    EXPECT_EQ(text(dv), deviceBefore);
+    EXPECT_EQ(events.completions, 0);
+    EXPECT_EQ(varnel_error_number(nullptr), 0);
+    EXPECT_EQ(varnel_error_text(nullptr), nullptr);
+    varnel_on_progress(nullptr, nullptr, nullptr);
+}
+
+TEST_F(CInterface, UnexpectedErrorsReachTheClientUntilTheNextRequest) {
+    // A device document without PortInfo: the request fails where it reads it.
+    fresh();
+    DocPtr noPortInfo = doc(7);
+    EXPECT_EQ(varnel_clear_meter(c, &rec, noPortInfo.get(), status.get()), ME_UNKNOWN);
+    EXPECT_NE(text(status.get()).find("<Minor>-16</Minor>"), std::string::npos);  // the code the status carries
+    EXPECT_EQ(events.completions, 1);
+    EXPECT_EQ(varnel_error_number(c), varnel::errc::missing_object);
+    const std::string what = varnel_error_text(c) ? varnel_error_text(c) : "";
+    EXPECT_TRUE(what.starts_with("doAction --> ") && what.size() > 13) << "trace and reason: " << what;
+
+    EXPECT_EQ(varnel_clear_meter(c, &rec, device.get(), status.get()), ME_SUCCESS);
+    EXPECT_EQ(varnel_error_number(c), 0);
+    EXPECT_EQ(varnel_error_text(c), nullptr);
+
+    // Whatever a handler raises stays on this side of the boundary, with its own text.
+    struct Raised { void (*handler)(void*); const char* reason; };
+    for (const Raised& r : {Raised{[](void*) { throw std::bad_alloc(); }, "Out of memory"},
+                            Raised{[](void*) { throw std::runtime_error("handler failed"); }, "handler failed"}}) {
+        varnel_on_complete(c, r.handler, nullptr);
+        EXPECT_EQ(varnel_clear_meter(c, &rec, device.get(), status.get()), ME_UNKNOWN);
+        EXPECT_EQ(varnel_error_number(c), varnel::errc::internal);
+        const std::string said = varnel_error_text(c) ? varnel_error_text(c) : "(null)";
+        EXPECT_TRUE(said.ends_with(r.reason)) << said;
+    }
+}
+
+// A transport library that cannot be loaded: the path and the loader's reason, in C and in C++.
+TEST(MissingTransport, NamesThePathAndTheLoadersReason) {
+    varnel::setThreadClock(std::make_shared<varnel::ManualClock>(1000));
+    METER_REC rec{};
+    varnel_component* c = varnel_new(kMissing.c_str());
+    DocPtr device = doc(1), status = doc(7), conn = loaded(kConnection);
+    EXPECT_EQ(varnel_discover_device(c, &rec, device.get(), conn.get(), status.get()), ME_UNKNOWN);
+    EXPECT_EQ(varnel_error_number(c), varnel::errc::transport_unavailable);
+    const std::string text = varnel_error_text(c) ? varnel_error_text(c) : "";
+    EXPECT_TRUE(text.starts_with("discoverDevice --> MeterInit --> ")) << text;
+    EXPECT_NE(text.find(kMissing + ": cannot open shared object file"), std::string::npos) << text;  // dlerror's
+    varnel_delete(c);
+
+    varnel::DllWrapper wrapper(kMissing);
+    varnel::XMLWrapper info, connection, report;
+    info.InitDocument(1);
+    report.InitDocument(7);
+    connection.LoadXML(kConnection);
+    try {
+        wrapper.discoverDevice(rec, info, connection, report);
+        ADD_FAILURE() << "no error";
+    } catch (const varnel::ComponentError& e) {
+        EXPECT_STREQ(e.what(), text.c_str());
+    }
+    varnel::setThreadClock(nullptr);
+}
+
+}  // namespace
