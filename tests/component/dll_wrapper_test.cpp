@@ -75,7 +75,7 @@ TEST_F(Requests, ErasesThatFailWithoutACodeOrRaiseAreFailures) {
     auto fake = std::make_shared<FakeTransport>();
     fake->does("vb_Chk4Meter", [](FakeArgs& a) { a.rec->M_Type = 3; });
     fake->returns("vb_Clear_Meter_Datalog", {ME_FAIL});  // Error_code stays 0
-    DllWrapper own(fake);
+    DllWrapper own = detail::wrapperOver(fake);
     rec.Serial_number[0] = 'S';
     XMLWrapper doc = deviceDoc("1", "S", "3");
     EXPECT_EQ(own.clearMeter(rec, doc, status), ME_FAIL);
@@ -97,7 +97,7 @@ TEST_F(Requests, CloseReleasesThePortQuietly) {
 
     auto fake = std::make_shared<FakeTransport>();
     fake->does("close_meter", [](FakeArgs&) { detail::raise(errc::internal, "port stuck"); });
-    DllWrapper own(fake);
+    DllWrapper own = detail::wrapperOver(fake);
     own.setOnComplete([this] { ++completions; });
     rec.Error_code = -50;  // closeMeter closes whatever the record says
     EXPECT_EQ(unexpectedTrace([&] { own.closeMeter(rec); }), "51 doAction --> MeterClose --> ");

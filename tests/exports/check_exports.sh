@@ -15,7 +15,7 @@ outside=$(printf '%s\n' "$symbols" | grep -Ev \
     -e "^varnel::($functions)(\[abi:cxx11\])?\(" \
     -e "^(typeinfo|typeinfo name|vtable) for varnel::($public)$" || true)
 # Names (not parameter types) of implementation structs, internals and private members.
-hidden=$(printf '%s\n' "$symbols" | grep -E '^[^(]*(::Impl\b|varnel::detail::|::edit\(|::view\()' || true)
+hidden=$(printf '%s\n' "$symbols" | grep -E '^[^(]*(::Impl\b|varnel::detail::|::edit\(|::view\()|::Impl\b' || true)
 
 if [ -n "$outside$hidden" ]; then
     echo "exports: $lib exports names outside the public API:"
