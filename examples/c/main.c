@@ -3,27 +3,20 @@
  *   cc -std=c11 main.c $(pkg-config --cflags --libs varnel)
  */
 #include <stdio.h>
+#include <stdlib.h>
 #include <string.h>
 
 #include <varnel/varnel.h>
 
 enum { DEVICE_INFO = 1, DATALOG = 5, STATUS = 7 };
 
-/* Copies the value of attribute name of the element starting at element into out. */
-static const char* attribute(const char* element, const char* name, char* out, size_t size) {
+/* The number in attribute name of the element starting at element (0 when absent). */
+static int attribute(const char* element, const char* name) {
     char key[32];
     snprintf(key, sizeof key, " %s=\"", name);
     const char* end = strchr(element, '>');
     const char* at = strstr(element, key);
-    out[0] = '\0';
-    if (at && end && at < end) {
-        at += strlen(key);
-        size_t n = strcspn(at, "\"");
-        if (n >= size) n = size - 1;
-        memcpy(out, at, n);
-        out[n] = '\0';
-    }
-    return out;
+    return at && end && at < end ? atoi(at + strlen(key)) : 0;
 }
 
 static int failed(const char* request, int32_t code, varnel_component* c, const varnel_doc* status) {
@@ -65,10 +58,8 @@ int main(void) {
     }
     text = varnel_doc_xml(datalog);
     for (const char* at = text ? strstr(text, "<Gluc ") : NULL; at; at = strstr(at + 1, "<Gluc ")) {
-        char y[8], mm[8], d[8], h[8], m[8], val[16];
-        printf("%s-%s-%s %s:%s  %s\n", attribute(at, "Y", y, sizeof y), attribute(at, "MM", mm, sizeof mm),
-               attribute(at, "D", d, sizeof d), attribute(at, "h", h, sizeof h), attribute(at, "m", m, sizeof m),
-               attribute(at, "Val", val, sizeof val));
+        printf("%04d-%02d-%02d %02d:%02d  %d\n", attribute(at, "Y"), attribute(at, "MM"), attribute(at, "D"),
+               attribute(at, "h"), attribute(at, "m"), attribute(at, "Val"));
     }
     varnel_free(text);
     result = 0;
