@@ -14,7 +14,8 @@ outside=$(printf '%s\n' "$symbols" | grep -Ev \
     -e "^varnel::($public)::[A-Za-z_~]" \
     -e "^varnel::($functions)(\[abi:cxx11\])?\(" \
     -e "^(typeinfo|typeinfo name|vtable) for varnel::($public)$" || true)
-# Names (not parameter types) of implementation structs, internals and private members.
+# Names of implementation structs, internals and private members; an implementation struct
+# also as a parameter type (a private constructor taking it).
 hidden=$(printf '%s\n' "$symbols" | grep -E '^[^(]*(::Impl\b|varnel::detail::|::edit\(|::view\()|::Impl\b' || true)
 
 if [ -n "$outside$hidden" ]; then
