@@ -2,7 +2,7 @@
 
 #include <dlfcn.h>
 
-#include "vxsim.h"
+#include "varnel/vxsim.h"
 
 namespace varnel::cli {
 

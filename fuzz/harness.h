@@ -6,6 +6,7 @@
 #include <memory>
 #include <string>
 
+#include "component/wrapper_access.h"
 #include "simulator.h"
 #include "util/helpers.h"
 #include "varnel/clock.h"
@@ -37,7 +38,7 @@ struct Discovered {
     XMLWrapper status = newDoc(doc_kind::status);
     bool found = false;
 
-    Discovered(std::shared_ptr<detail::Transport> transport, int type) : wrapper(std::move(transport)) {
+    Discovered(std::shared_ptr<detail::Transport> transport, int type) : wrapper(detail::wrapperOver(std::move(transport))) {
         useVirtualClock();
         detail::SetContinueFlag(true);
         sim::loadProfile(sim::defaultProfile(type));

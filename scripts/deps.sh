@@ -5,6 +5,8 @@ set -euo pipefail
 packages=(cmake g++ make libpugixml-dev libgtest-dev libgmock-dev libbenchmark-dev libcli11-dev
           clang libclang-rt-14-dev libxml2-dev python3 python3-pytest)
 missing=()
+# pkg-config: the C example is built through it against the installed package.
+packages+=(pkg-config)
 for p in "${packages[@]}"; do
   dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q "install ok installed" || missing+=("$p")
 done

@@ -3,7 +3,7 @@
 #include <string>
 
 #include "simulator.h"
-#include "vxsim.h"
+#include "varnel/vxsim.h"
 
 namespace {
 

@@ -1,7 +1,7 @@
 // The simulated meters behind libvantrix32: a meter is described by a
 // MeterProfile; the process holds one simulator with one meter at a time.
 // Tests link this library statically; clients reach the same controls through
-// the C functions of vxsim.h.
+// the C functions of varnel/vxsim.h.
 #pragma once
 
 #include <array>

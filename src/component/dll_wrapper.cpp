@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "component/wrapper_access.h"
 #include "requests/discovery.h"
 #include "requests/meter_actions.h"
 #include "requests/readings_document.h"
@@ -46,13 +47,16 @@ struct DllWrapper::Impl {
     detail::RequestContext context;
 };
 
-DllWrapper::DllWrapper() : DllWrapper(detail::loadTransport(transportCandidates())) {}
+DllWrapper::DllWrapper() : impl_(std::make_unique<Impl>(detail::loadTransport(transportCandidates()))) {}
 
 DllWrapper::DllWrapper(const std::string& transportPath)
-    : DllWrapper(detail::loadTransport(transportPath)) {}
+    : impl_(std::make_unique<Impl>(detail::loadTransport(transportPath))) {}
 
-DllWrapper::DllWrapper(std::shared_ptr<detail::Transport> transport)
-    : impl_(std::make_unique<Impl>(std::move(transport))) {}
+DllWrapper::DllWrapper(std::unique_ptr<Impl> impl) : impl_(std::move(impl)) {}
+
+DllWrapper detail::WrapperAccess::over(std::shared_ptr<Transport> transport) {
+    return DllWrapper(std::make_unique<DllWrapper::Impl>(std::move(transport)));
+}
 
 DllWrapper::~DllWrapper() = default;
 

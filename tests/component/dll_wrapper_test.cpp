@@ -75,7 +75,7 @@ TEST_F(Requests, ErasesThatFailWithoutACodeOrRaiseAreFailures) {
     auto fake = std::make_shared<FakeTransport>();
     fake->does("vb_Chk4Meter", [](FakeArgs& a) { a.rec->M_Type = 3; });
     fake->returns("vb_Clear_Meter_Datalog", {ME_FAIL});  // Error_code stays 0
-    DllWrapper own(fake);
+    DllWrapper own = detail::wrapperOver(fake);
     rec.Serial_number[0] = 'S';
     XMLWrapper doc = deviceDoc("1", "S", "3");
     EXPECT_EQ(own.clearMeter(rec, doc, status), ME_FAIL);
@@ -97,7 +97,7 @@ TEST_F(Requests, CloseReleasesThePortQuietly) {
 
     auto fake = std::make_shared<FakeTransport>();
     fake->does("close_meter", [](FakeArgs&) { detail::raise(errc::internal, "port stuck"); });
-    DllWrapper own(fake);
+    DllWrapper own = detail::wrapperOver(fake);
     own.setOnComplete([this] { ++completions; });
     rec.Error_code = -50;  // closeMeter closes whatever the record says
     EXPECT_EQ(unexpectedTrace([&] { own.closeMeter(rec); }), "51 doAction --> MeterClose --> ");
@@ -144,6 +144,74 @@ TEST_F(Requests, DeviceInformationChecksAndUnexpectedErrors) {
         EXPECT_EQ(completions, 1);
         EXPECT_EQ(closed(), keep != -50);
     }
+}
+
+// What the public header promises about the flag, the progress value and closeMeter's events.
+TEST_F(Requests, FlagOnlyWrittenProgressValueACopyAndCloseRaisesNoCompletion) {
+    discover(eDunmark);
+    using Request = std::int32_t (*)(DllWrapper&, METER_REC&, XMLWrapper&, bool&);
+    struct Row {
+        const char* name;
+        Request request;
+        std::int32_t refusedPort;
+    };
+    const std::vector<Row> requests = {
+        {"settings",
+         [](DllWrapper& w, METER_REC& r, XMLWrapper& d, bool& check) {
+             XMLWrapper cfg = newDoc(doc_kind::device_settings), st = newDoc(doc_kind::status);
+             return w.getDeviceSettings(r, d, cfg, true, st, check);
+         },
+         ME_FAIL},
+        {"caps",
+         [](DllWrapper& w, METER_REC& r, XMLWrapper& d, bool& check) {
+             XMLWrapper caps = newDoc(doc_kind::device_caps), st = newDoc(doc_kind::status);
+             return w.getDeviceCaps(r, d, caps, true, st, check);
+         },
+         ME_BAD_PARAMETER},
+        {"readings",
+         [](DllWrapper& w, METER_REC& r, XMLWrapper& d, bool& check) {
+             XMLWrapper log = newDoc(doc_kind::datalog), filter = newDoc(doc_kind::filter);
+             XMLWrapper st = newDoc(doc_kind::status);
+             return w.getReadings(r, d, log, filter, st, check);
+         },
+         ME_BAD_PARAMETER},
+    };
+    const std::string sn = sim::meter().serial, type = std::to_string(sim::meter().type);
+    for (const auto& [name, request, refusedPort] : requests) {
+        SCOPED_TRACE(name);
+        // A refused port: the flag keeps whatever the caller had.
+        XMLWrapper badPort = deviceDoc("-1", sn, type);
+        for (bool before : {false, true}) {
+            bool check = before;
+            EXPECT_EQ(request(*wrapper, rec, badPort, check), refusedPort);
+            EXPECT_EQ(check, before);
+        }
+        XMLWrapper good = deviceDoc("1", sn, type);
+        bool check = false;
+        EXPECT_EQ(request(*wrapper, rec, good, check), ME_SUCCESS);
+        EXPECT_TRUE(check);
+    }
+
+    // A handler that changes the value it is given changes nothing that follows.
+    const auto erase = [&](bool meddle) {
+        wrapper->setOnProgress([&, meddle](std::int16_t& p) {
+            progress.push_back(p);
+            if (meddle) p = 100;
+        });
+        fresh();
+        EXPECT_EQ(clear(), ME_SUCCESS);
+        return progress;
+    };
+    const std::vector<int> plain = erase(false);
+    ASSERT_GE(plain.size(), 2u);
+    EXPECT_EQ(erase(true), plain);
+
+    // closeMeter returns without onComplete, released or not.
+    fresh();
+    sim::injectFault("close_meter", 1, ME_TIME_OUT, false);
+    EXPECT_NE(wrapper->closeMeter(rec), ME_SUCCESS);
+    EXPECT_EQ(wrapper->closeMeter(rec), ME_SUCCESS);
+    EXPECT_EQ(completions, 0);
 }
 
 }  // namespace

@@ -19,8 +19,10 @@ outside=$(printf '%s\n' "$symbols" | grep -Ev \
     -e "^varnel::($functions)(\[abi:cxx11\])?\(" \
     -e "^(typeinfo|typeinfo name|vtable) for varnel::($public)$" \
     -e "^($c_functions)$" || true)
-# Names (not parameter types) of implementation structs, internals and private members.
-hidden=$(printf '%s\n' "$symbols" | grep -E '^[^(]*(::Impl\b|varnel::detail::|::edit\(|::view\()' || true)
+# Names of implementation structs, internals and private members; an implementation struct
+# also as a parameter type (a private constructor taking it).
+hidden=$(printf '%s
+' "$symbols" | grep -E '^[^(]*(::Impl|varnel::detail::|::edit\(|::view\()|::Impl' || true)
 
 missing=$(printf '%s\n' "$c_functions" | tr '|' '\n' | while read -r f; do
     printf '%s\n' "$symbols" | grep -qx "$f" || echo "$f"

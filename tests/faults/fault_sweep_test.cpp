@@ -394,7 +394,7 @@ protected:
         detail::SetContinueFlag(true);
         Outcome o;
         {
-            DllWrapper wrapper(simTransport());
+            DllWrapper wrapper = detail::wrapperOver(simTransport());
             METER_REC rec{};
             XMLWrapper device = newDoc(doc_kind::device_info), status = newDoc(doc_kind::status), out;
             if (request().needsDiscovery) {
@@ -491,7 +491,7 @@ TEST_P(FaultSweep, EveryFailureIsReportedAndNothingIsLost) {
         sim::loadProfile(sim::defaultProfile(type()));
         const Request& get = requests()[1];  // getDeviceSettings, every item
         setThreadClock(std::make_shared<ManualClock>(1000));
-        DllWrapper wrapper(simTransport());
+        DllWrapper wrapper = detail::wrapperOver(simTransport());
         METER_REC rec{};
         XMLWrapper device = newDoc(doc_kind::device_info), status = newDoc(doc_kind::status), cfg;
         XMLWrapper conn = connectionDoc(std::to_string(sim::meter().port));

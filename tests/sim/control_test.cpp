@@ -8,7 +8,7 @@
 #include <sstream>
 
 #include "fixture.h"
-#include "vxsim.h"
+#include "varnel/vxsim.h"
 
 using namespace varnel::sim;
 using simtest::SimTest;

@@ -6,7 +6,7 @@
 #include <fstream>
 
 #include "fixture.h"
-#include "vxsim.h"
+#include "varnel/vxsim.h"
 
 using namespace varnel::sim;
 using simtest::SimTest;

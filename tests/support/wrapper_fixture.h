@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "component/wrapper_access.h"
 #include "errors/err_propagator.h"
 #include "platform/message_pump.h"
 #include "simulator.h"
@@ -125,7 +126,7 @@ struct WrapperTest : ::testing::Test {
         setThreadClock(clock);
         sim::reset();
         detail::SetContinueFlag(true);
-        wrapper = std::make_unique<DllWrapper>(simTransport());
+        wrapper.reset(new DllWrapper(detail::wrapperOver(simTransport())));
         wrapper->setOnProgress([this](std::int16_t& p) { progress.push_back(p); });
         wrapper->setOnComplete([this] { ++completions; });
     }

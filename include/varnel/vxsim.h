@@ -7,7 +7,7 @@
 #ifndef VXSIM_H
 #define VXSIM_H
 
-#include "varnel/vantrix32.h"
+#include "vantrix32.h"
 
 #ifdef __cplusplus
 extern "C" {
