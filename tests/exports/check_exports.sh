@@ -21,8 +21,7 @@ outside=$(printf '%s\n' "$symbols" | grep -Ev \
     -e "^($c_functions)$" || true)
 # Names of implementation structs, internals and private members; an implementation struct
 # also as a parameter type (a private constructor taking it).
-hidden=$(printf '%s
-' "$symbols" | grep -E '^[^(]*(::Impl|varnel::detail::|::edit\(|::view\()|::Impl' || true)
+hidden=$(printf '%s\n' "$symbols" | grep -E '^[^(]*(::Impl\b|varnel::detail::|::edit\(|::view\()|::Impl\b' || true)
 
 missing=$(printf '%s\n' "$c_functions" | tr '|' '\n' | while read -r f; do
     printf '%s\n' "$symbols" | grep -qx "$f" || echo "$f"
