@@ -57,7 +57,8 @@ void addCapsCommand(CLI::App& app, int& status) {
         "caps", "Print what the meter can do: its settings with their limits, and the record kinds it keeps");
     addMeterOptions(caps, line->meter);
     addOutputOption(caps, line->output);
-    caps->add_option("--item", line->items, "Describe only this setting (Clock, Beep, Language, Targets...); repeatable")
+    caps->add_option("--item", line->items,
+                     "Describe only this setting (Clock, Beep, Language, Targets...); repeatable")
         ->type_name("NAME");
     caps->add_option("--record", line->records, "Describe only this record kind (Gluc, Ins, Food...); repeatable")
         ->type_name("NAME");

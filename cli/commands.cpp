@@ -70,7 +70,8 @@ void readings(MeterSession& s, const CommandLine& cl) {
     if (!cl.clearAfter) return;
     s.clearMeter();
     if (!cl.meter.quiet)
-        say("readings saved to " + cl.output + "; meter " + sectionValue(s.deviceInfo(), "DeviceInfo", "SN") + " erased");
+        say("readings saved to " + cl.output + "; meter " + sectionValue(s.deviceInfo(), "DeviceInfo", "SN") +
+            " erased");
 }
 
 }  // namespace

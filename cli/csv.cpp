@@ -53,8 +53,10 @@ std::string label(const pugi::xml_node& node) {
 
 void fillGlucose(const pugi::xml_node& e, const Units& u, Row& r) {
     const std::string sample = attr(e, "Txt");
-    if (sample == "Control") r.kind = "Glucose control";
-    else if (sample == "Check Strip") r.kind = "Check strip";
+    if (sample == "Control")
+        r.kind = "Glucose control";
+    else if (sample == "Check Strip")
+        r.kind = "Check strip";
     r.value = attr(e, "Val");
     r.unit = u.glucose;
     r.slot = attr(e.child("MealSlot"), "Txt");
@@ -156,8 +158,8 @@ int number(const pugi::xml_node& e, const char* name) { return std::atoi(attr(e,
 std::string dateTime(const pugi::xml_node& e) {
     if (!e.attribute("Y") || !e.attribute("MM") || !e.attribute("D")) return {};
     char text[40];
-    std::snprintf(text, sizeof text, "%04d-%02d-%02d %02d:%02d:%02d", number(e, "Y"), number(e, "MM"),
-                  number(e, "D"), number(e, "h"), number(e, "m"), number(e, "s"));
+    std::snprintf(text, sizeof text, "%04d-%02d-%02d %02d:%02d:%02d", number(e, "Y"), number(e, "MM"), number(e, "D"),
+                  number(e, "h"), number(e, "m"), number(e, "s"));
     return text;
 }
 

@@ -45,8 +45,7 @@ std::string temporaryName(const std::string& path) {
     const auto slash = path.find_last_of('/');
     const std::string dir = slash == std::string::npos ? "" : path.substr(0, slash + 1);
     const std::string base = slash == std::string::npos ? path : path.substr(slash + 1);
-    return dir + "." + base + ".varnel-" + std::to_string(::getpid()) + "-" +
-           std::to_string(counter++) + ".tmp";
+    return dir + "." + base + ".varnel-" + std::to_string(::getpid()) + "-" + std::to_string(counter++) + ".tmp";
 }
 
 void writeStandardOutput(const std::string& text) {

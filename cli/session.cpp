@@ -74,8 +74,7 @@ int MeterSession::run(const std::function<void(MeterSession&)>& work) {
     return saveSimulatedMeter(status);
 }
 
-void MeterSession::request(const std::string& label,
-                           const std::function<std::int32_t(XMLWrapper& status)>& call) {
+void MeterSession::request(const std::string& label, const std::function<std::int32_t(XMLWrapper& status)>& call) {
     XMLWrapper status = emptyDocument(doc_kind::status);
     progress_.start(label);
     std::int32_t code = 0;
@@ -110,9 +109,8 @@ void MeterSession::attachSimulatedMeter() {
 void MeterSession::discover() {
     XMLWrapper connection = connectionDocument(options_.port);
     deviceInfo_ = emptyDocument(doc_kind::device_info);
-    request("discover", [&](XMLWrapper& status) {
-        return wrapper_->discoverDevice(record_, deviceInfo_, connection, status);
-    });
+    request("discover",
+            [&](XMLWrapper& status) { return wrapper_->discoverDevice(record_, deviceInfo_, connection, status); });
     found_ = true;
 }
 

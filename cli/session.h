@@ -34,8 +34,8 @@ int statusForCode(std::int32_t code);
 // The options every meter command takes.
 struct MeterOptions {
     int port = 1;
-    std::string transport;   // empty: the simulated transport shipped with Varnel
-    int simType = 0;         // 0: leave the simulated meter as the library starts it
+    std::string transport;  // empty: the simulated transport shipped with Varnel
+    int simType = 0;        // 0: leave the simulated meter as the library starts it
     std::string simProfile;
     std::string simSave;
     bool quiet = false;

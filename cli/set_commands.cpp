@@ -50,9 +50,8 @@ XMLWrapper clockDocument(MeterSession& s, const std::tm& now) {
     doc.SelectElement("Settings");
     doc.AddElement("Clock");
     doc.AddChildElement("Val");
-    const std::pair<const char*, int> parts[] = {{"D", now.tm_mday},        {"MM", now.tm_mon + 1},
-                                                 {"Y", now.tm_year + 1900}, {"h", now.tm_hour},
-                                                 {"m", now.tm_min},         {"s", now.tm_sec}};
+    const std::pair<const char*, int> parts[] = {{"D", now.tm_mday}, {"MM", now.tm_mon + 1}, {"Y", now.tm_year + 1900},
+                                                 {"h", now.tm_hour}, {"m", now.tm_min},      {"s", now.tm_sec}};
     for (const auto& [name, value] : parts) doc.SetChildAttribute(name, std::to_string(value));
     doc.MoveToRoot();
     return doc;

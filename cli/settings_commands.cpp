@@ -115,8 +115,8 @@ void showClock(MeterSession& s) {
 void addSettingsCommands(CLI::App& app, int& status, ClockSetter setClock) {
     auto line = std::make_shared<SettingsLine>();
 
-    auto* settings = app.add_subcommand(
-        "settings", "Print the meter's settings document: every item, or those named by --item");
+    auto* settings =
+        app.add_subcommand("settings", "Print the meter's settings document: every item, or those named by --item");
     addMeterOptions(settings, line->meter);
     addOutputOption(settings, line->output);
     settings
@@ -131,8 +131,7 @@ void addSettingsCommands(CLI::App& app, int& status, ClockSetter setClock) {
         });
     });
 
-    auto* clock = app.add_subcommand(
-        "clock", "Show the meter clock beside the computer clock, with the difference");
+    auto* clock = app.add_subcommand("clock", "Show the meter clock beside the computer clock, with the difference");
     addMeterOptions(clock, line->meter);
     if (setClock) clock->add_flag("--sync", line->sync, "First set the meter clock to the computer clock");
     clock->callback([line, &status, setClock] {

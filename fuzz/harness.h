@@ -38,7 +38,8 @@ struct Discovered {
     XMLWrapper status = newDoc(doc_kind::status);
     bool found = false;
 
-    Discovered(std::shared_ptr<detail::Transport> transport, int type) : wrapper(detail::wrapperOver(std::move(transport))) {
+    Discovered(std::shared_ptr<detail::Transport> transport, int type)
+        : wrapper(detail::wrapperOver(std::move(transport))) {
         useVirtualClock();
         detail::SetContinueFlag(true);
         sim::loadProfile(sim::defaultProfile(type));

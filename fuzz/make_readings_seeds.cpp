@@ -23,7 +23,7 @@ int main(int argc, char** argv) {
         if (!f || std::fwrite(out.data(), 1, out.size(), f) != out.size() || std::fclose(f) != 0) return false;
         return true;
     };
-    auto le = [](int v, std::uint8_t (&b)[2]) {
+    auto le = [](int v, std::uint8_t(&b)[2]) {
         b[0] = static_cast<std::uint8_t>(v);
         b[1] = static_cast<std::uint8_t>(v >> 8);
     };

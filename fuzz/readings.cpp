@@ -10,9 +10,9 @@
 #include <span>
 
 #include "contracts/transport.h"
-#include "support/sim_transport.h"
 #include "harness.h"
 #include "readings.h"
+#include "support/sim_transport.h"
 #include "varnel/component_error.h"
 #include "varnel/vantrix32.h"
 
@@ -24,9 +24,7 @@ ReadingsHeader header;
 std::span<const std::uint8_t> payload;
 std::size_t nextRecord = 0;  // direct mode: where the next answered record starts
 
-std::int16_t count(const std::uint8_t (&bytes)[2]) {
-    return static_cast<std::int16_t>(bytes[0] | bytes[1] << 8);
-}
+std::int16_t count(const std::uint8_t (&bytes)[2]) { return static_cast<std::int16_t>(bytes[0] | bytes[1] << 8); }
 
 void fill(void* target, std::size_t capacity, std::span<const std::uint8_t> from) {
     std::memcpy(target, from.data(), std::min(capacity, from.size()));
@@ -84,7 +82,6 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     try {
         meter.wrapper.getReadings(meter.rec, meter.device, datalog, filter, meter.status, check);
         (void)datalog.XML();
-    } catch (const ComponentError&) {
-    }
+    } catch (const ComponentError&) {}
     return 0;
 }

@@ -22,13 +22,11 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
         const int wanted = std::atoi(settings.GetChildValue("TypeID").c_str());
         if (wanted >= 1 && wanted <= 8) type = wanted;
         settings.MoveToRoot();
-    } catch (const ComponentError&) {
-    }
+    } catch (const ComponentError&) {}
     fuzz::Discovered meter(test::simTransport(), type);
     if (!meter.found) __builtin_trap();
     try {
         meter.wrapper.setDeviceSettings(meter.rec, meter.device, settings, meter.status);
-    } catch (const ComponentError&) {
-    }
+    } catch (const ComponentError&) {}
     return 0;
 }

@@ -37,8 +37,9 @@ int main(void) {
     varnel_doc* status = varnel_doc_new_kind(STATUS);
     varnel_doc* datalog = varnel_doc_new_kind(DATALOG);
     if (!c || !device || !conn || !status || !datalog ||
-        varnel_doc_load(conn, "<ConnectionInfo><Ports><COM><PortsToSearch>1</PortsToSearch></COM></Ports>"
-                              "</ConnectionInfo>") != 0)
+        varnel_doc_load(conn,
+                        "<ConnectionInfo><Ports><COM><PortsToSearch>1</PortsToSearch></COM></Ports>"
+                        "</ConnectionInfo>") != 0)
         goto done;
 
     int32_t code = varnel_discover_device(c, &rec, device, conn, status);

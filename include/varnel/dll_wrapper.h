@@ -118,8 +118,7 @@ public:
      * Raises `onComplete` only when it fails unexpectedly.
      */
     std::int32_t discoverDevice(METER_REC& udtMeterRec, XMLWrapper& objDeviceInfoXMLWrapper,
-                                XMLWrapper& objConnInfoXMLWrapper,
-                                XMLWrapper& objStatusInfoXMLWrapper);
+                                XMLWrapper& objConnInfoXMLWrapper, XMLWrapper& objStatusInfoXMLWrapper);
 
     /**
      * Writes the settings of a device settings document to the meter.
@@ -135,8 +134,7 @@ public:
      * Raises `onComplete` once on every exit.
      */
     std::int32_t setDeviceSettings(METER_REC& udtMeterRec, XMLWrapper& objDeviceInfoXMLWrapper,
-                                   XMLWrapper& objDeviceCfgXMLWrapper,
-                                   XMLWrapper& objStatusInfoXMLWrapper);
+                                   XMLWrapper& objDeviceCfgXMLWrapper, XMLWrapper& objStatusInfoXMLWrapper);
 
     /**
      * Reads the meter's settings into a device settings document.

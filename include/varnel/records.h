@@ -99,24 +99,24 @@ typedef enum MeterOptions_Enum {
 /* What one binary datalog record holds: the recType of RECORD_DATA. Other
    numbers carry only a time stamp and an ordinal. */
 typedef enum RecordType_Enum {
-    VX_REC_GLUCOSE = 0,                  /* a blood or control-solution test */
-    VX_REC_ORAL_MEDICATION = 10,         /* oralMedType, oralMedDosage */
-    VX_REC_INSULIN = 11,                 /* InsulinType, insulinDosage */
-    VX_REC_PUMP_BOLUS = 12,              /* bolusSetting */
-    VX_REC_PUMP_DAILY_TOTAL = 13,        /* dailyTotalSetting */
-    VX_REC_CARBS_FATS = 20,              /* a meal's carbs and fats, or alcohol (mealSegment 4) */
-    VX_REC_CALORIES_PROTEIN = 21,        /* a meal's calories and protein */
+    VX_REC_GLUCOSE = 0,           /* a blood or control-solution test */
+    VX_REC_ORAL_MEDICATION = 10,  /* oralMedType, oralMedDosage */
+    VX_REC_INSULIN = 11,          /* InsulinType, insulinDosage */
+    VX_REC_PUMP_BOLUS = 12,       /* bolusSetting */
+    VX_REC_PUMP_DAILY_TOTAL = 13, /* dailyTotalSetting */
+    VX_REC_CARBS_FATS = 20,       /* a meal's carbs and fats, or alcohol (mealSegment 4) */
+    VX_REC_CALORIES_PROTEIN = 21, /* a meal's calories and protein */
     VX_REC_KETONES = 30,
     VX_REC_HBA1C = 31,
     VX_REC_MICROALBUMIN = 32,
     VX_REC_CHOLESTEROL_LDL_HDL = 33,
-    VX_REC_CHOLESTEROL_TOTAL_TRIG = 34,  /* total cholesterol and triglycerides */
-    VX_REC_BLOOD_PRESSURE = 35,          /* systole, diastole */
+    VX_REC_CHOLESTEROL_TOTAL_TRIG = 34, /* total cholesterol and triglycerides */
+    VX_REC_BLOOD_PRESSURE = 35,         /* systole, diastole */
     VX_REC_WEIGHT_HEIGHT = 36,
-    VX_REC_HEALTH_NOTES = 37,            /* stress, feeling hypo, illness, menses, vacation, other */
+    VX_REC_HEALTH_NOTES = 37, /* stress, feeling hypo, illness, menses, vacation, other */
     VX_REC_LAST_VISIT = 38,
-    VX_REC_EXERCISE = 45,                /* ExerciseLevel, exerciseDuration in minutes */
-    VX_REC_CAL_CODE = 52                 /* a strip calibration code change */
+    VX_REC_EXERCISE = 45, /* ExerciseLevel, exerciseDuration in minutes */
+    VX_REC_CAL_CODE = 52  /* a strip calibration code change */
 } RecordType_Enum;
 
 /* Serial-port control block, in the layout of the Windows DCB. */
@@ -331,69 +331,56 @@ typedef struct TIME_REC {
 
 /* The binary layout, checked at compile time. */
 VARNEL_STATIC_ASSERT(sizeof(dcb) == 28, "dcb size");
-VARNEL_STATIC_ASSERT(offsetof(dcb, BaudRate) == 4 && offsetof(dcb, fFlags) == 8 &&
-                         offsetof(dcb, wReserved) == 12 && offsetof(dcb, XonLim) == 14 &&
-                         offsetof(dcb, XoffLim) == 16 && offsetof(dcb, ByteSize) == 18 &&
-                         offsetof(dcb, Parity) == 19 && offsetof(dcb, StopBits) == 20 &&
-                         offsetof(dcb, XonChar) == 21 && offsetof(dcb, XoffChar) == 22 &&
-                         offsetof(dcb, ErrorChar) == 23 && offsetof(dcb, EofChar) == 24 &&
-                         offsetof(dcb, EvtChar) == 25 && offsetof(dcb, wReserved1) == 26,
+VARNEL_STATIC_ASSERT(offsetof(dcb, BaudRate) == 4 && offsetof(dcb, fFlags) == 8 && offsetof(dcb, wReserved) == 12 &&
+                         offsetof(dcb, XonLim) == 14 && offsetof(dcb, XoffLim) == 16 && offsetof(dcb, ByteSize) == 18 &&
+                         offsetof(dcb, Parity) == 19 && offsetof(dcb, StopBits) == 20 && offsetof(dcb, XonChar) == 21 &&
+                         offsetof(dcb, XoffChar) == 22 && offsetof(dcb, ErrorChar) == 23 &&
+                         offsetof(dcb, EofChar) == 24 && offsetof(dcb, EvtChar) == 25 &&
+                         offsetof(dcb, wReserved1) == 26,
                      "dcb offsets");
 VARNEL_STATIC_ASSERT(sizeof(PORT_REC) == 40, "PORT_REC size");
 VARNEL_STATIC_ASSERT(offsetof(PORT_REC, Id) == 4 && offsetof(PORT_REC, com_number) == 8 &&
                          offsetof(PORT_REC, baud_rate) == 10 && offsetof(PORT_REC, dcb) == 12,
                      "PORT_REC offsets");
 VARNEL_STATIC_ASSERT(sizeof(SETTINGS_REC) == 220, "SETTINGS_REC size");
-VARNEL_STATIC_ASSERT(offsetof(SETTINGS_REC, Availability) == 44 &&
-                         offsetof(SETTINGS_REC, nValue) == 88 &&
-                         offsetof(SETTINGS_REC, nValue_min) == 132 &&
-                         offsetof(SETTINGS_REC, nValue_max) == 176,
+VARNEL_STATIC_ASSERT(offsetof(SETTINGS_REC, Availability) == 44 && offsetof(SETTINGS_REC, nValue) == 88 &&
+                         offsetof(SETTINGS_REC, nValue_min) == 132 && offsetof(SETTINGS_REC, nValue_max) == 176,
                      "SETTINGS_REC offsets");
 VARNEL_STATIC_ASSERT(sizeof(LANG_MAP_TYPE) == 42, "LANG_MAP_TYPE size");
 VARNEL_STATIC_ASSERT(sizeof(EVENT_MAP_TYPE) == 34, "EVENT_MAP_TYPE size");
 VARNEL_STATIC_ASSERT(sizeof(INSULIN_MAP_TYPE) == 30, "INSULIN_MAP_TYPE size");
 VARNEL_STATIC_ASSERT(sizeof(METER_REC) == 2080, "METER_REC size");
-VARNEL_STATIC_ASSERT(offsetof(METER_REC, Error_code) == 2 &&
-                         offsetof(METER_REC, Serial_number) == 4 &&
-                         offsetof(METER_REC, Firmware_number) == 24 &&
-                         offsetof(METER_REC, port) == 44 && offsetof(METER_REC, Setting) == 84 &&
-                         offsetof(METER_REC, Meter_upload_time) == 304 &&
+VARNEL_STATIC_ASSERT(offsetof(METER_REC, Error_code) == 2 && offsetof(METER_REC, Serial_number) == 4 &&
+                         offsetof(METER_REC, Firmware_number) == 24 && offsetof(METER_REC, port) == 44 &&
+                         offsetof(METER_REC, Setting) == 84 && offsetof(METER_REC, Meter_upload_time) == 304 &&
                          offsetof(METER_REC, Computer_upload_time) == 308 &&
                          offsetof(METER_REC, Checkstrip_range_lower_limit) == 312 &&
                          offsetof(METER_REC, Checkstrip_range_upper_limit) == 314 &&
                          offsetof(METER_REC, Checkstrip_range_approx) == 316 &&
-                         offsetof(METER_REC, Percent_done) == 318 &&
-                         offsetof(METER_REC, Stage) == 320 &&
+                         offsetof(METER_REC, Percent_done) == 318 && offsetof(METER_REC, Stage) == 320 &&
                          offsetof(METER_REC, Upper_glucose_report_level) == 322 &&
                          offsetof(METER_REC, Lower_glucose_report_level) == 324 &&
                          offsetof(METER_REC, Upper_glucose_error_level) == 326 &&
-                         offsetof(METER_REC, Lower_glucose_error_level) == 328 &&
-                         offsetof(METER_REC, langMap) == 330 &&
-                         offsetof(METER_REC, eventMap) == 372 &&
-                         offsetof(METER_REC, insulinMap) == 406 &&
-                         offsetof(METER_REC, Meter_name) == 436 &&
-                         offsetof(METER_REC, Plasma_cal_flag) == 476 &&
-                         offsetof(METER_REC, Time_min) == 480 &&
-                         offsetof(METER_REC, Time_max) == 484 &&
+                         offsetof(METER_REC, Lower_glucose_error_level) == 328 && offsetof(METER_REC, langMap) == 330 &&
+                         offsetof(METER_REC, eventMap) == 372 && offsetof(METER_REC, insulinMap) == 406 &&
+                         offsetof(METER_REC, Meter_name) == 436 && offsetof(METER_REC, Plasma_cal_flag) == 476 &&
+                         offsetof(METER_REC, Time_min) == 480 && offsetof(METER_REC, Time_max) == 484 &&
                          offsetof(METER_REC, FuncPtr_User_func) == 488 &&
                          offsetof(METER_REC, FuncPtr_upload_meter_datalog) == 540 &&
                          offsetof(METER_REC, Raw_buff) == 544,
                      "METER_REC offsets");
 VARNEL_STATIC_ASSERT(sizeof(TEST_REC) == 20, "TEST_REC size");
-VARNEL_STATIC_ASSERT(offsetof(TEST_REC, Sample_detected) == 2 &&
-                         offsetof(TEST_REC, Medication) == 4 &&
+VARNEL_STATIC_ASSERT(offsetof(TEST_REC, Sample_detected) == 2 && offsetof(TEST_REC, Medication) == 4 &&
                          offsetof(TEST_REC, Event_code) == 12 && offsetof(TEST_REC, Flags) == 14 &&
                          offsetof(TEST_REC, T_Type) == 16,
                      "TEST_REC offsets");
 VARNEL_STATIC_ASSERT(sizeof(data_rec) == 32, "data_rec size");
-VARNEL_STATIC_ASSERT(offsetof(data_rec, Valid) == 2 &&
-                         offsetof(data_rec, ResultApproximated) == 4 &&
+VARNEL_STATIC_ASSERT(offsetof(data_rec, Valid) == 2 && offsetof(data_rec, ResultApproximated) == 4 &&
                          offsetof(data_rec, D_Time) == 8 && offsetof(data_rec, Test) == 12,
                      "data_rec offsets");
 VARNEL_STATIC_ASSERT(sizeof(METER_DATALOG) == 8168, "METER_DATALOG size");
 VARNEL_STATIC_ASSERT(offsetof(METER_DATALOG, ValidRecordCount) == 2 &&
-                         offsetof(METER_DATALOG, maxRecordsForMeter) == 4 &&
-                         offsetof(METER_DATALOG, DataLog) == 8,
+                         offsetof(METER_DATALOG, maxRecordsForMeter) == 4 && offsetof(METER_DATALOG, DataLog) == 8,
                      "METER_DATALOG offsets");
 VARNEL_STATIC_ASSERT(sizeof(METER_BIN_DATALOG) == 30646, "METER_BIN_DATALOG size");
 VARNEL_STATIC_ASSERT(offsetof(METER_BIN_DATALOG, corruptedCount) == 2 &&
@@ -402,41 +389,28 @@ VARNEL_STATIC_ASSERT(offsetof(METER_BIN_DATALOG, corruptedCount) == 2 &&
                      "METER_BIN_DATALOG offsets");
 VARNEL_STATIC_ASSERT(sizeof(RECORD_DATA) == 132, "RECORD_DATA size");
 VARNEL_STATIC_ASSERT(offsetof(RECORD_DATA, timeStamp) == 4 && offsetof(RECORD_DATA, Ordinal) == 8 &&
-                         offsetof(RECORD_DATA, reading) == 10 &&
-                         offsetof(RECORD_DATA, controlFlag) == 12 &&
-                         offsetof(RECORD_DATA, alternateSiteFlag) == 14 &&
-                         offsetof(RECORD_DATA, dietLabel) == 16 &&
-                         offsetof(RECORD_DATA, exerciseLabel) == 18 &&
-                         offsetof(RECORD_DATA, stressFlag) == 20 &&
-                         offsetof(RECORD_DATA, feelHypoFlag) == 22 &&
-                         offsetof(RECORD_DATA, illnessFlag) == 24 &&
-                         offsetof(RECORD_DATA, mensesFlag) == 26 &&
-                         offsetof(RECORD_DATA, vacationFlag) == 28 &&
-                         offsetof(RECORD_DATA, otherFlag) == 30 &&
-                         offsetof(RECORD_DATA, mealSegment) == 32 &&
+                         offsetof(RECORD_DATA, reading) == 10 && offsetof(RECORD_DATA, controlFlag) == 12 &&
+                         offsetof(RECORD_DATA, alternateSiteFlag) == 14 && offsetof(RECORD_DATA, dietLabel) == 16 &&
+                         offsetof(RECORD_DATA, exerciseLabel) == 18 && offsetof(RECORD_DATA, stressFlag) == 20 &&
+                         offsetof(RECORD_DATA, feelHypoFlag) == 22 && offsetof(RECORD_DATA, illnessFlag) == 24 &&
+                         offsetof(RECORD_DATA, mensesFlag) == 26 && offsetof(RECORD_DATA, vacationFlag) == 28 &&
+                         offsetof(RECORD_DATA, otherFlag) == 30 && offsetof(RECORD_DATA, mealSegment) == 32 &&
                          offsetof(RECORD_DATA, carbs) == 34 && offsetof(RECORD_DATA, fats) == 36 &&
-                         offsetof(RECORD_DATA, calories) == 38 &&
-                         offsetof(RECORD_DATA, protein) == 40 &&
+                         offsetof(RECORD_DATA, calories) == 38 && offsetof(RECORD_DATA, protein) == 40 &&
                          offsetof(RECORD_DATA, ketones) == 42 && offsetof(RECORD_DATA, hbA1C) == 44,
                      "RECORD_DATA offsets, first half");
-VARNEL_STATIC_ASSERT(offsetof(RECORD_DATA, microalbumin) == 52 &&
-                         offsetof(RECORD_DATA, cholesterolLDL) == 54 &&
-                         offsetof(RECORD_DATA, cholesterolHDL) == 56 &&
-                         offsetof(RECORD_DATA, cholesterolTotal) == 58 &&
+VARNEL_STATIC_ASSERT(offsetof(RECORD_DATA, microalbumin) == 52 && offsetof(RECORD_DATA, cholesterolLDL) == 54 &&
+                         offsetof(RECORD_DATA, cholesterolHDL) == 56 && offsetof(RECORD_DATA, cholesterolTotal) == 58 &&
                          offsetof(RECORD_DATA, cholesterolTriglyceride) == 60 &&
                          offsetof(RECORD_DATA, bloodPressureSystole) == 62 &&
-                         offsetof(RECORD_DATA, bloodPressureDiastole) == 64 &&
-                         offsetof(RECORD_DATA, weight) == 68 && offsetof(RECORD_DATA, height) == 76 &&
-                         offsetof(RECORD_DATA, visit) == 84 &&
-                         offsetof(RECORD_DATA, oralMedType) == 86 &&
-                         offsetof(RECORD_DATA, oralMedDosage) == 88 &&
-                         offsetof(RECORD_DATA, InsulinType) == 96 &&
-                         offsetof(RECORD_DATA, insulinDosage) == 100 &&
+                         offsetof(RECORD_DATA, bloodPressureDiastole) == 64 && offsetof(RECORD_DATA, weight) == 68 &&
+                         offsetof(RECORD_DATA, height) == 76 && offsetof(RECORD_DATA, visit) == 84 &&
+                         offsetof(RECORD_DATA, oralMedType) == 86 && offsetof(RECORD_DATA, oralMedDosage) == 88 &&
+                         offsetof(RECORD_DATA, InsulinType) == 96 && offsetof(RECORD_DATA, insulinDosage) == 100 &&
                          offsetof(RECORD_DATA, bolusSetting) == 108 &&
                          offsetof(RECORD_DATA, dailyTotalSetting) == 116 &&
                          offsetof(RECORD_DATA, ExerciseLevel) == 124 &&
-                         offsetof(RECORD_DATA, exerciseDuration) == 126 &&
-                         offsetof(RECORD_DATA, oldCalCode) == 128 &&
+                         offsetof(RECORD_DATA, exerciseDuration) == 126 && offsetof(RECORD_DATA, oldCalCode) == 128 &&
                          offsetof(RECORD_DATA, newCalCode) == 130,
                      "RECORD_DATA offsets, second half");
 VARNEL_STATIC_ASSERT(sizeof(INSULIN_OR_ORAL_MED_NAME_TYPE) == 14 &&

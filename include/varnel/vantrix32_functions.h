@@ -36,6 +36,7 @@ typedef void (*vx_yield_fn)(void* context);
 typedef uint32_t (*vx_tick_fn)(void* context);
 typedef void (*vx_sleep_fn)(void* context, uint32_t ms);
 
+/* clang-format off */
 #define VX_METER_FUNCTIONS(F)                                                                    \
     /* Identification and session. */                                                          \
     F(int16_t, initialize_meter_structure, (REC, METER_REC, rec))                               \
@@ -105,6 +106,7 @@ typedef void (*vx_sleep_fn)(void* context, uint32_t ms);
 
 /* Every function, meter functions first. */
 #define VX_TRANSPORT_FUNCTIONS(F) VX_METER_FUNCTIONS(F) VX_HOOK_FUNCTIONS(F)
+/* clang-format on */
 
 /*
  * VX_EACH(M, arguments...) expands M(kind, type, name) for each argument tuple,
@@ -112,7 +114,7 @@ typedef void (*vx_sleep_fn)(void* context, uint32_t ms);
  * VX_COMMA_LIST(...) strips of its first comma.
  */
 #define VX_EACH(M, ...) VX_EACH_N_(VX_COUNT_(__VA_ARGS__, 6, 5, 4, 3, 2, 1, 0), M, __VA_ARGS__)
-#define VX_COMMA_LIST(...) VX_TAIL_(~ __VA_ARGS__)
+#define VX_COMMA_LIST(...) VX_TAIL_(~__VA_ARGS__)
 
 #define VX_TAIL_(first, ...) __VA_ARGS__
 #define VX_COUNT_(a1, a2, a3, a4, a5, a6, n, ...) n

@@ -67,15 +67,12 @@ VARNEL_API int32_t varnel_get_device_settings(varnel_component* c, METER_REC* re
                                               int* check_meter);
 /* Describes what the meter supports in device_caps: all when fetch_all, else the items it lists. */
 VARNEL_API int32_t varnel_get_device_caps(varnel_component* c, METER_REC* rec, varnel_doc* device_info,
-                                          varnel_doc* device_caps, int fetch_all, varnel_doc* status,
-                                          int* check_meter);
+                                          varnel_doc* device_caps, int fetch_all, varnel_doc* status, int* check_meter);
 /* Uploads the meter's readings into datalog; filter may be NULL. */
 VARNEL_API int32_t varnel_get_readings(varnel_component* c, METER_REC* rec, varnel_doc* device_info,
-                                       varnel_doc* datalog, varnel_doc* filter, varnel_doc* status,
-                                       int* check_meter);
+                                       varnel_doc* datalog, varnel_doc* filter, varnel_doc* status, int* check_meter);
 /* Erases the meter's memory. */
-VARNEL_API int32_t varnel_clear_meter(varnel_component* c, METER_REC* rec, varnel_doc* device_info,
-                                      varnel_doc* status);
+VARNEL_API int32_t varnel_clear_meter(varnel_component* c, METER_REC* rec, varnel_doc* device_info, varnel_doc* status);
 /* Releases the meter. */
 VARNEL_API int32_t varnel_close_meter(varnel_component* c, METER_REC* rec);
 

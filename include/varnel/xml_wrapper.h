@@ -129,8 +129,7 @@ public:
     //     so a caller can nest deeper: AddChildElement("Lvl", "Strip") then
     //     AddChildElement("Note", "Lvl") puts Note under that Lvl;
     //   - no element of that name below the last added element: missing_object.
-    void AddChildElement(const std::string& name, const std::string& parentName = "",
-                         const std::string& text = "");
+    void AddChildElement(const std::string& name, const std::string& parentName = "", const std::string& text = "");
     // The document element becomes current.
     void MoveToRoot();
     // The first child called `name` of the current element becomes current.

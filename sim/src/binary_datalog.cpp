@@ -17,14 +17,15 @@ namespace varnel::sim {
 namespace detail {
 namespace {
 
+// clang-format off
 #define I8(f) Field{#f, Width::I8, &RECORD_DATA::f, 0}
 #define I16(f) Field{#f, Width::I16, &RECORD_DATA::f, 0}
 #define H(f) Field{#f, Width::Hundredths, nullptr, offsetof(RECORD_DATA, f)}
+// clang-format on
 
-const Field kGlucose[] = {I16(reading),     I8(controlFlag),  I8(alternateSiteFlag),
-                          I8(dietLabel),    I8(exerciseLabel), I8(stressFlag),
-                          I8(feelHypoFlag), I8(illnessFlag),   I8(mensesFlag),
-                          I8(vacationFlag), I8(otherFlag)};
+const Field kGlucose[] = {I16(reading),      I8(controlFlag),  I8(alternateSiteFlag), I8(dietLabel),
+                          I8(exerciseLabel), I8(stressFlag),   I8(feelHypoFlag),      I8(illnessFlag),
+                          I8(mensesFlag),    I8(vacationFlag), I8(otherFlag)};
 const Field kOralMed[] = {I8(oralMedType), H(oralMedDosage)};
 const Field kInsulin[] = {I8(InsulinType), H(insulinDosage)};
 const Field kBolus[] = {H(bolusSetting)};
@@ -38,20 +39,50 @@ const Field kCholesterolLdlHdl[] = {I16(cholesterolLDL), I16(cholesterolHDL)};
 const Field kCholesterolTotalTrig[] = {I16(cholesterolTotal), I16(cholesterolTriglyceride)};
 const Field kBloodPressure[] = {I16(bloodPressureSystole), I16(bloodPressureDiastole)};
 const Field kWeightHeight[] = {H(weight), H(height)};
-const Field kHealthNotes[] = {I8(stressFlag),  I8(feelHypoFlag), I8(illnessFlag),
-                              I8(mensesFlag),  I8(vacationFlag), I8(otherFlag)};
+const Field kHealthNotes[] = {I8(stressFlag), I8(feelHypoFlag), I8(illnessFlag),
+                              I8(mensesFlag), I8(vacationFlag), I8(otherFlag)};
 const Field kVisit[] = {I8(visit)};
 const Field kExercise[] = {I8(ExerciseLevel), I16(exerciseDuration)};
 const Field kCalCode[] = {I16(oldCalCode), I16(newCalCode)};
 
 const Field kAll[] = {
-    I16(reading), I16(controlFlag), I16(alternateSiteFlag), I16(dietLabel), I16(exerciseLabel),
-    I16(stressFlag), I16(feelHypoFlag), I16(illnessFlag), I16(mensesFlag), I16(vacationFlag),
-    I16(otherFlag), I16(mealSegment), I16(carbs), I16(fats), I16(calories), I16(protein), I16(ketones),
-    H(hbA1C), I16(microalbumin), I16(cholesterolLDL), I16(cholesterolHDL), I16(cholesterolTotal),
-    I16(cholesterolTriglyceride), I16(bloodPressureSystole), I16(bloodPressureDiastole), H(weight),
-    H(height), I16(visit), I16(oralMedType), H(oralMedDosage), I16(InsulinType), H(insulinDosage),
-    H(bolusSetting), H(dailyTotalSetting), I16(ExerciseLevel), I16(exerciseDuration), I16(oldCalCode),
+    I16(reading),
+    I16(controlFlag),
+    I16(alternateSiteFlag),
+    I16(dietLabel),
+    I16(exerciseLabel),
+    I16(stressFlag),
+    I16(feelHypoFlag),
+    I16(illnessFlag),
+    I16(mensesFlag),
+    I16(vacationFlag),
+    I16(otherFlag),
+    I16(mealSegment),
+    I16(carbs),
+    I16(fats),
+    I16(calories),
+    I16(protein),
+    I16(ketones),
+    H(hbA1C),
+    I16(microalbumin),
+    I16(cholesterolLDL),
+    I16(cholesterolHDL),
+    I16(cholesterolTotal),
+    I16(cholesterolTriglyceride),
+    I16(bloodPressureSystole),
+    I16(bloodPressureDiastole),
+    H(weight),
+    H(height),
+    I16(visit),
+    I16(oralMedType),
+    H(oralMedDosage),
+    I16(InsulinType),
+    H(insulinDosage),
+    H(bolusSetting),
+    H(dailyTotalSetting),
+    I16(ExerciseLevel),
+    I16(exerciseDuration),
+    I16(oldCalCode),
     I16(newCalCode),
 };
 
@@ -160,11 +191,10 @@ std::int64_t get(const std::uint8_t*& p, std::size_t bytes) {
     return static_cast<std::int64_t>(v << shift) >> shift;
 }
 
-[[noreturn]] void refuse(std::size_t index, const RECORD_DATA& r, const char* field,
-                         const std::string& value, const char* why) {
-    throw std::invalid_argument("binary record " + std::to_string(index) + " (type " +
-                                std::to_string(r.recType) + "): " + field +
-                                (value.empty() ? "" : " " + value) + " " + why);
+[[noreturn]] void refuse(std::size_t index, const RECORD_DATA& r, const char* field, const std::string& value,
+                         const char* why) {
+    throw std::invalid_argument("binary record " + std::to_string(index) + " (type " + std::to_string(r.recType) +
+                                "): " + field + (value.empty() ? "" : " " + value) + " " + why);
 }
 
 // The stored form of one field, refusing what the width cannot hold exactly.
@@ -188,8 +218,7 @@ std::int64_t storedValue(std::size_t index, const RECORD_DATA& r, const Field& f
 const std::uint8_t* recordAt(const METER_BIN_DATALOG& d, int index) {
     const std::uint8_t* table = d.binBuf + kHeaderSize + 2 * index;
     const std::size_t offset = table[0] | (table[1] << 8);
-    if (offset < kHeaderSize + 2 * std::size_t(d.recordCount) || offset + kRecordFrame > kBufSize)
-        return nullptr;
+    if (offset < kHeaderSize + 2 * std::size_t(d.recordCount) || offset + kRecordFrame > kBufSize) return nullptr;
     return d.binBuf + offset;
 }
 
@@ -204,9 +233,8 @@ std::size_t encodedSize(const std::vector<RECORD_DATA>& records) {
 void encodeBinaryDatalog(const std::vector<RECORD_DATA>& records, METER_BIN_DATALOG& datalog) {
     const std::size_t size = encodedSize(records);
     if (size > kBufSize || records.size() > 32767)
-        throw std::length_error(std::to_string(records.size()) + " binary records need " +
-                                std::to_string(size) + " bytes; the datalog holds " +
-                                std::to_string(kBufSize));
+        throw std::length_error(std::to_string(records.size()) + " binary records need " + std::to_string(size) +
+                                " bytes; the datalog holds " + std::to_string(kBufSize));
     std::uint8_t buf[kBufSize] = {};
     std::memcpy(buf, kMagic, kHeaderSize);
     std::uint8_t* table = buf + kHeaderSize;
@@ -237,8 +265,8 @@ void encodeBinaryDatalog(const std::vector<RECORD_DATA>& records, METER_BIN_DATA
 }
 
 std::int16_t decodeBinaryRecord(const METER_BIN_DATALOG& d, int index, RECORD_DATA& record) {
-    if (d.recordCount < 0 || std::size_t(d.recordCount) > (kBufSize - kHeaderSize) / 2 ||
-        index < 0 || index >= d.recordCount)
+    if (d.recordCount < 0 || std::size_t(d.recordCount) > (kBufSize - kHeaderSize) / 2 || index < 0 ||
+        index >= d.recordCount)
         return ME_BAD_PARAMETER;
     if (std::memcmp(d.binBuf, kMagic, kHeaderSize) != 0) return ME_VALIDATION_ERROR;
     const std::uint8_t* start = recordAt(d, index);

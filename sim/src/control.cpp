@@ -47,13 +47,21 @@ VX_API int vxsim_save_profile(const char* path) {
     return control([&] { writeProfileFile(meter(), text(path, "profile path")); });
 }
 
-VX_API int vxsim_reset(void) { return control([] { reset(); }); }
+VX_API int vxsim_reset(void) {
+    return control([] { reset(); });
+}
 
-VX_API int vxsim_select_type(int type) { return control([&] { selectType(type); }); }
+VX_API int vxsim_select_type(int type) {
+    return control([&] { selectType(type); });
+}
 
-VX_API int vxsim_attach(void) { return control([] { attach(); }); }
+VX_API int vxsim_attach(void) {
+    return control([] { attach(); });
+}
 
-VX_API int vxsim_detach(void) { return control([] { detach(); }); }
+VX_API int vxsim_detach(void) {
+    return control([] { detach(); });
+}
 
 VX_API int vxsim_fail_call(const char* function, int nth, int code, int persistent) {
     return control([&] {
@@ -62,7 +70,9 @@ VX_API int vxsim_fail_call(const char* function, int nth, int code, int persiste
     });
 }
 
-VX_API int vxsim_clear_faults(void) { return control([] { clearFaults(); }); }
+VX_API int vxsim_clear_faults(void) {
+    return control([] { clearFaults(); });
+}
 
 VX_API int vxsim_set_serial(const char* serial) {
     return control([&] { setSerial(text(serial, "serial number")); });

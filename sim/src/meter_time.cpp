@@ -28,12 +28,11 @@ int daysInMonth(int y, int m) {
 }  // namespace
 
 std::int32_t toSeconds(const TIME_REC& t) {
-    if (t.year < 1970 || t.mon < 1 || t.mon > 12 || t.mday < 1 ||
-        t.mday > daysInMonth(t.year, t.mon) || t.hour < 0 || t.hour > 23 || t.min < 0 ||
-        t.min > 59 || t.sec < 0 || t.sec > 59)
+    if (t.year < 1970 || t.mon < 1 || t.mon > 12 || t.mday < 1 || t.mday > daysInMonth(t.year, t.mon) || t.hour < 0 ||
+        t.hour > 23 || t.min < 0 || t.min > 59 || t.sec < 0 || t.sec > 59)
         return -1;
-    const std::int64_t s = daysFromCivil(t.year, unsigned(t.mon), unsigned(t.mday)) * 86400 +
-                           t.hour * 3600 + t.min * 60 + t.sec;
+    const std::int64_t s =
+        daysFromCivil(t.year, unsigned(t.mon), unsigned(t.mday)) * 86400 + t.hour * 3600 + t.min * 60 + t.sec;
     return s > std::numeric_limits<std::int32_t>::max() ? -1 : static_cast<std::int32_t>(s);
 }
 

@@ -31,8 +31,7 @@ struct Source {
     [[noreturn]] void fail(pugi::xml_node node, const std::string& problem) const {
         const std::ptrdiff_t offset = node ? node.offset_debug() : -1;
         std::string where = path;
-        if (offset >= 0)
-            where += ":" + std::to_string(1 + std::count(text.begin(), text.begin() + offset, '\n'));
+        if (offset >= 0) where += ":" + std::to_string(1 + std::count(text.begin(), text.begin() + offset, '\n'));
         throw std::runtime_error(where + ": " + problem);
     }
 };
@@ -78,7 +77,8 @@ public:
             return *fallback;
         }
         long v = 0;
-        if (!parseNumber(std::string_view(text), v)) fail(std::string(name) + " \"" + text + "\" is not a whole number");
+        if (!parseNumber(std::string_view(text), v))
+            fail(std::string(name) + " \"" + text + "\" is not a whole number");
         if (v < lo || v > hi)
             fail(std::string(name) + " " + text + " is outside " + std::to_string(lo) + ".." + std::to_string(hi));
         return static_cast<T>(v);
@@ -135,7 +135,8 @@ public:
     // Every attribute taken; no text where none belongs.
     void done(bool textAllowed = false) {
         for (pugi::xml_attribute a : node_.attributes())
-            if (!used_.count(a.name())) fail(std::string("unknown attribute ") + a.name() + " on <" + node_.name() + ">");
+            if (!used_.count(a.name()))
+                fail(std::string("unknown attribute ") + a.name() + " on <" + node_.name() + ">");
         if (!textAllowed)
             for (pugi::xml_node c : node_.children())
                 if (c.type() == pugi::node_pcdata || c.type() == pugi::node_cdata)
@@ -358,8 +359,10 @@ MeterProfile readProfileFile(const std::string& path) {
     pugi::xml_document doc;
     const pugi::xml_parse_result parsed = doc.load_buffer(src.text.data(), src.text.size());
     if (!parsed) {
-        const auto line = 1 + std::count(src.text.begin(), src.text.begin() + std::min<std::ptrdiff_t>(
-                                                                   parsed.offset, std::ptrdiff_t(src.text.size())), '\n');
+        const auto line =
+            1 + std::count(src.text.begin(),
+                           src.text.begin() + std::min<std::ptrdiff_t>(parsed.offset, std::ptrdiff_t(src.text.size())),
+                           '\n');
         throw std::runtime_error(path + ":" + std::to_string(line) + ": " + parsed.description());
     }
     pugi::xml_node root = doc.document_element();
@@ -466,10 +469,13 @@ MeterProfile readProfileFile(const std::string& path) {
 
 void writeProfileFile(const MeterProfile& p, const std::string& path) {
     // A file the reader would refuse is not written.
-    for (const auto& [what, text] : {std::pair{"serial", &p.serial}, {"identitySerial", &p.identitySerial},
-                                     {"firmware", &p.firmware}, {"name", &p.name}}) {
+    for (const auto& [what, text] : {std::pair{"serial", &p.serial},
+                                     {"identitySerial", &p.identitySerial},
+                                     {"firmware", &p.firmware},
+                                     {"name", &p.name}}) {
         const std::string problem = varnel::detail::xmlTextProblem(*text);
-        if (!problem.empty()) throw std::runtime_error(path + ": " + what + " cannot be written as XML text: " + problem);
+        if (!problem.empty())
+            throw std::runtime_error(path + ": " + what + " cannot be written as XML text: " + problem);
     }
     pugi::xml_document doc;
     pugi::xml_node m = doc.append_child("meter");

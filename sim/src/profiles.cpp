@@ -44,6 +44,7 @@ constexpr OptionRow kNewLang{eTranslateNewLang, 2, 0, 0, 1};
 constexpr OptionRow kOnOff(std::int16_t index, std::int16_t value = 0) { return {index, 2, value, 0, 1}; }
 constexpr OptionRow kLanguage(std::int16_t max) { return {eLanguage, 2, 0, 0, max}; }
 
+// clang-format off
 const TypeSpec kTypes[] = {
     {eCVTarnConsumerMeter, "TRN1000482", "TR0412 11/20/98", "Corvia Tarn", 250, 9600,
      {2004, 6, 15, 9, 30, 0}, 0, {87, 137, 0}, {20, 600, -1, 1023},
@@ -87,6 +88,7 @@ const TypeSpec kTypes[] = {
      {2009, 5, 22, 19, 40, 0}, 1, {0, 0, 0}, {20, 600, -1, 1023},
      {}, {}, {}, {kFixedUnits, {eTimeFormat, 2, 1, 0, 1}}, 100},
 };
+// clang-format on
 
 // Earliest and latest clock value each type accepts.
 struct ClockRange {
@@ -94,12 +96,17 @@ struct ClockRange {
 };
 ClockRange clockRange(int type) {
     switch (type) {
-        case 1: return {1990, 2014};
-        case 2:
-        case 3: return {1992, 2022};
-        case 4: return {1997, 2015};
-        case 5: return {1996, 2026};
-        default: return {2000, 2020};
+    case 1:
+        return {1990, 2014};
+    case 2:
+    case 3:
+        return {1992, 2022};
+    case 4:
+        return {1997, 2015};
+    case 5:
+        return {1996, 2026};
+    default:
+        return {2000, 2020};
     }
 }
 
@@ -132,33 +139,38 @@ std::vector<data_rec> recordDatalog(const TypeSpec& s, std::int32_t clock) {
         const std::int32_t t = clock - (s.records - i) * 6 * 3600 - rng.next(0, 3599);
         data_rec e = bloodTest(t, static_cast<std::int16_t>(rng.next(62, 245)), 0);
         switch (i % 20) {
-            case 3:  // above the reportable range
-                e.Test.Result = s.glucose[1];
-                e.Test.Flags = 1;
-                e.ResultApproximated = 1;
-                break;
-            case 7:  // below it
-                e.Test.Result = s.glucose[0];
-                e.Test.Flags = 2;
-                e.ResultApproximated = 1;
-                break;
-            case 9:  // control solution
-                e.Test.T_Type = 5;
-                e.Test.Result = static_cast<std::int16_t>(rng.next(100, 130));
-                break;
-            case 11:
-                if (strips) {
-                    e.Test.T_Type = 2;
-                    e.Test.Result = static_cast<std::int16_t>(rng.next(s.checkStrip[0], s.checkStrip[1]));
-                }
-                break;
-            case 13:  // meter error code
-                e.Test.Flags = 3;
-                e.Test.Result = static_cast<std::int16_t>(rng.next(1, 6));
-                break;
-            case 16: e.Valid = 1; break;
-            case 18: e.Test.Sample_detected = 1; break;
-            default: break;
+        case 3:  // above the reportable range
+            e.Test.Result = s.glucose[1];
+            e.Test.Flags = 1;
+            e.ResultApproximated = 1;
+            break;
+        case 7:  // below it
+            e.Test.Result = s.glucose[0];
+            e.Test.Flags = 2;
+            e.ResultApproximated = 1;
+            break;
+        case 9:  // control solution
+            e.Test.T_Type = 5;
+            e.Test.Result = static_cast<std::int16_t>(rng.next(100, 130));
+            break;
+        case 11:
+            if (strips) {
+                e.Test.T_Type = 2;
+                e.Test.Result = static_cast<std::int16_t>(rng.next(s.checkStrip[0], s.checkStrip[1]));
+            }
+            break;
+        case 13:  // meter error code
+            e.Test.Flags = 3;
+            e.Test.Result = static_cast<std::int16_t>(rng.next(1, 6));
+            break;
+        case 16:
+            e.Valid = 1;
+            break;
+        case 18:
+            e.Test.Sample_detected = 1;
+            break;
+        default:
+            break;
         }
         if (!s.events.empty() && i % 4 == 1)
             e.Test.Event_code = s.events[std::size_t(rng.next(0, int(s.events.size()) - 1))];
@@ -256,76 +268,77 @@ std::vector<RECORD_DATA> binaryDatalog(std::int32_t clock) {
             log.push_back(ex);
         }
         switch (d) {
-            case 2: {
-                RECORD_DATA k = binary(VX_REC_KETONES, day + 8 * 3600);
-                for (std::int16_t v = 0; v <= 4; ++v, k.timeStamp += 3600) {
-                    k.ketones = v;
-                    log.push_back(k);
-                }
-                break;
+        case 2: {
+            RECORD_DATA k = binary(VX_REC_KETONES, day + 8 * 3600);
+            for (std::int16_t v = 0; v <= 4; ++v, k.timeStamp += 3600) {
+                k.ketones = v;
+                log.push_back(k);
             }
-            case 4: {
-                RECORD_DATA a1c = binary(VX_REC_HBA1C, day + 10 * 3600);
-                a1c.hbA1C = 6.8;
-                log.push_back(a1c);
-                RECORD_DATA visit = binary(VX_REC_LAST_VISIT, day + 10 * 3600 + 60);
-                for (std::int16_t v = 0; v <= 2; ++v, visit.timeStamp += 60) {
-                    visit.visit = v;
-                    log.push_back(visit);
-                }
-                RECORD_DATA micro = binary(VX_REC_MICROALBUMIN, day + 10 * 3600 + 600);
-                for (std::int16_t v : {std::int16_t(-1), std::int16_t(0), std::int16_t(-2), std::int16_t(28)}) {
-                    micro.microalbumin = v;
-                    log.push_back(micro);
-                    micro.timeStamp += 60;
-                }
-                break;
+            break;
+        }
+        case 4: {
+            RECORD_DATA a1c = binary(VX_REC_HBA1C, day + 10 * 3600);
+            a1c.hbA1C = 6.8;
+            log.push_back(a1c);
+            RECORD_DATA visit = binary(VX_REC_LAST_VISIT, day + 10 * 3600 + 60);
+            for (std::int16_t v = 0; v <= 2; ++v, visit.timeStamp += 60) {
+                visit.visit = v;
+                log.push_back(visit);
             }
-            case 6:
-            case 15: {
-                RECORD_DATA ldl = binary(VX_REC_CHOLESTEROL_LDL_HDL, day + 11 * 3600);
-                ldl.cholesterolLDL = d == 6 ? 118 : -1;
-                ldl.cholesterolHDL = 52;
-                log.push_back(ldl);
-                RECORD_DATA total = binary(VX_REC_CHOLESTEROL_TOTAL_TRIG, ldl.timeStamp);
-                total.cholesterolTotal = 196;
-                total.cholesterolTriglyceride = d == 6 ? 141 : -1;
-                log.push_back(total);
-                break;
+            RECORD_DATA micro = binary(VX_REC_MICROALBUMIN, day + 10 * 3600 + 600);
+            for (std::int16_t v : {std::int16_t(-1), std::int16_t(0), std::int16_t(-2), std::int16_t(28)}) {
+                micro.microalbumin = v;
+                log.push_back(micro);
+                micro.timeStamp += 60;
             }
-            case 8:
-            case 16: {
-                RECORD_DATA bp = binary(VX_REC_BLOOD_PRESSURE, day + 9 * 3600 + 1800);
-                bp.bloodPressureSystole = static_cast<std::int16_t>(rng.next(112, 145));
-                bp.bloodPressureDiastole = d == 16 ? -1 : static_cast<std::int16_t>(rng.next(70, 92));
-                log.push_back(bp);
-                RECORD_DATA body = binary(VX_REC_WEIGHT_HEIGHT, day + 7 * 3600 + 120);
-                body.weight = d == 8 ? 182.4 : 180.6;
-                body.height = d == 8 ? 69.5 : -1.0;
-                log.push_back(body);
-                break;
-            }
-            case 10: {
-                RECORD_DATA notes = binary(VX_REC_HEALTH_NOTES, day + 21 * 3600);
-                notes.stressFlag = notes.illnessFlag = notes.otherFlag = 1;
-                log.push_back(notes);
-                RECORD_DATA more = binary(VX_REC_HEALTH_NOTES, day + 22 * 3600);
-                more.feelHypoFlag = more.mensesFlag = more.vacationFlag = 1;
-                log.push_back(more);
-                break;
-            }
-            case 12: {
-                RECORD_DATA code = binary(VX_REC_CAL_CODE, day + 6 * 3600);
-                code.oldCalCode = 4;
-                code.newCalCode = 11;
-                log.push_back(code);
-                RECORD_DATA control = binary(VX_REC_GLUCOSE, day + 6 * 3600 + 120);
-                control.reading = 121;
-                control.controlFlag = 1;
-                log.push_back(control);
-                break;
-            }
-            default: break;
+            break;
+        }
+        case 6:
+        case 15: {
+            RECORD_DATA ldl = binary(VX_REC_CHOLESTEROL_LDL_HDL, day + 11 * 3600);
+            ldl.cholesterolLDL = d == 6 ? 118 : -1;
+            ldl.cholesterolHDL = 52;
+            log.push_back(ldl);
+            RECORD_DATA total = binary(VX_REC_CHOLESTEROL_TOTAL_TRIG, ldl.timeStamp);
+            total.cholesterolTotal = 196;
+            total.cholesterolTriglyceride = d == 6 ? 141 : -1;
+            log.push_back(total);
+            break;
+        }
+        case 8:
+        case 16: {
+            RECORD_DATA bp = binary(VX_REC_BLOOD_PRESSURE, day + 9 * 3600 + 1800);
+            bp.bloodPressureSystole = static_cast<std::int16_t>(rng.next(112, 145));
+            bp.bloodPressureDiastole = d == 16 ? -1 : static_cast<std::int16_t>(rng.next(70, 92));
+            log.push_back(bp);
+            RECORD_DATA body = binary(VX_REC_WEIGHT_HEIGHT, day + 7 * 3600 + 120);
+            body.weight = d == 8 ? 182.4 : 180.6;
+            body.height = d == 8 ? 69.5 : -1.0;
+            log.push_back(body);
+            break;
+        }
+        case 10: {
+            RECORD_DATA notes = binary(VX_REC_HEALTH_NOTES, day + 21 * 3600);
+            notes.stressFlag = notes.illnessFlag = notes.otherFlag = 1;
+            log.push_back(notes);
+            RECORD_DATA more = binary(VX_REC_HEALTH_NOTES, day + 22 * 3600);
+            more.feelHypoFlag = more.mensesFlag = more.vacationFlag = 1;
+            log.push_back(more);
+            break;
+        }
+        case 12: {
+            RECORD_DATA code = binary(VX_REC_CAL_CODE, day + 6 * 3600);
+            code.oldCalCode = 4;
+            code.newCalCode = 11;
+            log.push_back(code);
+            RECORD_DATA control = binary(VX_REC_GLUCOSE, day + 6 * 3600 + 120);
+            control.reading = 121;
+            control.controlFlag = 1;
+            log.push_back(control);
+            break;
+        }
+        default:
+            break;
         }
     }
     for (std::size_t i = 0; i < log.size(); ++i) log[i].Ordinal = static_cast<std::int16_t>(i + 1);
@@ -345,8 +358,7 @@ std::vector<NameSlot> names(std::initializer_list<const char*> fixed, std::initi
 
 void checkRange(const std::string& what, long v, long lo, long hi) {
     if (v < lo || v > hi)
-        invalid(what + " " + std::to_string(v) + " is outside " + std::to_string(lo) + ".." +
-                std::to_string(hi));
+        invalid(what + " " + std::to_string(v) + " is outside " + std::to_string(lo) + ".." + std::to_string(hi));
 }
 
 void checkText(const std::string& what, const std::string& text, std::size_t max, bool required) {
@@ -371,26 +383,24 @@ bool sameEntry(const data_rec& a, const data_rec& b) {
     const TEST_REC &x = a.Test, &y = b.Test;
     return a.D_Type == b.D_Type && a.Valid == b.Valid && a.ResultApproximated == b.ResultApproximated &&
            a.D_Time == b.D_Time && x.Result == y.Result && x.Sample_detected == y.Sample_detected &&
-           x.Medication == y.Medication && x.Event_code == y.Event_code && x.Flags == y.Flags &&
-           x.T_Type == y.T_Type;
+           x.Medication == y.Medication && x.Event_code == y.Event_code && x.Flags == y.Flags && x.T_Type == y.T_Type;
 }
-
 
 }  // namespace
 
 bool MeterProfile::operator==(const MeterProfile& o) const {
     auto key = [](const MeterProfile& p) {
         return std::tie(p.type, p.port, p.serial, p.identitySerial, p.firmware, p.name, p.wireBaud, p.options,
-                        p.languages, p.events, p.insulinKinds, p.checkStripLow, p.checkStripHigh,
-                        p.checkStripApprox, p.glucoseLow, p.glucoseHigh, p.glucoseErrorLow, p.glucoseErrorHigh,
-                        p.plasmaCalibrated, p.clock, p.initializedFlag, p.maxRecords, p.corruptedRecords,
-                        p.insulinNames, p.oralMedNames, p.favoriteInsulins, p.favoriteOralMeds,
-                        p.scheduleSelection, p.mealSegments, p.targets, p.attached);
+                        p.languages, p.events, p.insulinKinds, p.checkStripLow, p.checkStripHigh, p.checkStripApprox,
+                        p.glucoseLow, p.glucoseHigh, p.glucoseErrorLow, p.glucoseErrorHigh, p.plasmaCalibrated, p.clock,
+                        p.initializedFlag, p.maxRecords, p.corruptedRecords, p.insulinNames, p.oralMedNames,
+                        p.favoriteInsulins, p.favoriteOralMeds, p.scheduleSelection, p.mealSegments, p.targets,
+                        p.attached);
     };
     return key(*this) == key(o) &&
            std::equal(datalog.begin(), datalog.end(), o.datalog.begin(), o.datalog.end(), sameEntry) &&
-           std::equal(binaryDatalog.begin(), binaryDatalog.end(), o.binaryDatalog.begin(),
-                      o.binaryDatalog.end(), detail::sameRecord);
+           std::equal(binaryDatalog.begin(), binaryDatalog.end(), o.binaryDatalog.begin(), o.binaryDatalog.end(),
+                      detail::sameRecord);
 }
 
 MeterProfile defaultProfile(int type) {
@@ -419,11 +429,10 @@ MeterProfile defaultProfile(int type) {
     if (p.usesBinaryDatalog()) {
         p.binaryDatalog = binaryDatalog(p.clock);
         p.initializedFlag = 1;
-        p.insulinNames = names({"Regular", "NPH", "Lente", "UltraLnt", "70/30", "75/25", "50/50",
-                                "Rapid", "LongAct", "Premix"},
-                               {"MyBasal", "Pen 2"}, kInsulinSlots);
-        p.oralMedNames = names({"Metformn", "Sulfonyl", "Glinide", "TZD", "DPP4"}, {"Evening"},
-                               kOralMedSlots);
+        p.insulinNames =
+            names({"Regular", "NPH", "Lente", "UltraLnt", "70/30", "75/25", "50/50", "Rapid", "LongAct", "Premix"},
+                  {"MyBasal", "Pen 2"}, kInsulinSlots);
+        p.oralMedNames = names({"Metformn", "Sulfonyl", "Glinide", "TZD", "DPP4"}, {"Evening"}, kOralMedSlots);
         p.favoriteInsulins = {8, 2, 11};
         p.favoriteOralMeds = {1, 6, 0, 0, 0};
         p.scheduleSelection = 1;
@@ -441,8 +450,7 @@ std::int32_t clockMax(int type) { return secondsOf(clockRange(type).lastYear, 12
 bool targetsValid(const TargetLimits& t) {
     auto in = [](int v, int lo, int hi) { return v >= lo && v <= hi; };
     return in(t.beforeLow, 60, 200) && in(t.beforeHigh, 60, 200) && in(t.afterLow, 60, 200) &&
-           in(t.afterHigh, 60, 200) && in(t.hypo, 50, 90) && t.beforeLow <= t.beforeHigh &&
-           t.afterLow <= t.afterHigh;
+           in(t.afterHigh, 60, 200) && in(t.hypo, 50, 90) && t.beforeLow <= t.beforeHigh && t.afterLow <= t.afterHigh;
 }
 }  // namespace detail
 
@@ -458,8 +466,7 @@ void validateProfile(const MeterProfile& p) {
     checkText("meter name", p.name, 40, false);
     static constexpr std::int32_t rates[] = {300, 600, 1200, 2400, 4800, 9600, 19200};
     if (std::find(std::begin(rates), std::end(rates), p.wireBaud) == std::end(rates))
-        invalid("wire speed " + std::to_string(p.wireBaud) +
-                " is not one of 300, 600, 1200, 2400, 4800, 9600, 19200");
+        invalid("wire speed " + std::to_string(p.wireBaud) + " is not one of 300, 600, 1200, 2400, 4800, 9600, 19200");
     if (p.languages.size() > 20) invalid("more than 20 languages");
     if (p.events.size() > 16) invalid("more than 16 event codes");
     if (p.insulinKinds.size() > 14) invalid("more than 14 insulin kinds");
@@ -470,8 +477,7 @@ void validateProfile(const MeterProfile& p) {
         if (o.availability == 0) continue;
         if (o.min > o.max) invalid(what + " has its minimum above its maximum");
         checkRange(what + " value", o.value, o.min, o.max);
-        if (i == eLanguage &&
-            std::find(p.languages.begin(), p.languages.end(), o.value) == p.languages.end())
+        if (i == eLanguage && std::find(p.languages.begin(), p.languages.end(), o.value) == p.languages.end())
             invalid("language " + std::to_string(o.value) + " is not in the language map");
     }
     checkRange("plasma calibration flag", p.plasmaCalibrated, 0, 1);
@@ -498,8 +504,7 @@ void validateProfile(const MeterProfile& p) {
         if (!damaged.insert(i).second) invalid("corrupted record " + std::to_string(i) + " listed twice");
     }
     if (!binary) {
-        if (!p.insulinNames.empty() || !p.oralMedNames.empty())
-            invalid("only a type-7 meter keeps medication names");
+        if (!p.insulinNames.empty() || !p.oralMedNames.empty()) invalid("only a type-7 meter keeps medication names");
         return;
     }
     checkNames("insulin", p.insulinNames, kInsulinSlots, kFirstCustomInsulin - 1);

@@ -38,8 +38,8 @@ struct TargetLimits {
 };
 
 inline constexpr int kOptionCount = 19;
-inline constexpr int kInsulinSlots = 21;     // 1-10 fixed, 11-21 custom
-inline constexpr int kOralMedSlots = 15;     // 1-5 fixed, 6-15 custom
+inline constexpr int kInsulinSlots = 21;  // 1-10 fixed, 11-21 custom
+inline constexpr int kOralMedSlots = 15;  // 1-5 fixed, 6-15 custom
 inline constexpr int kFirstCustomInsulin = 11;
 inline constexpr int kFirstCustomOralMed = 6;
 
@@ -62,10 +62,10 @@ struct MeterProfile {
     std::int16_t plasmaCalibrated = 0;  // Plasma_cal_flag: 0 whole blood, 1 plasma
     std::int32_t clock = 0;             // meter clock, transport seconds
     std::int16_t initializedFlag = 0;
-    std::int16_t maxRecords = 255;      // memory capacity in records
-    std::vector<data_rec> datalog;          // record datalog (every type but 7)
-    std::vector<RECORD_DATA> binaryDatalog; // binary datalog (type 7)
-    std::vector<int> corruptedRecords;      // binary records damaged in the meter's memory
+    std::int16_t maxRecords = 255;           // memory capacity in records
+    std::vector<data_rec> datalog;           // record datalog (every type but 7)
+    std::vector<RECORD_DATA> binaryDatalog;  // binary datalog (type 7)
+    std::vector<int> corruptedRecords;       // binary records damaged in the meter's memory
     // Type 7 only: medication names, favourites, meal schedule and targets.
     std::vector<NameSlot> insulinNames;  // kInsulinSlots entries, position p at p - 1
     std::vector<NameSlot> oralMedNames;  // kOralMedSlots entries
@@ -93,7 +93,7 @@ MeterProfile readProfileFile(const std::string& path);
 void writeProfileFile(const MeterProfile& profile, const std::string& path);
 
 // Transport seconds (from 1 January 1970 00:00:00, local meter time) and calendar time.
-std::int32_t toSeconds(const TIME_REC& time);  // -1 when the record is not a valid time
+std::int32_t toSeconds(const TIME_REC& time);            // -1 when the record is not a valid time
 bool fromSeconds(std::int32_t seconds, TIME_REC& time);  // false for negative seconds
 std::int32_t secondsOf(int year, int month, int day, int hour = 0, int minute = 0, int second = 0);
 

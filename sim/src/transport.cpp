@@ -17,9 +17,9 @@ using varnel::sim::detail::state;
 namespace {
 
 constexpr std::int32_t kPortHandleBase = 0x4000;
-constexpr std::size_t kFrameBytes = 32;        // command and acknowledgement of a long operation
-constexpr std::size_t kEntryBytes = 16;        // one record-datalog entry on the line
-constexpr std::uint32_t kEraseMs = 1500;       // the meter wiping its memory
+constexpr std::size_t kFrameBytes = 32;   // command and acknowledgement of a long operation
+constexpr std::size_t kEntryBytes = 16;   // one record-datalog entry on the line
+constexpr std::uint32_t kEraseMs = 1500;  // the meter wiping its memory
 
 // Runs one transport call: counts it, refuses missing records, applies a due
 // fault (changing nothing else) and records a failure in Error_code.
@@ -145,16 +145,15 @@ void identify(State& s, METER_REC& rec) {
 bool valueFits(const MeterProfile& m, int option, std::int16_t value) {
     const OptionEntry& o = m.options[std::size_t(option)];
     if (value < o.min || value > o.max) return false;
-    return option != eLanguage ||
-           std::find(m.languages.begin(), m.languages.end(), value) != m.languages.end();
+    return option != eLanguage || std::find(m.languages.begin(), m.languages.end(), value) != m.languages.end();
 }
 
 std::int32_t computerTime() {
     const std::time_t now = std::time(nullptr);
     std::tm local{};
     localtime_r(&now, &local);
-    return secondsOf(local.tm_year + 1900, local.tm_mon + 1, local.tm_mday, local.tm_hour,
-                     local.tm_min, std::min(local.tm_sec, 59));
+    return secondsOf(local.tm_year + 1900, local.tm_mon + 1, local.tm_mday, local.tm_hour, local.tm_min,
+                     std::min(local.tm_sec, 59));
 }
 
 void stampUpload(State& s, METER_REC& rec) {
@@ -184,8 +183,7 @@ std::int16_t getName(State& s, METER_REC& rec, INSULIN_OR_ORAL_MED_NAME_TYPE* na
 std::int16_t setName(State& s, METER_REC& rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name, NameTable table) {
     if (std::int16_t r = reachMorvex(s, rec)) return r;
     auto& slots = s.meter().*table.slots;
-    if (!name || name->index < table.firstCustom || name->index > int(slots.size()))
-        return ME_BAD_PARAMETER;
+    if (!name || name->index < table.firstCustom || name->index > int(slots.size())) return ME_BAD_PARAMETER;
     const auto* bytes = reinterpret_cast<const char*>(name->nameStr);
     slots[std::size_t(name->index - 1)].bytes.assign(bytes, strnlen(bytes, sizeof name->nameStr));
     return ME_SUCCESS;
@@ -392,13 +390,11 @@ VX_API std::int16_t SetInsulinName(METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE
 }
 
 VX_API std::int16_t GetOralMedicationName(METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name) {
-    return call("GetOralMedicationName", rec,
-                [&](State& s, METER_REC& r) { return getName(s, r, name, kOralMeds); });
+    return call("GetOralMedicationName", rec, [&](State& s, METER_REC& r) { return getName(s, r, name, kOralMeds); });
 }
 
 VX_API std::int16_t SetOralMedicationName(METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name) {
-    return call("SetOralMedicationName", rec,
-                [&](State& s, METER_REC& r) { return setName(s, r, name, kOralMeds); });
+    return call("SetOralMedicationName", rec, [&](State& s, METER_REC& r) { return setName(s, r, name, kOralMeds); });
 }
 
 VX_API std::int16_t GetPredefinedInsulins(METER_REC* rec, PREDEFINED_INSULINS_TYPE* insulins) {
@@ -412,8 +408,8 @@ VX_API std::int16_t GetPredefinedInsulins(METER_REC* rec, PREDEFINED_INSULINS_TY
 
 VX_API std::int16_t SetPredefinedInsulins(METER_REC* rec, PREDEFINED_INSULINS_TYPE* insulins) {
     return call("SetPredefinedInsulins", rec, [&](State& s, METER_REC& r) {
-        return setFavorites(s, r, insulins ? insulins->InsulinType : nullptr,
-                            &MeterProfile::favoriteInsulins, kInsulinSlots);
+        return setFavorites(s, r, insulins ? insulins->InsulinType : nullptr, &MeterProfile::favoriteInsulins,
+                            kInsulinSlots);
     });
 }
 
@@ -428,8 +424,7 @@ VX_API std::int16_t GetPredefinedOralMeds(METER_REC* rec, PREDEFINED_ORAL_MEDS_T
 
 VX_API std::int16_t SetPredefinedOralMeds(METER_REC* rec, PREDEFINED_ORAL_MEDS_TYPE* meds) {
     return call("SetPredefinedOralMeds", rec, [&](State& s, METER_REC& r) {
-        return setFavorites(s, r, meds ? meds->oralMedType : nullptr, &MeterProfile::favoriteOralMeds,
-                            kOralMedSlots);
+        return setFavorites(s, r, meds ? meds->oralMedType : nullptr, &MeterProfile::favoriteOralMeds, kOralMedSlots);
     });
 }
 
@@ -474,8 +469,8 @@ VX_API std::int16_t SetScheduleSelection(METER_REC* rec, std::int16_t selection)
     });
 }
 
-VX_API std::int16_t GetTargetRange(METER_REC* rec, std::int16_t* befLow, std::int16_t* befHigh,
-                                   std::int16_t* aftLow, std::int16_t* aftHigh, std::int16_t* hypo) {
+VX_API std::int16_t GetTargetRange(METER_REC* rec, std::int16_t* befLow, std::int16_t* befHigh, std::int16_t* aftLow,
+                                   std::int16_t* aftHigh, std::int16_t* hypo) {
     return call("GetTargetRange", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
         if (!befLow || !befHigh || !aftLow || !aftHigh || !hypo) return ME_BAD_PARAMETER;
@@ -489,8 +484,8 @@ VX_API std::int16_t GetTargetRange(METER_REC* rec, std::int16_t* befLow, std::in
     });
 }
 
-VX_API std::int16_t SetTargetRange(METER_REC* rec, std::int16_t befLow, std::int16_t befHigh,
-                                   std::int16_t aftLow, std::int16_t aftHigh, std::int16_t hypo) {
+VX_API std::int16_t SetTargetRange(METER_REC* rec, std::int16_t befLow, std::int16_t befHigh, std::int16_t aftLow,
+                                   std::int16_t aftHigh, std::int16_t hypo) {
     return call("SetTargetRange", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
         const TargetLimits t{befLow, befHigh, aftLow, aftHigh, hypo};
@@ -512,8 +507,7 @@ VX_API std::int16_t GetMeterDatalog(METER_REC* rec, METER_BIN_DATALOG* datalog, 
         std::int16_t damaged = 0;
         for (std::size_t i = 0; i < m.binaryDatalog.size(); ++i) {
             if (m.binaryDatalog[i].timeStamp < startSeconds) continue;
-            if (std::find(m.corruptedRecords.begin(), m.corruptedRecords.end(), int(i)) !=
-                m.corruptedRecords.end()) {
+            if (std::find(m.corruptedRecords.begin(), m.corruptedRecords.end(), int(i)) != m.corruptedRecords.end()) {
                 ++damaged;
                 continue;
             }
@@ -536,16 +530,15 @@ VX_API std::int16_t GetMeterDatalog(METER_REC* rec, METER_BIN_DATALOG* datalog, 
             const auto upTo = static_cast<std::size_t>(fraction * double(size));
             std::memcpy(datalog->binBuf + copied, image->binBuf + copied, upTo - copied);
             copied = upTo;
-            datalog->recordCount = static_cast<std::int16_t>(
-                std::upper_bound(ends.begin(), ends.end(), copied) - ends.begin());
+            datalog->recordCount =
+                static_cast<std::int16_t>(std::upper_bound(ends.begin(), ends.end(), copied) - ends.begin());
         });
         stampUpload(s, r);
         return ME_SUCCESS;
     });
 }
 
-VX_API std::int16_t GetMeterDatalogRecordData(METER_BIN_DATALOG* datalog, std::int16_t index,
-                                              RECORD_DATA* record) {
+VX_API std::int16_t GetMeterDatalogRecordData(METER_BIN_DATALOG* datalog, std::int16_t index, RECORD_DATA* record) {
     return callWithoutRecord("GetMeterDatalogRecordData", [&](State&) -> std::int16_t {
         if (!datalog || !record) return ME_BAD_PARAMETER;
         return decodeBinaryRecord(*datalog, index, *record);

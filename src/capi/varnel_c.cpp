@@ -135,15 +135,15 @@ int32_t varnel_discover_device(varnel_component* c, METER_REC* rec, varnel_doc* 
     });
 }
 
-int32_t varnel_set_device_settings(varnel_component* c, METER_REC* rec, varnel_doc* device_info,
-                                   varnel_doc* device_cfg, varnel_doc* status) {
+int32_t varnel_set_device_settings(varnel_component* c, METER_REC* rec, varnel_doc* device_info, varnel_doc* device_cfg,
+                                   varnel_doc* status) {
     return request(c, rec && device_info && device_cfg && status, [&](DllWrapper& w) {
         return w.setDeviceSettings(*rec, device_info->xml, device_cfg->xml, status->xml);
     });
 }
 
-int32_t varnel_get_device_settings(varnel_component* c, METER_REC* rec, varnel_doc* device_info,
-                                   varnel_doc* device_cfg, int fetch_all, varnel_doc* status, int* check_meter) {
+int32_t varnel_get_device_settings(varnel_component* c, METER_REC* rec, varnel_doc* device_info, varnel_doc* device_cfg,
+                                   int fetch_all, varnel_doc* status, int* check_meter) {
     return request(c, rec && device_info && device_cfg && status, [&](DllWrapper& w) {
         bool check = false;
         const std::int32_t result =
@@ -153,8 +153,8 @@ int32_t varnel_get_device_settings(varnel_component* c, METER_REC* rec, varnel_d
     });
 }
 
-int32_t varnel_get_device_caps(varnel_component* c, METER_REC* rec, varnel_doc* device_info,
-                               varnel_doc* device_caps, int fetch_all, varnel_doc* status, int* check_meter) {
+int32_t varnel_get_device_caps(varnel_component* c, METER_REC* rec, varnel_doc* device_info, varnel_doc* device_caps,
+                               int fetch_all, varnel_doc* status, int* check_meter) {
     return request(c, rec && device_info && device_caps && status, [&](DllWrapper& w) {
         bool check = false;
         const std::int32_t result =
@@ -169,8 +169,8 @@ int32_t varnel_get_readings(varnel_component* c, METER_REC* rec, varnel_doc* dev
     return request(c, rec && device_info && datalog && status, [&](DllWrapper& w) {
         XMLWrapper noFilter;
         bool check = false;
-        const std::int32_t result = w.getReadings(*rec, device_info->xml, datalog->xml,
-                                                  filter ? filter->xml : noFilter, status->xml, check);
+        const std::int32_t result =
+            w.getReadings(*rec, device_info->xml, datalog->xml, filter ? filter->xml : noFilter, status->xml, check);
         if (check_meter) *check_meter = check;
         return result;
     });
@@ -209,8 +209,6 @@ void varnel_on_complete(varnel_component* c, void (*fn)(void* user), void* user)
 
 int32_t varnel_error_number(const varnel_component* c) { return c && c->hasError ? c->errorNumber : 0; }
 
-const char* varnel_error_text(const varnel_component* c) {
-    return c && c->hasError ? c->errorText.c_str() : nullptr;
-}
+const char* varnel_error_text(const varnel_component* c) { return c && c->hasError ? c->errorText.c_str() : nullptr; }
 
 }  // extern "C"

@@ -45,8 +45,8 @@ class TableTransport final : public Transport {
 public:
     explicit TableTransport(std::function<TransportFunctions()> load) : load_(std::move(load)) {}
 
-#define VARNEL_FORWARD(ret, name, ...)                                    \
-    ret name(VARNEL_CXX_PARAMS(__VA_ARGS__)) override {                   \
+#define VARNEL_FORWARD(ret, name, ...)                                             \
+    ret name(VARNEL_CXX_PARAMS(__VA_ARGS__)) override {                            \
         return call(&TransportFunctions::name VX_EACH(VARNEL_C_ARG, __VA_ARGS__)); \
     }
     VX_METER_FUNCTIONS(VARNEL_FORWARD)
@@ -103,8 +103,8 @@ public:
         }
         if (!handle_) {
             // One path reads as before; several name each place looked at.
-            const std::string what = paths_.size() == 1 ? "Cannot load the transport library "
-                                                        : "Cannot find the transport library; tried ";
+            const std::string what =
+                paths_.size() == 1 ? "Cannot load the transport library " : "Cannot find the transport library; tried ";
             raise(errc::transport_unavailable, what + tried);
         }
         TransportFunctions f{};
@@ -124,8 +124,8 @@ private:
         if (!address && required) {
             const std::string reason = lastError();
             close();
-            raise(errc::transport_unavailable, "The transport library \"" + path_ + "\" has no function \"" +
-                                                   name + "\": " + reason);
+            raise(errc::transport_unavailable,
+                  "The transport library \"" + path_ + "\" has no function \"" + name + "\": " + reason);
         }
         return address;
     }

@@ -137,7 +137,10 @@ std::size_t cdataSize(std::string_view text) {
 std::size_t attributeSize(std::string_view name, std::string_view value) {
     std::size_t n = name.size() + 4;
     for (char c : value)
-        n += c == '"' || c == '\'' ? 6 : (c == '&' || c == '\t' || c == '\n' || c == '\r') ? 5 : (c == '<' || c == '>') ? 4 : 1;
+        n += c == '"' || c == '\''                               ? 6
+             : (c == '&' || c == '\t' || c == '\n' || c == '\r') ? 5
+             : (c == '<' || c == '>')                            ? 4
+                                                                 : 1;
     return n;
 }
 
@@ -275,9 +278,8 @@ struct XMLWrapper::Impl {
         pugi::xml_node c = cur(op);
         const std::int32_t count = childCount(c);
         if (index < 0 || index >= count)
-            raise(errc::subscript_out_of_range, std::string(op) + ": index " + std::to_string(index) +
-                                                    " outside the " + std::to_string(count) + " children of " +
-                                                    quote(c.name()));
+            raise(errc::subscript_out_of_range, std::string(op) + ": index " + std::to_string(index) + " outside the " +
+                                                    std::to_string(count) + " children of " + quote(c.name()));
         std::int32_t k = 0;
         pugi::xml_node n = firstElement(c);
         auto distance = [index](std::int32_t from) { return from > index ? from - index : index - from; };
@@ -364,14 +366,14 @@ struct XMLWrapper::Impl {
         if (r.status == pugi::status_out_of_memory) throw std::bad_alloc();
         if (!r || !fresh.document_element()) {
             // The check accepts only what pugixml reads; should they ever disagree, refuse.
-            lastLoadError = std::string(r ? "no document element" : r.description()) + " at offset " +
-                            std::to_string(r.offset);
+            lastLoadError =
+                std::string(r ? "no document element" : r.description()) + " at offset " + std::to_string(r.offset);
             return false;
         }
         const std::size_t written = writtenSize(fresh.document_element());
         if (written > kXmlMaxBytes) {
-            lastLoadError = "the document would be larger than the " + sizeLimitText() +
-                            " a document may have when written out";
+            lastLoadError =
+                "the document would be larger than the " + sizeLimitText() + " a document may have when written out";
             return false;
         }
 #ifdef PUGIXML_HAS_MOVE
@@ -461,8 +463,8 @@ void XMLWrapper::AddChildElement(const std::string& name, const std::string& par
                 found = walker.hit;
             }
             if (!found)
-                raise(errc::missing_object, "AddChildElement: no element " + quote(parentName) + " below " +
-                                                quote(d.lastAdded.name()));
+                raise(errc::missing_object,
+                      "AddChildElement: no element " + quote(parentName) + " below " + quote(d.lastAdded.name()));
             parent = found;
         }
         d.lastChild = d.append("AddChildElement", parent, name, text);
@@ -610,8 +612,8 @@ std::string written(const char* op, const pugi::xml_document& doc, unsigned flag
     StringWriter w;
     doc.save(w, "  ", flags, pugi::encoding_utf8);
     if (w.overflow)
-        raise(errc::document_failure, std::string(op) + ": the document is larger than the " + sizeLimitText() +
-                                          " a document may have");
+        raise(errc::document_failure,
+              std::string(op) + ": the document is larger than the " + sizeLimitText() + " a document may have");
     return std::move(w.out);
 }
 }  // namespace

@@ -7,8 +7,7 @@
 
 namespace varnel::detail {
 
-IError& ErrPropagator::getError(std::int32_t errorNo, const std::string& errorDesc,
-                                std::int32_t line) {
+IError& ErrPropagator::getError(std::int32_t errorNo, const std::string& errorDesc, std::int32_t line) {
     // A handler further out sees the trace it raised as the description; only a new error has a reason.
     const bool raisedHere = !error_.ErrorTrace.empty() && errorDesc == error_.ErrorTrace;
     if (!raisedHere) error_.Reason = errorDesc;
@@ -53,8 +52,8 @@ CaughtError currentError() {
     }
 }
 
-void propagateCurrent(const char* className, const char* routine,
-                      void (*cleanup)(void*, const IError&), void* cleanupContext) {
+void propagateCurrent(const char* className, const char* routine, void (*cleanup)(void*, const IError&),
+                      void* cleanupContext) {
     CaughtError caught = currentError();
     ErrPropagator& p = errPropagator();
     p.ClassName = className;
@@ -64,13 +63,10 @@ void propagateCurrent(const char* className, const char* routine,
     throw ComponentError(e.ErrorNo, e.ErrorTrace, e.ErrLine);
 }
 
-void raise(std::int32_t number, const std::string& description) {
-    throw ComponentError(number, description);
-}
+void raise(std::int32_t number, const std::string& description) { throw ComponentError(number, description); }
 
 std::int16_t toInt16(long long value) {
-    if (value < std::numeric_limits<std::int16_t>::min() ||
-        value > std::numeric_limits<std::int16_t>::max())
+    if (value < std::numeric_limits<std::int16_t>::min() || value > std::numeric_limits<std::int16_t>::max())
         raise(errc::overflow, "Overflow");
     return static_cast<std::int16_t>(value);
 }

@@ -52,8 +52,7 @@ CaughtError currentError();
 // The handler protocol in one place: records className/routine, runs the
 // routine's clean-up with the error, and raises ComponentError(number, trace).
 [[noreturn]] void propagateCurrent(const char* className, const char* routine,
-                                   void (*cleanup)(void*, const IError&) = nullptr,
-                                   void* cleanupContext = nullptr);
+                                   void (*cleanup)(void*, const IError&) = nullptr, void* cleanupContext = nullptr);
 
 // Runs body under the handler protocol of className/routine.
 template <class F>
@@ -73,8 +72,7 @@ decltype(auto) guarded(const char* className, const char* routine, F&& body, C&&
     } catch (...) {
         using Cleanup = std::remove_reference_t<C>;
         propagateCurrent(
-            className, routine,
-            [](void* ctx, const IError& e) { (*static_cast<Cleanup*>(ctx))(e); },
+            className, routine, [](void* ctx, const IError& e) { (*static_cast<Cleanup*>(ctx))(e); },
             const_cast<void*>(static_cast<const void*>(&cleanup)));
     }
 }

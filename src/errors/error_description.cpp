@@ -53,8 +53,7 @@ constexpr CodeText kTexts[] = {
 }  // namespace
 
 std::string ErrorDescription(long long code) {
-    auto it = std::find_if(std::begin(kTexts), std::end(kTexts),
-                           [code](const CodeText& t) { return t.code == code; });
+    auto it = std::find_if(std::begin(kTexts), std::end(kTexts), [code](const CodeText& t) { return t.code == code; });
     return it != std::end(kTexts) ? it->text : "Unknown status";
 }
 

@@ -30,8 +30,7 @@ CommentPtr CommentsCollection::Add(std::int32_t lngId, std::int32_t enmValue, co
 }
 
 std::vector<CommentsCollection::Entry>::const_iterator CommentsCollection::find(std::string_view key) const {
-    return std::find_if(entries_.begin(), entries_.end(),
-                        [&](const Entry& e) { return EqualsNoCase(e.key, key); });
+    return std::find_if(entries_.begin(), entries_.end(), [&](const Entry& e) { return EqualsNoCase(e.key, key); });
 }
 
 CommentPtr CommentsCollection::Item(std::int32_t index) const {

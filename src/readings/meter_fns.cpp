@@ -6,8 +6,8 @@
 #include <optional>
 #include <utility>
 
-#include "errors/err_propagator.h"
 #include "contracts/meter_reads.h"
+#include "errors/err_propagator.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {
@@ -20,21 +20,18 @@ constexpr const char* kClass = "clsMeterFns";
 constexpr std::int32_t kTestTypes[16] = {10, 0, 20, 0, 0, 21, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0};
 
 // Insulin names of the record datalog by T_Type (12 and 13 are pump and food records).
-constexpr const char* kInsulinNames[15] = {"Regular", "NPH",   "Lente", "",      "Ultralente",
-                                           "80/20",   "70/30", "60/40", "50/50", "Mixed",
-                                           "Other",   "",      "",      "",      ""};
+constexpr const char* kInsulinNames[15] = {"Regular", "NPH",   "Lente", "", "Ultralente", "80/20", "70/30", "60/40",
+                                           "50/50",   "Mixed", "Other", "", "",           "",      ""};
 
 // Health-note flags of a binary record, in the order their results are made.
 constexpr std::pair<std::int16_t RECORD_DATA::*, std::int32_t> kHealthNotes[] = {
-    {&RECORD_DATA::stressFlag, 170},  {&RECORD_DATA::feelHypoFlag, 171},
-    {&RECORD_DATA::illnessFlag, 172}, {&RECORD_DATA::mensesFlag, 173},
-    {&RECORD_DATA::vacationFlag, 174}, {&RECORD_DATA::otherFlag, 175}};
+    {&RECORD_DATA::stressFlag, 170}, {&RECORD_DATA::feelHypoFlag, 171}, {&RECORD_DATA::illnessFlag, 172},
+    {&RECORD_DATA::mensesFlag, 173}, {&RECORD_DATA::vacationFlag, 174}, {&RECORD_DATA::otherFlag, 175}};
 
 // Glucose comment codes for the same flags, in the order they are added.
 constexpr std::pair<std::int16_t RECORD_DATA::*, std::int32_t> kGlucoseFlagComments[] = {
-    {&RECORD_DATA::stressFlag, 17},  {&RECORD_DATA::feelHypoFlag, 14},
-    {&RECORD_DATA::illnessFlag, 13}, {&RECORD_DATA::mensesFlag, 18},
-    {&RECORD_DATA::vacationFlag, 19}, {&RECORD_DATA::otherFlag, 15}};
+    {&RECORD_DATA::stressFlag, 17}, {&RECORD_DATA::feelHypoFlag, 14}, {&RECORD_DATA::illnessFlag, 13},
+    {&RECORD_DATA::mensesFlag, 18}, {&RECORD_DATA::vacationFlag, 19}, {&RECORD_DATA::otherFlag, 15}};
 
 [[noreturn]] void subscriptError() { raise(errc::subscript_out_of_range, "Subscript out of range"); }
 
@@ -559,7 +556,7 @@ bool clsMeterFns::Fastmeterupload(ResultCollection& objresultcol, const std::vec
         unreadableCode_ = 0;
         corruptedCount_ = log.corruptedCount > 0 ? log.corruptedCount : 0;
         Grouping grouping;
-        const BinaryRecord record{*this, workRecord_, grouping, objresultcol,
+        const BinaryRecord record{*this,           workRecord_,   grouping,     objresultcol,
                                   unmatchedCount_, OralMedsArray, InsulinsArray};
         std::int32_t last = 0;
         for (std::int32_t i = 0; i < recordCount_; ++i) {

@@ -23,20 +23,26 @@ constexpr std::int16_t kMorvexProgress[] = {10, 30, 50, 70, 90, 100};
 
 std::shared_ptr<ISetupGroup> newGroup(std::int32_t number) {
     switch (number) {
-    case eGroupClock: return std::make_shared<Group_Clock>();
-    case eGroupGeneral: return std::make_shared<Group_General>();
-    case eGroupInsulins: return std::make_shared<Group_Insulins>();
-    case eGroupOralMeds: return std::make_shared<Group_OralMeds>();
-    case eGroupSchedule: return std::make_shared<Group_Schedule>();
-    case eGroupTargets: return std::make_shared<Group_targets>();
-    default: raise(errc::internal, "No settings group " + std::to_string(number));
+    case eGroupClock:
+        return std::make_shared<Group_Clock>();
+    case eGroupGeneral:
+        return std::make_shared<Group_General>();
+    case eGroupInsulins:
+        return std::make_shared<Group_Insulins>();
+    case eGroupOralMeds:
+        return std::make_shared<Group_OralMeds>();
+    case eGroupSchedule:
+        return std::make_shared<Group_Schedule>();
+    case eGroupTargets:
+        return std::make_shared<Group_targets>();
+    default:
+        raise(errc::internal, "No settings group " + std::to_string(number));
     }
 }
 
 }  // namespace
 
-MeterModel::MeterModel(const char* className, const Layout& layout)
-    : className_(className), layout_(layout) {}
+MeterModel::MeterModel(const char* className, const Layout& layout) : className_(className), layout_(layout) {}
 
 MeterSettings& MeterModel::Settings() {
     if (!mobjSettings) raise(errc::missing_object, "The meter model has not been initialised");
@@ -87,8 +93,7 @@ bool StandardMeterModel::MeterUpload(ResultCollection& objresultcol) {
     return guarded(className(), "MeterUpload", [&] { return meterFns().NonFastmeterUpload(objresultcol); });
 }
 
-clsCVMorvex::clsCVMorvex()
-    : MeterModel("clsCVMorvex", {kMorvexGroups, kMorvexSetupOrder, kMorvexProgress}) {}
+clsCVMorvex::clsCVMorvex() : MeterModel("clsCVMorvex", {kMorvexGroups, kMorvexSetupOrder, kMorvexProgress}) {}
 
 std::int16_t clsCVMorvex::GetReadingFromMeter() {
     return guarded(className(), "GetReadingFromMeter", [&] {
@@ -113,14 +118,22 @@ bool clsCVMorvex::MeterUpload(ResultCollection& objresultcol) {
 
 std::unique_ptr<MeterModel> createMeterModel(std::int32_t meterType) {
     switch (meterType) {
-    case eCVTarnConsumerMeter: return std::make_unique<clsCVTarnConsumer>();
-    case eCVPellis: return std::make_unique<clsCVPellis>();
-    case eDunmark: return std::make_unique<clsDunmark>();
-    case eQuillaandBremo: return std::make_unique<clsQuillaandbremo>();
-    case eCVTolvoMeter: return std::make_unique<clsCVTolvo>();
-    case eCorviaZenta: return std::make_unique<clsCVZenta>();
-    case eParvix: return std::make_unique<clsParvix>();
-    default: return std::make_unique<clsCVMorvex>();
+    case eCVTarnConsumerMeter:
+        return std::make_unique<clsCVTarnConsumer>();
+    case eCVPellis:
+        return std::make_unique<clsCVPellis>();
+    case eDunmark:
+        return std::make_unique<clsDunmark>();
+    case eQuillaandBremo:
+        return std::make_unique<clsQuillaandbremo>();
+    case eCVTolvoMeter:
+        return std::make_unique<clsCVTolvo>();
+    case eCorviaZenta:
+        return std::make_unique<clsCVZenta>();
+    case eParvix:
+        return std::make_unique<clsParvix>();
+    default:
+        return std::make_unique<clsCVMorvex>();
     }
 }
 

@@ -76,9 +76,7 @@ inline constexpr ResultShape resultShapes[] = {
     {"Error", ValueType::Long, 0, true, false, 0, 0},
 };
 
-constexpr const ResultShape& resultShape(ResultKind kind) {
-    return resultShapes[static_cast<std::size_t>(kind)];
-}
+constexpr const ResultShape& resultShape(ResultKind kind) { return resultShapes[static_cast<std::size_t>(kind)]; }
 
 // What every result offers to the code that groups and identifies results.
 class IResult {
@@ -143,9 +141,7 @@ public:
 
     ResultOf() : Result(K) {}
 
-    std::int32_t Value() const requires(shape.value == ValueType::Long) {
-        return static_cast<std::int32_t>(value_);
-    }
+    std::int32_t Value() const requires(shape.value == ValueType::Long) { return static_cast<std::int32_t>(value_); }
     void setValue(std::int32_t v) requires(shape.value == ValueType::Long) { value_ = v; }
     // A whole-number value must be rounded by the caller, never truncated here.
     template <std::floating_point T>

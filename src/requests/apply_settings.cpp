@@ -10,9 +10,9 @@
 
 #include "errors/err_propagator.h"
 #include "errors/error_description.h"
-#include "requests/request_frame.h"
 #include "requests/document_values.h"
 #include "requests/option_tables.h"
+#include "requests/request_frame.h"
 #include "requests/settings_requests.h"
 #include "settings/clock_group.h"
 #include "util/helpers.h"
@@ -45,30 +45,18 @@ constexpr SettingsItem option(MeterOptions_Enum o, TypeSet acceptedFor) {
 // The elements setDeviceSettings writes, in the order it writes them, with the
 // meter types that accept each.
 constexpr SettingsItem kItems[] = {
-    item("Clock", kAllTypes, Write::clock),
-    option(eStripCalCode, types({1, 2, 3, 5, 7})),
-    option(eBeepStatus, types({1, 2, 3, 5, 7})),
-    option(eUnits, kAllTypes),
-    item("DevInit", types({7}), Write::devInit),
-    option(eNumericSeparator, types({1, 2, 5})),
-    option(eDateFormat, types({1, 2, 3, 5, 7})),
-    option(eTimeFormat, types({1, 2, 3, 5, 6, 7, 8})),
-    option(eLanguage, types({1, 2, 3, 5, 7})),
-    option(eCommunicationMode, types({1, 5})),
-    option(eCommunicationRate, types({1, 5})),
-    option(eTranslateNewLang, types({1, 5})),
-    option(eEvevtAveraging, types({2, 7})),
-    option(eInsulinPrompt, types({2})),
-    option(eDisplayLastTest, types({3})),
-    option(eDayAverage, types({3})),
-    option(eDisplayClock, types({5})),
-    option(eDaylightSavings, types({5})),
-    option(eWeekStartDay, types({7})),
-    option(eCholestrolUnits, types({7})),
-    option(eInsulinPumpUse, types({7})),
-    item("Insulins", types({7}), Write::insulins),
-    item("Pills", types({7}), Write::pills),
-    item("Schedule", types({7}), Write::schedule),
+    item("Clock", kAllTypes, Write::clock),      option(eStripCalCode, types({1, 2, 3, 5, 7})),
+    option(eBeepStatus, types({1, 2, 3, 5, 7})), option(eUnits, kAllTypes),
+    item("DevInit", types({7}), Write::devInit), option(eNumericSeparator, types({1, 2, 5})),
+    option(eDateFormat, types({1, 2, 3, 5, 7})), option(eTimeFormat, types({1, 2, 3, 5, 6, 7, 8})),
+    option(eLanguage, types({1, 2, 3, 5, 7})),   option(eCommunicationMode, types({1, 5})),
+    option(eCommunicationRate, types({1, 5})),   option(eTranslateNewLang, types({1, 5})),
+    option(eEvevtAveraging, types({2, 7})),      option(eInsulinPrompt, types({2})),
+    option(eDisplayLastTest, types({3})),        option(eDayAverage, types({3})),
+    option(eDisplayClock, types({5})),           option(eDaylightSavings, types({5})),
+    option(eWeekStartDay, types({7})),           option(eCholestrolUnits, types({7})),
+    option(eInsulinPumpUse, types({7})),         item("Insulins", types({7}), Write::insulins),
+    item("Pills", types({7}), Write::pills),     item("Schedule", types({7}), Write::schedule),
     item("Targets", types({7}), Write::targets),
 };
 
@@ -113,9 +101,8 @@ MissingElement applyClock(ApplyContext& ctx, bool& written) {
         ctx.outcome.refuse("Invalid DeviceClock year value ; ");
         return {};
     }
-    clock->setClockTime(*DateTime::fromParts(y, datePart(month), datePart(day),
-                                             static_cast<int>(*hour), static_cast<int>(*minute),
-                                             static_cast<int>(*second)));
+    clock->setClockTime(*DateTime::fromParts(y, datePart(month), datePart(day), static_cast<int>(*hour),
+                                             static_cast<int>(*minute), static_cast<int>(*second)));
     if (clock->saveToMeter() != 0)
         ctx.outcome.refuse("Invalid DeviceClock value ; ");
     else
@@ -161,8 +148,7 @@ bool validate(Request& req, XMLWrapper& deviceInfo, XMLWrapper& deviceCfg, Claim
         return stop(req, ME_FAIL, ME_BAD_PARAMETER, " ; Device Type from Device Info XML is invalid");
 
     deviceCfg.MoveToRoot();
-    if (deviceCfg.GetRootName() != "DeviceSettings")
-        return stop(req, ME_FAIL, ME_INVALID_XMLWRAPPOBJ, " ;");
+    if (deviceCfg.GetRootName() != "DeviceSettings") return stop(req, ME_FAIL, ME_INVALID_XMLWRAPPOBJ, " ;");
     if (deviceCfg.CountElements("DeviceInfo") != 1)
         return stop(req, ME_FAIL, ME_INVALID_XMLWRAPPOBJ, " ;DeviceInfo missing in Device settings");
     deviceCfg.MoveToChild("DeviceInfo");
@@ -214,8 +200,7 @@ bool apply(Request& req, XMLWrapper& deviceCfg, XMLWrapper& status, WriteOutcome
         if (item != std::end(kItems) && has(item->acceptedFor, meterType)) {
             wanted[item - std::begin(kItems)] = true;
             ++accepted;
-        } else if (std::find(std::begin(kReadOnlyItems), std::end(kReadOnlyItems), name) !=
-                   std::end(kReadOnlyItems)) {
+        } else if (std::find(std::begin(kReadOnlyItems), std::end(kReadOnlyItems), name) != std::end(kReadOnlyItems)) {
             outcome.refuse(name + " value is read only;");
         } else {
             outcome.refuse(name + " is not supported;");
@@ -235,13 +220,28 @@ bool apply(Request& req, XMLWrapper& deviceCfg, XMLWrapper& status, WriteOutcome
         MissingElement missing;
         bool written = true;
         switch (kItems[i].write) {
-            case Write::clock: written = false; missing = applyClock(ctx, written); break;
-            case Write::option: writeOption(session, kItems[i].option, deviceCfg, status, outcome); break;
-            case Write::devInit: applyDevInit(ctx); break;
-            case Write::insulins: missing = applyInsulins(ctx); break;
-            case Write::pills: missing = applyOralMeds(ctx); break;
-            case Write::schedule: missing = applySchedule(ctx); break;
-            case Write::targets: missing = applyTargets(ctx); break;
+        case Write::clock:
+            written = false;
+            missing = applyClock(ctx, written);
+            break;
+        case Write::option:
+            writeOption(session, kItems[i].option, deviceCfg, status, outcome);
+            break;
+        case Write::devInit:
+            applyDevInit(ctx);
+            break;
+        case Write::insulins:
+            missing = applyInsulins(ctx);
+            break;
+        case Write::pills:
+            missing = applyOralMeds(ctx);
+            break;
+        case Write::schedule:
+            missing = applySchedule(ctx);
+            break;
+        case Write::targets:
+            missing = applyTargets(ctx);
+            break;
         }
         // The writes made so far stay made; the refusals gathered so far are told too.
         if (missing)

@@ -6,8 +6,8 @@
 #include <string>
 
 #include "readings/meter_models.h"
-#include "session/meter_dll.h"
 #include "requests/option_writers.h"
+#include "session/meter_dll.h"
 #include "varnel/xml_wrapper.h"
 
 namespace varnel::detail {

@@ -12,12 +12,12 @@
 
 #include "errors/err_propagator.h"
 #include "errors/error_description.h"
-#include "requests/request_frame.h"
 #include "requests/discovery.h"
 #include "requests/document_values.h"
 #include "requests/option_tables.h"
-#include "requests/settings_requests.h"
 #include "requests/option_writers.h"
+#include "requests/request_frame.h"
+#include "requests/settings_requests.h"
 #include "settings/schedule_group.h"
 #include "util/helpers.h"
 
@@ -25,13 +25,23 @@ namespace varnel::detail {
 
 namespace {
 
-enum class Kind : std::uint8_t { clock, option, insulins, pills, schedule, targets, glucRange, glucErrRange, glucCalib };
+enum class Kind : std::uint8_t {
+    clock,
+    option,
+    insulins,
+    pills,
+    schedule,
+    targets,
+    glucRange,
+    glucErrRange,
+    glucCalib
+};
 
 struct SettingRow {
     Kind kind;
     const char* name;
-    TypeSet full;    // types whose full description has it
-    TypeSet listed;  // types that describe it when a listing asks for it
+    TypeSet full;                              // types whose full description has it
+    TypeSet listed;                            // types that describe it when a listing asks for it
     MeterOptions_Enum option = eStripCalCode;  // Kind::option only
 };
 
@@ -225,8 +235,13 @@ void setLimits(XMLWrapper& doc, const Limits& limits, std::int16_t meterType, bo
 class CapsWriter {
 public:
     CapsWriter(Request& req, XMLWrapper& caps, MeterModel* meter, Wanted& wanted)
-        : req_(req), session_(req.session), caps_(caps), meter_(meter), wanted_(wanted),
-          copy_(session_.storedRecord()), type_(copy_.M_Type),
+        : req_(req),
+          session_(req.session),
+          caps_(caps),
+          meter_(meter),
+          wanted_(wanted),
+          copy_(session_.storedRecord()),
+          type_(copy_.M_Type),
           progress_(wanted.count) {}
 
     // Describes the wanted settings: 0, or the code of the read that failed (reported).
@@ -266,12 +281,21 @@ public:
 private:
     std::int16_t setting(const SettingRow& row) {
         switch (row.kind) {
-        case Kind::clock: return clock();
-        case Kind::option: return option(row.option);
-        case Kind::schedule: return schedule();
-        case Kind::insulins: medication("Insulins", kInsulinCaps); break;
-        case Kind::pills: medication("Pills", kPillCaps); break;
-        case Kind::targets: targets(); break;
+        case Kind::clock:
+            return clock();
+        case Kind::option:
+            return option(row.option);
+        case Kind::schedule:
+            return schedule();
+        case Kind::insulins:
+            medication("Insulins", kInsulinCaps);
+            break;
+        case Kind::pills:
+            medication("Pills", kPillCaps);
+            break;
+        case Kind::targets:
+            targets();
+            break;
         case Kind::glucRange:
             caps_.AddElement("GlucRange");
             caps_.SetAttribute("High", std::to_string(session_.GlucoseHigh()));
@@ -297,8 +321,7 @@ private:
     }
 
     std::int16_t readFailed(std::int16_t c, const std::string& text) {
-        req_.report(ME_FAIL, c,
-                    ErrorDescription(ME_FAIL) + ";" + wanted_.strError + ";" + ErrorDescription(c) + text);
+        req_.report(ME_FAIL, c, ErrorDescription(ME_FAIL) + ";" + wanted_.strError + ";" + ErrorDescription(c) + text);
         return c;
     }
 
@@ -315,7 +338,8 @@ private:
         for (auto [name, day] : {std::pair{"Min", first}, std::pair{"Max", last}}) {
             const DateTime date = DateTime::fromSerial(day);
             caps_.AddChildElement(name);
-            for (const auto& [attribute, value] : dateAttributes(date, false)) caps_.SetChildAttribute(attribute, value);
+            for (const auto& [attribute, value] : dateAttributes(date, false))
+                caps_.SetChildAttribute(attribute, value);
         }
         advance();
         return 0;
@@ -364,8 +388,8 @@ private:
     }
 
     std::int16_t schedule() {
-        auto group = meter_ ? std::dynamic_pointer_cast<Group_Schedule>(meter_->Settings().Item(eGroupSchedule))
-                            : nullptr;
+        auto group =
+            meter_ ? std::dynamic_pointer_cast<Group_Schedule>(meter_->Settings().Item(eGroupSchedule)) : nullptr;
         if (!group) return 0;
         group->initialise(session_.meterFns());
         if (std::int16_t c = group->readFromMeter()) return readFailed(c, "Schedule setting failed");
@@ -401,9 +425,7 @@ private:
         }
     }
 
-    void advance() {
-        progress_.advance(req_.owner);
-    }
+    void advance() { progress_.advance(req_.owner); }
 
     Request& req_;
     MeterDll& session_;

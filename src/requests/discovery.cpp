@@ -6,8 +6,8 @@
 #include <string_view>
 
 #include "errors/err_propagator.h"
-#include "requests/request_frame.h"
 #include "requests/document_values.h"
+#include "requests/request_frame.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {
@@ -98,8 +98,8 @@ IdentityFailure writeDeviceDescription(XMLWrapper& doc, MeterDll& session) {
     return {};
 }
 
-std::int32_t discoverDevice(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
-                            XMLWrapper& connInfo, XMLWrapper& status) {
+std::int32_t discoverDevice(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo, XMLWrapper& connInfo,
+                            XMLWrapper& status) {
     Request req(owner, "discoverDevice", udtMeterRec, &status);
     return req.run([&]() -> std::int32_t {
         req.ensureSession();

@@ -43,7 +43,7 @@ IdentityFailure identityFailure(const MeterDll& session);
 IdentityFailure writeDeviceDescription(XMLWrapper& doc, MeterDll& session);
 
 // Looks for a meter on the first port of the connection document and describes it.
-std::int32_t discoverDevice(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
-                            XMLWrapper& connInfo, XMLWrapper& status);
+std::int32_t discoverDevice(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo, XMLWrapper& connInfo,
+                            XMLWrapper& status);
 
 }  // namespace varnel::detail

@@ -4,8 +4,8 @@
 #include <string_view>
 
 #include "errors/error_description.h"
-#include "requests/request_frame.h"
 #include "requests/option_tables.h"
+#include "requests/request_frame.h"
 
 namespace varnel::detail {
 

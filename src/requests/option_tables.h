@@ -66,9 +66,9 @@ inline constexpr OptionElementRow kEvtAvgDurnElement{
 
 // Language words by language code 0-19.
 inline constexpr std::array<const char*, 20> kLanguageWords{
-    "English", "Spanish", "French",   "Italian",   "Dutch",   "Portuguese",      "Swedish",
-    "German",  "Symbolic", "Danish",  "Finnish",   "Norwegian", "Polish",        "Hungarian",
-    "Turkish", "Czechoslovakian", "Greek", "Russian", "Japanese", "British"};
+    "English", "Spanish",         "French", "Italian", "Dutch",     "Portuguese", "Swedish",
+    "German",  "Symbolic",        "Danish", "Finnish", "Norwegian", "Polish",     "Hungarian",
+    "Turkish", "Czechoslovakian", "Greek",  "Russian", "Japanese",  "British"};
 
 // The row of an option as the meter type (the session's LastMeterType) shows it.
 constexpr const OptionElementRow& optionElementRow(MeterOptions_Enum option, std::int16_t lastMeterType) {
@@ -96,15 +96,12 @@ constexpr bool documentValue(const OptionElementRow& row, std::int16_t raw, std:
 // The word of a document value, or null when it has none.
 constexpr const char* optionWord(const OptionElementRow& row, std::int32_t value) {
     if (row.option == eLanguage)
-        return value >= 0 && value < static_cast<std::int32_t>(kLanguageWords.size()) ? kLanguageWords[value]
-                                                                                    : nullptr;
+        return value >= 0 && value < static_cast<std::int32_t>(kLanguageWords.size()) ? kLanguageWords[value] : nullptr;
     return value >= 0 && value < static_cast<std::int32_t>(row.words.size()) ? row.words[value] : nullptr;
 }
 
 // The word of a language code, or null outside 0-19.
-constexpr const char* languageWord(std::int32_t code) {
-    return optionWord(kOptionElements[eLanguage], code);
-}
+constexpr const char* languageWord(std::int32_t code) { return optionWord(kOptionElements[eLanguage], code); }
 
 // The "Mode" text of an option availability: "0" read-only, "1" writable, null otherwise.
 constexpr const char* modeText(std::int16_t availability) {

@@ -74,11 +74,13 @@ const OptionWriter& writerFor(MeterOptions_Enum option) {
 // way; any other value goes as it is.
 double mapped(OptionMapping mapping, const std::string& text, double value) {
     switch (mapping) {
-        case OptionMapping::raw: return value;
-        case OptionMapping::inverted: return value == 1 ? 0 : value == 0 ? 1 : value;
-        case OptionMapping::reversed:
-            if (text.size() == 1 && text[0] >= '0' && text[0] <= '3') return 3 - (text[0] - '0');
-            return value;
+    case OptionMapping::raw:
+        return value;
+    case OptionMapping::inverted:
+        return value == 1 ? 0 : value == 0 ? 1 : value;
+    case OptionMapping::reversed:
+        if (text.size() == 1 && text[0] >= '0' && text[0] <= '3') return 3 - (text[0] - '0');
+        return value;
     }
     return value;
 }
@@ -104,8 +106,7 @@ std::int16_t writeOption(MeterDll& session, MeterOptions_Enum option, XMLWrapper
         // Best effort: the error being raised matters more than this note.
         try {
             status.AddElement("ProcedureError", std::string(w.member) + " Line: " + std::to_string(e.ErrLine));
-        } catch (...) {
-        }
+        } catch (...) {}
     };
     return guarded(
         "MeterDll", w.member,

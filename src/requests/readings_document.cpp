@@ -2,10 +2,10 @@
 
 #include <string>
 
-#include "requests/request_frame.h"
+#include "readings/results.h"
 #include "requests/discovery.h"
 #include "requests/readings_entries.h"
-#include "readings/results.h"
+#include "requests/request_frame.h"
 #include "util/helpers.h"
 #include "varnel/unique_checker.h"
 
@@ -69,8 +69,8 @@ void writeTransferSummary(XMLWrapper& datalog, MeterDll& session) {
 
 }  // namespace
 
-std::int32_t getReadings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
-                         XMLWrapper& datalog, XMLWrapper&, XMLWrapper& status, bool& blnCheckMeter) {
+std::int32_t getReadings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo, XMLWrapper& datalog,
+                         XMLWrapper&, XMLWrapper& status, bool& blnCheckMeter) {
     Request req(owner, "getReadings", udtMeterRec, &status);
     return req.run([&]() -> std::int32_t {
         MeterDll& session = req.session;

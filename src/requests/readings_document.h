@@ -10,7 +10,7 @@
 namespace varnel::detail {
 
 // Writes the device section, the transfer summary and one entry per reading; the filter is not read.
-std::int32_t getReadings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
-                         XMLWrapper& datalog, XMLWrapper& filter, XMLWrapper& status, bool& blnCheckMeter);
+std::int32_t getReadings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo, XMLWrapper& datalog,
+                         XMLWrapper& filter, XMLWrapper& status, bool& blnCheckMeter);
 
 }  // namespace varnel::detail

@@ -84,9 +84,8 @@ const char* rangeText(std::int32_t valueInMeterRange) {
     return valueInMeterRange == 1 ? "High" : valueInMeterRange == 2 ? "Low" : nullptr;
 }
 
-constexpr const char* kMealSlotTexts[] = {
-    "Before Breakfast", "After Breakfast", "Before Lunch", "After Lunch",
-    "Before Dinner",    "After Dinner",    "Night",        "Sleep"};
+constexpr const char* kMealSlotTexts[] = {"Before Breakfast", "After Breakfast", "Before Lunch", "After Lunch",
+                                          "Before Dinner",    "After Dinner",    "Night",        "Sleep"};
 
 void mealSlot(Entry& e, std::int32_t slot, bool glucose) {
     if (slot < 1 || slot > 8) return;
@@ -135,8 +134,7 @@ void comments(Entry& e, const Glucose& g) {
     auto events = g.events();
     // Any real comment counts, not just the first: a leading code 0 must not hide the rest.
     bool any = events->Count() > 0;
-    for (const CommentPtr& c : *list)
-        any = any || c->Id() != 0;
+    for (const CommentPtr& c : *list) any = any || c->Id() != 0;
     if (!any) return;
     e.child("Comments");
     for (const CommentPtr& c : *list) {
@@ -158,8 +156,7 @@ void writeGlucose(Entry& e, const Result& r) {
         std::int32_t type;
         const char *kind, *txt, *site;
     };
-    static constexpr Sample samples[] = {
-        {21, "1", "Control", "4"}, {11, "0", "Blood", "1"}, {0, "0", "Blood", "0"}};
+    static constexpr Sample samples[] = {{21, "1", "Control", "4"}, {11, "0", "Blood", "1"}, {0, "0", "Blood", "0"}};
     const Sample* s = &samples[2];
     for (const Sample& x : samples)
         if (x.type == g.ResultType()) {
@@ -204,8 +201,7 @@ void valueHtWt(Entry& e, const Result&, const Result& r) {
 }
 
 void valueCholes(Entry& e, const Result&, const Result& r) {
-    static constexpr Coded names[] = {
-        {130, "LDL", ""}, {131, "HDL", ""}, {140, "Total", ""}, {150, "Trig", ""}};
+    static constexpr Coded names[] = {{130, "LDL", ""}, {131, "HDL", ""}, {140, "Total", ""}, {150, "Trig", ""}};
     const Coded* c = lookup(names, r.ResultType());
     if (!c) return;
     e.child(c->text, valueText<ResultKind::Cholestrol>(r));
@@ -213,22 +209,17 @@ void valueCholes(Entry& e, const Result&, const Result& r) {
     if (const char* range = rangeText(as<Cholestrol>(r).ValueInMeterRange())) e.childAttr("Range", range);
 }
 
-bool isSnack(const Result& r) {
-    return r.ResultType() >= 55 && r.ResultType() <= 58;
-}
+bool isSnack(const Result& r) { return r.ResultType() >= 55 && r.ResultType() <= 58; }
 
 void valueFood(Entry& e, const Result& first, const Result& r) {
     // Regular and snack codes name the same four values, five apart.
-    static constexpr Coded names[] = {
-        {50, "Carbs", ""}, {51, "Cals", ""}, {52, "SFat", ""}, {53, "Protein", ""}};
+    static constexpr Coded names[] = {{50, "Carbs", ""}, {51, "Cals", ""}, {52, "SFat", ""}, {53, "Protein", ""}};
     std::int32_t type = r.ResultType() - (isSnack(first) ? 5 : 0);
     if (const Coded* c = lookup(names, type)) e.child(c->text, valueText<ResultKind::Food>(r));
 }
 
 // A snack value never joins a meal entry nor the reverse: its value child would be lost.
-bool sameFoodKind(const Result& first, const Result& next) {
-    return isSnack(first) == isSnack(next);
-}
+bool sameFoodKind(const Result& first, const Result& next) { return isSnack(first) == isSnack(next); }
 
 void valueHNotes(Entry& e, const Result&, const Result& r) {
     static constexpr const char* names[] = {"Stress", "Hypo", "Ill", "Menses", "Vac", "Other"};
@@ -247,9 +238,7 @@ void writeFood(Entry& e, const Result& r) {
     e.codedChild("Slot", lookup(meals, as<Food>(r).MealSlot()));
 }
 
-void writeOrd(Entry& e, const Result& r) {
-    e.ord(r);
-}
+void writeOrd(Entry& e, const Result& r) { e.ord(r); }
 
 // --- entries of one result each ---
 
@@ -299,18 +288,14 @@ void writeInjection(Entry& e, const Result& r) {
 
 void writeKetones(Entry& e, const Result& r) {
     e.ord(r);
-    static constexpr Coded levels[] = {{110, "0", "Negative"},
-                                       {111, "1", "Trace"},
-                                       {112, "2", "Small"},
-                                       {113, "3", "Moderate"},
-                                       {114, "4", "Large"}};
+    static constexpr Coded levels[] = {
+        {110, "0", "Negative"}, {111, "1", "Trace"}, {112, "2", "Small"}, {113, "3", "Moderate"}, {114, "4", "Large"}};
     e.codedAttrs("Val", lookup(levels, r.ResultType()));
 }
 
 void writeVisit(Entry& e, const Result& r) {
     e.ord(r);
-    static constexpr Coded visits[] = {
-        {160, "2", "Dr Visit"}, {161, "0", "Eye Exam"}, {162, "1", "Foot Exam"}};
+    static constexpr Coded visits[] = {{160, "2", "Dr Visit"}, {161, "0", "Eye Exam"}, {162, "1", "Foot Exam"}};
     e.codedAttrs("Type", lookup(visits, r.ResultType()));
 }
 

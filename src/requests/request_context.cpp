@@ -30,8 +30,7 @@ void RequestContext::RaiseProgress(std::int16_t percent) {
         if (value < SHRT_MIN || value > SHRT_MAX) return;
         std::int16_t done = static_cast<std::int16_t>(value);
         if (onProgress) onProgress(done);
-    } catch (...) {
-    }
+    } catch (...) {}
 }
 
 void RequestContext::raiseComplete() {

@@ -108,9 +108,7 @@ bool Request::sameType(const std::string& claimed, const char* source) {
     return false;
 }
 
-bool Request::validType(const std::string& text) {
-    return IsMeterType(ToNumber(text));
-}
+bool Request::validType(const std::string& text) { return IsMeterType(ToNumber(text)); }
 
 void Request::fail(std::int32_t code, const std::string& context) {
     report(ME_FAIL, code, ErrorDescription(code) + context);
@@ -142,23 +140,20 @@ void Request::unexpected() {
             session.MeterClose(rec);
         else
             close();
-    } catch (...) {
-    }
+    } catch (...) {}
     if (status_) {
         try {
             reportStatus(*status_, ME_FAIL, ME_UNKNOWN,
                          ErrorDescription(ME_UNKNOWN) + ";Error number = " + std::to_string(e.ErrorNo) +
                              " Error description = " + e.ErrorDesc);
             status_->AddElement("VBTrace", std::to_string(e.ErrLine));
-        } catch (...) {
-        }
+        } catch (...) {}
     }
     owner.raiseComplete();
     throw ComponentError(e.ErrorNo, e.ErrorTrace, e.ErrLine);
 }
 
-ItemProgress::ItemProgress(std::int32_t count)
-    : step_(count > 0 ? roundToInt16(100.0 / count) : std::int16_t{0}) {}
+ItemProgress::ItemProgress(std::int32_t count) : step_(count > 0 ? roundToInt16(100.0 / count) : std::int16_t{0}) {}
 
 void ItemProgress::advance(RequestContext& owner) {
     percent_ = static_cast<std::int16_t>(std::min(percent_ + step_, 100));

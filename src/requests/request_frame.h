@@ -7,8 +7,8 @@
 #include <cstdint>
 #include <string>
 
-#include "requests/request_context.h"
 #include "platform/message_pump.h"
+#include "requests/request_context.h"
 #include "varnel/records.h"
 #include "varnel/xml_wrapper.h"
 

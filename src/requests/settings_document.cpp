@@ -11,11 +11,11 @@
 
 #include "errors/err_propagator.h"
 #include "errors/error_description.h"
-#include "requests/request_frame.h"
 #include "requests/discovery.h"
 #include "requests/document_values.h"
 #include "requests/option_elements.h"
 #include "requests/option_tables.h"
+#include "requests/request_frame.h"
 #include "requests/settings_requests.h"
 #include "settings/clock_group.h"
 #include "settings/medication_groups.h"
@@ -105,9 +105,8 @@ constexpr TypeItems kTypeItems[] = {
       "TimeFormat", "Language", "CommMode", "Baud", "NewLang", "ShowClock", "DayLight"}},
     {{6, 8}, {"Clock", "GlucRange", "GlucCalib", "GlucErrRange", "GlucUnit", "TimeFormat"}},
     {{7, 7},
-     {"Clock", "Schedule", "Insulins", "DevInit", "Pills", "Targets", "GlucRange", "GlucCalib", "GlucErrRange",
-      "CC", "Beep", "GlucUnit", "DateFormat", "TimeFormat", "Language", "EvtAvg", "WeekBegin", "CholesUnit",
-      "PumpUse"}},
+     {"Clock", "Schedule", "Insulins", "DevInit", "Pills", "Targets", "GlucRange", "GlucCalib", "GlucErrRange", "CC",
+      "Beep", "GlucUnit", "DateFormat", "TimeFormat", "Language", "EvtAvg", "WeekBegin", "CholesUnit", "PumpUse"}},
 };
 
 // Position of an item name in kItems; "EvtAvgDurn" names the event-averaging item too.
@@ -147,15 +146,29 @@ struct MedicationItem {
     bool (G::*changeable)(std::int32_t);
 };
 
-constexpr MedicationItem<Group_Insulins> kInsulinItem{
-    eGroupInsulins, "Insulins", "Insulin", 10, "11", "3", " ; Insulins setting failed",
-    &Group_Insulins::InsulinName, &Group_Insulins::FavInsulin, &Group_Insulins::FavInsulinCount,
-    &Group_Insulins::isInsulinChangeable};
+constexpr MedicationItem<Group_Insulins> kInsulinItem{eGroupInsulins,
+                                                      "Insulins",
+                                                      "Insulin",
+                                                      10,
+                                                      "11",
+                                                      "3",
+                                                      " ; Insulins setting failed",
+                                                      &Group_Insulins::InsulinName,
+                                                      &Group_Insulins::FavInsulin,
+                                                      &Group_Insulins::FavInsulinCount,
+                                                      &Group_Insulins::isInsulinChangeable};
 
-constexpr MedicationItem<Group_OralMeds> kPillItem{
-    eGroupOralMeds, "Pills", "Pill", 5, "10", "5", " ; OralMeds setting failed",
-    &Group_OralMeds::OralMedName, &Group_OralMeds::FavOralMed, &Group_OralMeds::FavOralMedsCount,
-    &Group_OralMeds::isOralMedChangeable};
+constexpr MedicationItem<Group_OralMeds> kPillItem{eGroupOralMeds,
+                                                   "Pills",
+                                                   "Pill",
+                                                   5,
+                                                   "10",
+                                                   "5",
+                                                   " ; OralMeds setting failed",
+                                                   &Group_OralMeds::OralMedName,
+                                                   &Group_OralMeds::FavOralMed,
+                                                   &Group_OralMeds::FavOralMedsCount,
+                                                   &Group_OralMeds::isOralMedChangeable};
 
 // Day, month ("00") and year of a date as child attributes of the last added child.
 void setDateAttributes(XMLWrapper& doc, const DateTime& date) {
@@ -179,7 +192,11 @@ public:
     using Exit = std::optional<std::int32_t>;
 
     SettingsRequest(Request& req, XMLWrapper& deviceInfo, XMLWrapper& cfg, XMLWrapper& status, bool fetchAll)
-        : req_(req), deviceInfo_(deviceInfo), cfg_(cfg), status_(status), fetchAll_(fetchAll),
+        : req_(req),
+          deviceInfo_(deviceInfo),
+          cfg_(cfg),
+          status_(status),
+          fetchAll_(fetchAll),
           options_(req.session, record_, message_) {}
 
     std::int32_t run(bool& blnCheckMeter);
@@ -246,9 +263,7 @@ ISetupGroup* SettingsRequest::readGroup(std::int32_t number, const char* failure
     return group.get();
 }
 
-void SettingsRequest::advance() {
-    progress_.advance(req_.owner);
-}
+void SettingsRequest::advance() { progress_.advance(req_.owner); }
 
 SettingsRequest::Exit SettingsRequest::chooseItems() {
     const TypeItems* offered = typeItems(record_.M_Type);
@@ -428,17 +443,23 @@ void SettingsRequest::writeRanges(Kind kind) {
 
 SettingsRequest::Exit SettingsRequest::writeItem(const ItemRow& item) {
     switch (item.kind) {
-    case Kind::clock: return writeClock();
+    case Kind::clock:
+        return writeClock();
     case Kind::option:
         if (const std::int16_t r = options_.write(cfg_, item.option, status_)) return closeAndEnd(r);
         if (!options_.bulk()) read_ = true;
         advance();
         return std::nullopt;
-    case Kind::devInit: return writeDevInit();
-    case Kind::insulins: return writeMedications(kInsulinItem);
-    case Kind::pills: return writeMedications(kPillItem);
-    case Kind::schedule: return writeSchedule();
-    case Kind::targets: return writeTargets();
+    case Kind::devInit:
+        return writeDevInit();
+    case Kind::insulins:
+        return writeMedications(kInsulinItem);
+    case Kind::pills:
+        return writeMedications(kPillItem);
+    case Kind::schedule:
+        return writeSchedule();
+    case Kind::targets:
+        return writeTargets();
     default:
         writeRanges(item.kind);
         return std::nullopt;
@@ -515,8 +536,7 @@ SettingsRequest::Exit SettingsRequest::settingsMissing() {
 }  // namespace
 
 std::int32_t getDeviceSettings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
-                               XMLWrapper& deviceCfg, bool blnFetchAllInfo, XMLWrapper& status,
-                               bool& blnCheckMeter) {
+                               XMLWrapper& deviceCfg, bool blnFetchAllInfo, XMLWrapper& status, bool& blnCheckMeter) {
     Request req(owner, "getDeviceSettings", udtMeterRec, &status);
     SettingsRequest request(req, deviceInfo, deviceCfg, status, blnFetchAllInfo);
     return req.run([&]() -> std::int32_t {

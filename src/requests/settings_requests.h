@@ -12,10 +12,8 @@ namespace varnel::detail {
 std::int32_t setDeviceSettings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
                                XMLWrapper& deviceCfg, XMLWrapper& status);
 std::int32_t getDeviceSettings(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
-                               XMLWrapper& deviceCfg, bool blnFetchAllInfo, XMLWrapper& status,
-                               bool& blnCheckMeter);
+                               XMLWrapper& deviceCfg, bool blnFetchAllInfo, XMLWrapper& status, bool& blnCheckMeter);
 std::int32_t getDeviceCaps(RequestContext& owner, METER_REC& udtMeterRec, XMLWrapper& deviceInfo,
-                           XMLWrapper& deviceCaps, bool blnFetchAllInfo, XMLWrapper& status,
-                           bool& blnCheckMeter);
+                           XMLWrapper& deviceCaps, bool blnFetchAllInfo, XMLWrapper& status, bool& blnCheckMeter);
 
 }  // namespace varnel::detail

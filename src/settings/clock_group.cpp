@@ -1,7 +1,7 @@
 #include "settings/clock_group.h"
 
-#include "errors/err_propagator.h"
 #include "contracts/meter_reads.h"
+#include "errors/err_propagator.h"
 #include "util/helpers.h"
 
 namespace varnel::detail {

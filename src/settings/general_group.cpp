@@ -42,8 +42,7 @@ std::int16_t Group_General::readFromMeter() {
         const SETTINGS_REC& s = rec_.Setting;
         for (int i = 0; i < kOptionCount; ++i) {
             if (s.Availability[i] == 0) continue;
-            add(i, s.nValue[i], s.Availability[i], s.nValue_min[i], s.nValue_max[i], 0,
-                s.Status[i] != 0);
+            add(i, s.nValue[i], s.Availability[i], s.nValue_min[i], s.nValue_max[i], 0, s.Status[i] != 0);
         }
         return 0;
     });
@@ -77,9 +76,8 @@ std::shared_ptr<SetupOption> Group_General::OptionByKey(std::int32_t key) const 
     return nullptr;
 }
 
-bool Group_General::add(std::int32_t key, std::int16_t value, std::int32_t settingType,
-                        std::int32_t minValue, std::int32_t maxValue, std::int32_t dataType,
-                        bool isRecent) {
+bool Group_General::add(std::int32_t key, std::int16_t value, std::int32_t settingType, std::int32_t minValue,
+                        std::int32_t maxValue, std::int32_t dataType, bool isRecent) {
     return guarded(kClass, "add", [&] {
         auto option = std::make_shared<SetupOption>();
         option->Key = key;

@@ -41,17 +41,31 @@ std::int16_t setOralMedFavourites(Transport& t, METER_REC& rec, const std::int16
 }
 
 const MedicationTable kInsulins = {
-    "Group_Insulins", 21, 3, 11,
-    "InsulinName", "FavInsulin", "isInsulinChangeable",
-    &Transport::GetInsulinName, &Transport::SetInsulinName,
-    getInsulinFavourites, setInsulinFavourites,
+    "Group_Insulins",
+    21,
+    3,
+    11,
+    "InsulinName",
+    "FavInsulin",
+    "isInsulinChangeable",
+    &Transport::GetInsulinName,
+    &Transport::SetInsulinName,
+    getInsulinFavourites,
+    setInsulinFavourites,
 };
 
 const MedicationTable kOralMeds = {
-    "Group_OralMeds", 15, 5, 6,
-    "OralMedName", "FavOralMed", "isOralMedChangeable",
-    &Transport::GetOralMedicationName, &Transport::SetOralMedicationName,
-    getOralMedFavourites, setOralMedFavourites,
+    "Group_OralMeds",
+    15,
+    5,
+    6,
+    "OralMedName",
+    "FavOralMed",
+    "isOralMedChangeable",
+    &Transport::GetOralMedicationName,
+    &Transport::SetOralMedicationName,
+    getOralMedFavourites,
+    setOralMedFavourites,
 };
 
 bool inRange(std::int32_t position, std::int32_t count) { return position >= 1 && position <= count; }
@@ -96,8 +110,7 @@ std::int16_t MedicationGroup::readFromMeter() {
         std::fill(changed_.begin(), changed_.end(), false);
         std::vector<std::int16_t> received(static_cast<std::size_t>(table_.favouriteCount));
         for (std::int32_t f = 1; f <= table_.favouriteCount; ++f) {
-            if (std::int16_t code = outcome(table_.getFavourites(t, rec_, received.data())))
-                return code;
+            if (std::int16_t code = outcome(table_.getFavourites(t, rec_, received.data()))) return code;
             favourites_[static_cast<std::size_t>(f - 1)] = received[static_cast<std::size_t>(f - 1)];
         }
         return 0;

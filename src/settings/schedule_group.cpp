@@ -14,8 +14,7 @@ bool isSegment(std::int32_t segment) { return segment >= 1 && segment <= 7; }
 
 std::size_t slotOf(std::int32_t segment) {
     if (!isSegment(segment))
-        raise(errc::subscript_out_of_range,
-              "Meal segment " + std::to_string(segment) + " is outside 1-7");
+        raise(errc::subscript_out_of_range, "Meal segment " + std::to_string(segment) + " is outside 1-7");
     return static_cast<std::size_t>(segment - 1);
 }
 
@@ -55,9 +54,8 @@ std::int16_t Group_Schedule::saveToMeter() {
 }
 
 std::int16_t Group_Schedule::saveScheduleTypeToMeter() {
-    return guarded(kClass, "saveScheduleTypeToMeter", [&] {
-        return outcome(transport().SetScheduleSelection(rec_, toInt16(ScheduleType)));
-    });
+    return guarded(kClass, "saveScheduleTypeToMeter",
+                   [&] { return outcome(transport().SetScheduleSelection(rec_, toInt16(ScheduleType))); });
 }
 
 DateTime Group_Schedule::ScheduleTime(std::int32_t segment) const {

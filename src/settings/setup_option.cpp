@@ -9,10 +9,9 @@ namespace {
 
 // Names by MeterOptions_Enum value.
 constexpr const char* kKeyNames[] = {
-    "StripCalCode", "Beeper",   "GluUnits",      "Punctuation",  "Dateformat",
-    "Timeformat",   "Language", "CommMode",      "Baud",         "Xlate",
-    "Averaging",    "Insulinprompt", "Showlasttest", "Avg1430",  "Showclock",
-    "DST",          "BOW",      "ChoUnits",      "Pumpuse",
+    "StripCalCode", "Beeper", "GluUnits", "Punctuation", "Dateformat",    "Timeformat",   "Language",
+    "CommMode",     "Baud",   "Xlate",    "Averaging",   "Insulinprompt", "Showlasttest", "Avg1430",
+    "Showclock",    "DST",    "BOW",      "ChoUnits",    "Pumpuse",
 };
 
 }  // namespace

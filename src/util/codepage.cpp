@@ -11,10 +11,10 @@ namespace {
 constexpr char32_t kReplacement = 0xFFFD;
 
 // Characters of bytes 0x80-0x9F; the code page's five undefined bytes keep their own number.
-constexpr std::array<char32_t, 32> kHighControls = {
-    0x20AC, 0x0081, 0x201A, 0x0192, 0x201E, 0x2026, 0x2020, 0x2021, 0x02C6, 0x2030, 0x0160,
-    0x2039, 0x0152, 0x008D, 0x017D, 0x008F, 0x0090, 0x2018, 0x2019, 0x201C, 0x201D, 0x2022,
-    0x2013, 0x2014, 0x02DC, 0x2122, 0x0161, 0x203A, 0x0153, 0x009D, 0x017E, 0x0178};
+constexpr std::array<char32_t, 32> kHighControls = {0x20AC, 0x0081, 0x201A, 0x0192, 0x201E, 0x2026, 0x2020, 0x2021,
+                                                    0x02C6, 0x2030, 0x0160, 0x2039, 0x0152, 0x008D, 0x017D, 0x008F,
+                                                    0x0090, 0x2018, 0x2019, 0x201C, 0x201D, 0x2022, 0x2013, 0x2014,
+                                                    0x02DC, 0x2122, 0x0161, 0x203A, 0x0153, 0x009D, 0x017E, 0x0178};
 
 // The C0 controls a document can carry.
 bool allowedControl(char32_t c) { return c == '\t' || c == '\n' || c == '\r'; }
@@ -39,10 +39,14 @@ std::optional<char32_t> nextUtf8(std::string_view s, std::size_t& i) {
     if (lead < 0x80) return lead;
     int more = 0;
     char32_t c = 0, least = 0;
-    if (lead >= 0xC2 && lead <= 0xDF) more = 1, c = lead & 0x1F, least = 0x80;
-    else if (lead >= 0xE0 && lead <= 0xEF) more = 2, c = lead & 0x0F, least = 0x800;
-    else if (lead >= 0xF0 && lead <= 0xF4) more = 3, c = lead & 0x07, least = 0x10000;
-    else return std::nullopt;
+    if (lead >= 0xC2 && lead <= 0xDF)
+        more = 1, c = lead & 0x1F, least = 0x80;
+    else if (lead >= 0xE0 && lead <= 0xEF)
+        more = 2, c = lead & 0x0F, least = 0x800;
+    else if (lead >= 0xF0 && lead <= 0xF4)
+        more = 3, c = lead & 0x07, least = 0x10000;
+    else
+        return std::nullopt;
     for (; more > 0; --more, ++i) {
         if (i >= s.size() || (static_cast<unsigned char>(s[i]) & 0xC0) != 0x80) return std::nullopt;
         c = (c << 6) | (static_cast<unsigned char>(s[i]) & 0x3F);

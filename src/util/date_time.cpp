@@ -27,13 +27,10 @@ bool isValidCalendarDate(int y, int m, int d) {
         .ok();
 }
 
-DateTime DateTime::fromSerial(double days) {
-    return DateTime(static_cast<std::int64_t>(std::llround(days * 86400.0)));
-}
+DateTime DateTime::fromSerial(double days) { return DateTime(static_cast<std::int64_t>(std::llround(days * 86400.0))); }
 
 std::optional<DateTime> DateTime::fromParts(int y, int mo, int d, int h, int mi, int s) {
-    if (!isValidCalendarDate(y, mo, d) || h < 0 || h > 23 || mi < 0 || mi > 59 || s < 0 || s > 59)
-        return std::nullopt;
+    if (!isValidCalendarDate(y, mo, d) || h < 0 || h > 23 || mi < 0 || mi > 59 || s < 0 || s > 59) return std::nullopt;
     sys_days date = year_month_day(std::chrono::year(y), std::chrono::month(static_cast<unsigned>(mo)),
                                    std::chrono::day(static_cast<unsigned>(d)));
     std::int64_t dayNumber = (date - kDayZero).count();

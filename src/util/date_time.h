@@ -16,8 +16,8 @@ public:
     // From a serial day number; the fraction is the time of day.
     static DateTime fromSerial(double days);
     // From calendar parts; nothing when any part is out of its range (30 February included).
-    static std::optional<DateTime> fromParts(int year, int month, int day, int hour = 0,
-                                             int minute = 0, int second = 0);
+    static std::optional<DateTime> fromParts(int year, int month, int day, int hour = 0, int minute = 0,
+                                             int second = 0);
     // From seconds since day 0.
     static DateTime fromSeconds(std::int64_t seconds) { return DateTime(seconds); }
 

@@ -107,12 +107,10 @@ bool splitThree(std::string_view s, char sep, std::array<std::string_view, 3>& p
     return s.find(sep) == std::string_view::npos;
 }
 
-std::optional<DateLayout> layoutOf(std::string_view text, std::string_view separator,
-                                   std::string_view pattern) {
+std::optional<DateLayout> layoutOf(std::string_view text, std::string_view separator, std::string_view pattern) {
     char sep = DateSeparator(separator);
     std::array<std::string_view, 3> textParts, patternParts;
-    if (!splitThree(text, sep, textParts) || !splitThree(pattern, sep, patternParts))
-        return std::nullopt;
+    if (!splitThree(text, sep, textParts) || !splitThree(pattern, sep, patternParts)) return std::nullopt;
     DateLayout layout;
     for (std::size_t i = 0; i < 3; ++i) {
         std::string_view p = trim(patternParts[i]);
@@ -238,8 +236,8 @@ bool IsValidDate(std::string_view text, std::string_view separator, std::string_
     std::string_view trimmedSep = trim(separator);
     bool twoSeparators = (!trimmedSep.empty() && CountOccurrences(text, trimmedSep) == 2) ||
                          (!separator.empty() && CountOccurrences(text, separator) == 2);
-    return twoSeparators && IsValidMonth(text, separator, pattern) &&
-           IsValidYear(text, separator, pattern) && IsValidDay(text, separator, pattern);
+    return twoSeparators && IsValidMonth(text, separator, pattern) && IsValidYear(text, separator, pattern) &&
+           IsValidDay(text, separator, pattern);
 }
 
 char DateSeparator(std::string_view separator) {
@@ -250,8 +248,7 @@ char DateSeparator(std::string_view separator) {
 std::size_t CountOccurrences(std::string_view s, std::string_view sub) {
     if (sub.empty()) return 0;
     std::size_t count = 0;
-    for (std::size_t at = s.find(sub); at != std::string_view::npos; at = s.find(sub, at + sub.size()))
-        ++count;
+    for (std::size_t at = s.find(sub); at != std::string_view::npos; at = s.find(sub, at + sub.size())) ++count;
     return count;
 }
 
@@ -292,8 +289,7 @@ bool IsValidDay(std::string_view text, std::string_view separator, std::string_v
     if (!allDigits(day) || !allDigits(year)) return false;
     long long m = allDigits(month) ? digitsValue(month) : monthByName(month);
     long long y = digitsValue(year), d = digitsValue(day);
-    return y >= 1 && y <= 9999 && m >= 1 && m <= 12 && d >= 1 && d <= 31 &&
-           isValidCalendarDate(int(y), int(m), int(d));
+    return y >= 1 && y <= 9999 && m >= 1 && m <= 12 && d >= 1 && d <= 31 && isValidCalendarDate(int(y), int(m), int(d));
 }
 
 bool GetContinueFlag() { return continueFlag; }

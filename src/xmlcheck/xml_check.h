@@ -224,8 +224,7 @@ private:
 
     void document() {
         if (startsWith("\xEF\xBB\xBF")) p_ += 3;
-        if (startsWith("<?xml") && p_ + 5 < s_.size() && (isSpace(s_[p_ + 5]) || s_[p_ + 5] == '?'))
-            declaration();
+        if (startsWith("<?xml") && p_ + 5 < s_.size() && (isSpace(s_[p_ + 5]) || s_[p_ + 5] == '?')) declaration();
         misc();
         if (startsWith("<!DOCTYPE")) {
             doctype();

@@ -7,12 +7,12 @@
 
 static int failures = 0;
 
-#define CHECK(cond)                                                              \
-    do {                                                                         \
-        if (!(cond)) {                                                           \
-            fprintf(stderr, "%s:%d: failed: %s\n", __FILE__, __LINE__, #cond);   \
-            ++failures;                                                          \
-        }                                                                        \
+#define CHECK(cond)                                                            \
+    do {                                                                       \
+        if (!(cond)) {                                                         \
+            fprintf(stderr, "%s:%d: failed: %s\n", __FILE__, __LINE__, #cond); \
+            ++failures;                                                        \
+        }                                                                      \
     } while (0)
 
 int main(int argc, char** argv) {
@@ -24,8 +24,9 @@ int main(int argc, char** argv) {
     varnel_doc* device = varnel_doc_new_kind(1);
     varnel_doc* conn = varnel_doc_new();
     CHECK(status && device && conn);
-    CHECK(varnel_doc_load(conn, "<ConnectionInfo><Ports><COM><PortsToSearch>1</PortsToSearch>"
-                                "</COM></Ports></ConnectionInfo>") == 0);
+    CHECK(varnel_doc_load(conn,
+                          "<ConnectionInfo><Ports><COM><PortsToSearch>1</PortsToSearch>"
+                          "</COM></Ports></ConnectionInfo>") == 0);
     CHECK(varnel_doc_load(conn, "<ConnectionInfo>") != 0);
     char* xml = varnel_doc_xml(conn);
     CHECK(xml && strstr(xml, "<PortsToSearch>1</PortsToSearch>"));

@@ -60,8 +60,10 @@ struct CInterface : ::testing::Test {
         ASSERT_NE(sim, nullptr);
         varnel::setThreadClock(std::make_shared<varnel::ManualClock>(1000));
         ASSERT_NE(c = varnel_new(nullptr), nullptr);
-        varnel_on_progress(c, [](int16_t* p, void* e) { static_cast<Events*>(e)->progress.push_back(*p); }, &events);
-        varnel_on_complete(c, [](void* e) { ++static_cast<Events*>(e)->completions; }, &events);
+        varnel_on_progress(
+            c, [](int16_t* p, void* e) { static_cast<Events*>(e)->progress.push_back(*p); }, &events);
+        varnel_on_complete(
+            c, [](void* e) { ++static_cast<Events*>(e)->completions; }, &events);
         ASSERT_EQ(reinterpret_cast<int (*)(int)>(dlsym(sim, "vxsim_select_type"))(4), 0);
         DocPtr conn = loaded(kConnection);
         ASSERT_EQ(varnel_discover_device(c, &rec, device.get(), conn.get(), status.get()), ME_SUCCESS);
@@ -87,8 +89,8 @@ TEST(CDocuments, KindsAndMalformedText) {
 
     DocPtr d = loaded("<A><B x=\"1\">t</B></A>");
     const std::string before = text(d.get());
-    for (const char* bad : {"", "<A>", "<A></B>", "<A x='1' x='2'/>", "<A>&undeclared;</A>", "<A/><B/>",
-                            "<A>\x01</A>", "<!DOCTYPE A [<!ENTITY e \"x\">]><A>&e;</A>", static_cast<const char*>(nullptr)}) {
+    for (const char* bad : {"", "<A>", "<A></B>", "<A x='1' x='2'/>", "<A>&undeclared;</A>", "<A/><B/>", "<A>\x01</A>",
+                            "<!DOCTYPE A [<!ENTITY e \"x\">]><A>&e;</A>", static_cast<const char*>(nullptr)}) {
         EXPECT_NE(varnel_doc_load(d.get(), bad), 0) << (bad ? bad : "NULL");
         EXPECT_EQ(text(d.get()), before) << (bad ? bad : "NULL");
     }
@@ -140,15 +142,17 @@ TEST_F(CInterface, MissingArgumentsAreRefusedWithoutTouchingAnything) {
     DocPtr conn = loaded(kConnection), d = doc(5);
     varnel_doc *dv = device.get(), *st = status.get();
     const std::string statusBefore = text(st), deviceBefore = text(dv);
-    for (std::int32_t got : {
-             varnel_discover_device(nullptr, &rec, dv, conn.get(), st), varnel_discover_device(c, nullptr, dv, conn.get(), st),
-             varnel_discover_device(c, &rec, nullptr, conn.get(), st), varnel_discover_device(c, &rec, dv, nullptr, st),
-             varnel_discover_device(c, &rec, dv, conn.get(), nullptr), varnel_set_device_settings(c, &rec, dv, nullptr, st),
-             varnel_get_device_settings(c, &rec, dv, nullptr, 1, st, nullptr),
-             varnel_get_device_caps(c, &rec, nullptr, d.get(), 1, st, nullptr),
-             varnel_get_readings(c, &rec, dv, nullptr, nullptr, st, nullptr),
-             varnel_get_readings(c, &rec, dv, d.get(), nullptr, nullptr, nullptr),
-             varnel_clear_meter(c, &rec, nullptr, st), varnel_close_meter(c, nullptr), varnel_close_meter(nullptr, &rec)})
+    for (std::int32_t got :
+         {varnel_discover_device(nullptr, &rec, dv, conn.get(), st),
+          varnel_discover_device(c, nullptr, dv, conn.get(), st),
+          varnel_discover_device(c, &rec, nullptr, conn.get(), st), varnel_discover_device(c, &rec, dv, nullptr, st),
+          varnel_discover_device(c, &rec, dv, conn.get(), nullptr),
+          varnel_set_device_settings(c, &rec, dv, nullptr, st),
+          varnel_get_device_settings(c, &rec, dv, nullptr, 1, st, nullptr),
+          varnel_get_device_caps(c, &rec, nullptr, d.get(), 1, st, nullptr),
+          varnel_get_readings(c, &rec, dv, nullptr, nullptr, st, nullptr),
+          varnel_get_readings(c, &rec, dv, d.get(), nullptr, nullptr, nullptr),
+          varnel_clear_meter(c, &rec, nullptr, st), varnel_close_meter(c, nullptr), varnel_close_meter(nullptr, &rec)})
         EXPECT_EQ(got, ME_BAD_PARAMETER);
     EXPECT_EQ(text(st), statusBefore);
     EXPECT_EQ(text(dv), deviceBefore);
@@ -174,7 +178,10 @@ TEST_F(CInterface, UnexpectedErrorsReachTheClientUntilTheNextRequest) {
     EXPECT_EQ(varnel_error_text(c), nullptr);
 
     // Whatever a handler raises stays on this side of the boundary, with its own text.
-    struct Raised { void (*handler)(void*); const char* reason; };
+    struct Raised {
+        void (*handler)(void*);
+        const char* reason;
+    };
     for (const Raised& r : {Raised{[](void*) { throw std::bad_alloc(); }, "Out of memory"},
                             Raised{[](void*) { throw std::runtime_error("handler failed"); }, "handler failed"}}) {
         varnel_on_complete(c, r.handler, nullptr);

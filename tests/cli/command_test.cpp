@@ -32,8 +32,8 @@ TEST_F(VarnelCommand, ReadingsAsXmlOrCsvAndTheMeterErasedOnlyOnceTheyAreSaved) {
     const auto entries = static_cast<std::size_t>(std::distance(all.begin(), all.end()));
 
     const fs::path csv = dir / "log.csv";
-    r = varnel({"readings", "--csv", "-o", csv.string(), "--clear-after", "--sim-profile", meter.string(),
-                "--sim-save", meter.string()});
+    r = varnel({"readings", "--csv", "-o", csv.string(), "--clear-after", "--sim-profile", meter.string(), "--sim-save",
+                meter.string()});
     ASSERT_EQ(r.status, 0) << r.err;
     const auto rows = lines(slurp(csv));
     ASSERT_EQ(rows.size(), entries + 1);

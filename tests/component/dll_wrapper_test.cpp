@@ -109,13 +109,18 @@ TEST_F(Requests, CloseReleasesThePortQuietly) {
 TEST_F(Requests, DeviceInformationChecksAndUnexpectedErrors) {
     discover(eDunmark);
     const std::string bad = "-17/-19/Bad parameter passed to the function ; ";
-    struct Case { std::string port, sn, type; std::int32_t result; std::string group; };  // group "" for none
+    struct Case {
+        std::string port, sn, type;
+        std::int32_t result;
+        std::string group;
+    };  // group "" for none
     for (const Case& c : {
              Case{"abc", "dnm3001296", "3.0", 0, ""},  // a port that is no number is port 0; case is ignored
              Case{"1", "", "0", ME_BAD_PARAMETER, bad + "Device Type from Device Info XML is invalid"},
              // A type that is no whole number is compared as it is, not rounded.
-             Case{"1", "", "3.5", ME_FAIL, "-8/-8/Different device detected ; Device Type from Device Info XML - 3.5 "
-                                           "Device Type from device - 3 do not match"},
+             Case{"1", "", "3.5", ME_FAIL,
+                  "-8/-8/Different device detected ; Device Type from Device Info XML - 3.5 "
+                  "Device Type from device - 3 do not match"},
          }) {
         SCOPED_TRACE(c.port + "|" + c.sn + "|" + c.type);
         fresh();

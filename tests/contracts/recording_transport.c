@@ -62,13 +62,13 @@ static void long_operation(METER_REC* rec) {
 #define RECORD_IN_LIST(type, name) keep((intptr_t)name)
 #define RECORD_OUT_LIST(type, name) keep((intptr_t)name), memset(name, 0x5A, VX_LIST_LENGTH * sizeof *name)
 
-#define DEFINE(ret, name, ...)                                                \
-    EXPORT ret name(VX_C_PARAMS(__VA_ARGS__)) {                               \
-        METER_REC* rec_seen = 0;                                              \
-        start();                                                              \
-        VX_EACH(RECORD, __VA_ARGS__)                                          \
+#define DEFINE(ret, name, ...)                                                                  \
+    EXPORT ret name(VX_C_PARAMS(__VA_ARGS__)) {                                                 \
+        METER_REC* rec_seen = 0;                                                                \
+        start();                                                                                \
+        VX_EACH(RECORD, __VA_ARGS__)                                                            \
         if (rec_seen && strcmp(#name, "vb_Clear_Meter_Datalog") == 0) long_operation(rec_seen); \
-        return finish(#name);                                                 \
+        return finish(#name);                                                                   \
     }
 VX_METER_FUNCTIONS(DEFINE)
 

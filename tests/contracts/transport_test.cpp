@@ -8,9 +8,9 @@
 #include <array>
 #include <filesystem>
 #include <functional>
+#include <initializer_list>
 #include <map>
 #include <memory>
-#include <initializer_list>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -33,7 +33,9 @@ struct Recorder {
     void* handle = dlopen(RECORDING_TRANSPORT_FULL, RTLD_NOW);
     ~Recorder() { dlclose(handle); }
     template <class T>
-    T& get(const char* name) { return *static_cast<T*>(dlsym(handle, name)); }
+    T& get(const char* name) {
+        return *static_cast<T*>(dlsym(handle, name));
+    }
     const char* const& name = get<const char*>("last_name");
     const std::intptr_t* args = &get<std::intptr_t>("last_args");
     const int& count = get<int>("last_count");
@@ -84,10 +86,11 @@ struct Case {
     std::function<std::int32_t(Transport&, Arguments&)> call;
 };
 const std::vector<Case>& everyFunction() {
-#define VARNEL_TEST_CASE(ret, fn, ...)                                                         \
-    {#fn, {VX_COMMA_LIST(VX_EACH(VARNEL_TEST_PARAM_NAME, __VA_ARGS__))},                        \
-     [](Transport& t, Arguments& a) -> std::int32_t {                                          \
-         return t.fn(VX_COMMA_LIST(VX_EACH(VARNEL_TEST_ARG, __VA_ARGS__)));                    \
+#define VARNEL_TEST_CASE(ret, fn, ...)                                      \
+    {#fn,                                                                   \
+     {VX_COMMA_LIST(VX_EACH(VARNEL_TEST_PARAM_NAME, __VA_ARGS__))},         \
+     [](Transport& t, Arguments& a) -> std::int32_t {                       \
+         return t.fn(VX_COMMA_LIST(VX_EACH(VARNEL_TEST_ARG, __VA_ARGS__))); \
      }},
     static const std::vector<Case> cases = {VX_METER_FUNCTIONS(VARNEL_TEST_CASE)};
 #undef VARNEL_TEST_CASE

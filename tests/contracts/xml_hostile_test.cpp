@@ -66,7 +66,7 @@ TEST(XMLHostileText, LoadRefusesWithWhatAndWhereAndChangesNothing) {
         {"entity", "<!DOCTYPE R><R>&x;</R>", "undeclared entity x"},
         {"entity", "<?xml version='1.0' standalone='yes'?><!DOCTYPE R SYSTEM 'r.dtd'><R>&x;</R>", "undeclared entity"},
         {"UTF-8", "<R>caf\xE9</R>", "invalid UTF-8 (byte 0xE9) at line 1, offset 6"},
-        {"UTF-8", "<R a='\xC0\xAF'/>", "invalid UTF-8 (byte 0xC0)"},         // overlong "/"
+        {"UTF-8", "<R a='\xC0\xAF'/>", "invalid UTF-8 (byte 0xC0)"},        // overlong "/"
         {"UTF-8", "<R>\xED\xA0\x80</R>", "invalid UTF-8 (byte 0xED)"},      // an encoded surrogate
         {"UTF-8", "<R>\xF4\x90\x80\x80</R>", "invalid UTF-8 (byte 0xF4)"},  // beyond U+10FFFF
         {"UTF-8", "<R>\xE2\x82</R>", "invalid UTF-8 (byte 0xE2)"},          // cut short
@@ -74,8 +74,9 @@ TEST(XMLHostileText, LoadRefusesWithWhatAndWhereAndChangesNothing) {
         {"UTF-8", "<R>\xEF\xBF\xBE</R>", "U+FFFE, which XML does not allow"},
         {"duplicate", "<R a='1' a='2'/>", "duplicate attribute a at line 1, offset 9"},
         {"duplicate", "<R><S x='1'\n y='2' x='1'/></R>", "duplicate attribute x at line 2"},
-        {"duplicate", "<R a0='' a1='' a2='' a3='' a4='' a5='' a6='' a7='' a8='' a9='' b0='' b1='' b2='' b3='' "
-                      "b4='' b5='' b6='' b7='' a3=''/>",
+        {"duplicate",
+         "<R a0='' a1='' a2='' a3='' a4='' a5='' a6='' a7='' a8='' a9='' b0='' b1='' b2='' b3='' "
+         "b4='' b5='' b6='' b7='' a3=''/>",
          "duplicate attribute a3"},
         {"DTD", "<!DOCTYPE R [<!ENTITY e 'x'>]><R>&e;</R>", "internal subset"},
         {"DTD", "<!DOCTYPE R PUBLIC 'a{b}' 'c'><R/>", "public identifier"},
@@ -114,14 +115,15 @@ TEST(XMLHostileText, WritingRefusesTextsThatAreNotXmlCharacters) {
     x.AddChildElement("C", "", "c");
     const std::string before = x.XML();
     const std::pair<std::string, std::string> bad[] = {
-        {"\x01", "character U+0001"},       {"ok\x1F", "character U+001F, which XML does not allow at byte 2"},
-        {"caf\xE9", "invalid UTF-8"},       {"\xC0\xAF", "invalid UTF-8"},
-        {"\xED\xA0\x80", "invalid UTF-8"},  {"x\xEF\xBF\xBE", "character U+FFFE"},
+        {"\x01", "character U+0001"},      {"ok\x1F", "character U+001F, which XML does not allow at byte 2"},
+        {"caf\xE9", "invalid UTF-8"},      {"\xC0\xAF", "invalid UTF-8"},
+        {"\xED\xA0\x80", "invalid UTF-8"}, {"x\xEF\xBF\xBE", "character U+FFFE"},
         {"\xE2\x82", "invalid UTF-8"},
     };
     for (const auto& [value, reason] : bad) {
         SCOPED_TRACE(value);
-        expectError([&] { x.AddElement("N", value); }, errc::document_failure, "AddElement: the text for 'N' has " + reason);
+        expectError([&] { x.AddElement("N", value); }, errc::document_failure,
+                    "AddElement: the text for 'N' has " + reason);
         expectError([&] { x.AddChildElement("N", "", value); }, errc::document_failure, "AddChildElement: the text");
         expectError([&] { x.SetAttribute("a", value); }, errc::document_failure, "SetAttribute: the value for 'a' has");
         expectError([&] { x.SetChildAttribute("a", value); }, errc::document_failure, reason);
@@ -281,10 +283,11 @@ TEST(XMLHostileText, RunningOutOfMemoryIsAComponentError) {
     // In a fresh process: memory freed by earlier tests would be reused
     // without growing the address space, and hide the shortage.
     if (!std::getenv("VARNEL_XML_FRESH_PROCESS")) {
-        const std::string self = "VARNEL_XML_FRESH_PROCESS=1 '" + std::filesystem::read_symlink("/proc/self/exe").string() +
-                                 "' --gtest_brief=1 --gtest_filter=" +
-                                 std::string(::testing::UnitTest::GetInstance()->current_test_info()->test_suite_name()) +
-                                 "." + ::testing::UnitTest::GetInstance()->current_test_info()->name();
+        const std::string self =
+            "VARNEL_XML_FRESH_PROCESS=1 '" + std::filesystem::read_symlink("/proc/self/exe").string() +
+            "' --gtest_brief=1 --gtest_filter=" +
+            std::string(::testing::UnitTest::GetInstance()->current_test_info()->test_suite_name()) + "." +
+            ::testing::UnitTest::GetInstance()->current_test_info()->name();
         EXPECT_EQ(std::system(self.c_str()), 0);
         return;
     }
@@ -295,11 +298,23 @@ TEST(XMLHostileText, RunningOutOfMemoryIsAComponentError) {
         for (int i = 0; i < elements; ++i) x.AddElement("E", text);
     };
     // Building, writing, copying and loading with too little memory left.
-    EXPECT_EQ(underMemoryLimit(8 << 20, [] {}, [&] { fill(1 << 30); }), 0);
-    EXPECT_EQ(underMemoryLimit(4 << 20, [&] { fill(4000); }, [&] { (void)x.XML(); }), 0);
-    EXPECT_EQ(underMemoryLimit(4 << 20, [&] { fill(4000); }, [&] { XMLWrapper copy(x); }), 0);
+    EXPECT_EQ(underMemoryLimit(
+                  8 << 20, [] {}, [&] { fill(1 << 30); }),
+              0);
+    EXPECT_EQ(underMemoryLimit(
+                  4 << 20, [&] { fill(4000); }, [&] { (void)x.XML(); }),
+              0);
+    EXPECT_EQ(underMemoryLimit(
+                  4 << 20, [&] { fill(4000); }, [&] { XMLWrapper copy(x); }),
+              0);
     std::string big;
-    EXPECT_EQ(underMemoryLimit(4 << 20, [&] { fill(4000); big = x.XML(); }, [&] { (void)XMLWrapper().LoadXML(big); }),
+    EXPECT_EQ(underMemoryLimit(
+                  4 << 20,
+                  [&] {
+                      fill(4000);
+                      big = x.XML();
+                  },
+                  [&] { (void)XMLWrapper().LoadXML(big); }),
               0);
 }
 #endif

@@ -12,8 +12,8 @@
 #include <utility>
 #include <vector>
 
-#include "support/wrapper_fixture.h"
 #include "support/expect_error.h"
+#include "support/wrapper_fixture.h"
 #include "varnel/component_error.h"
 
 using namespace varnel;
@@ -60,13 +60,18 @@ TEST(XMLWrapperTest, EmptyDocumentRaisesMissingObjectUntilAnElementIsAdded) {
     EXPECT_TRUE(x.IsEmpty());
     EXPECT_EQ(x.XML(), "");
     const std::vector<std::pair<const char*, std::function<void()>>> ops = {
-        {"GetChildCount", [&] { x.GetChildCount(); }}, {"GetRootName", [&] { x.GetRootName(); }},
-        {"MoveToRoot", [&] { x.MoveToRoot(); }}, {"MoveToChild", [&] { x.MoveToChild("A"); }},
-        {"SelectElement", [&] { x.SelectElement("A"); }}, {"GetChildValue", [&] { x.GetChildValue("A"); }},
-        {"GetChildValueAt", [&] { x.GetChildValueAt(0); }}, {"GetChildName", [&] { x.GetChildName(0); }},
+        {"GetChildCount", [&] { x.GetChildCount(); }},
+        {"GetRootName", [&] { x.GetRootName(); }},
+        {"MoveToRoot", [&] { x.MoveToRoot(); }},
+        {"MoveToChild", [&] { x.MoveToChild("A"); }},
+        {"SelectElement", [&] { x.SelectElement("A"); }},
+        {"GetChildValue", [&] { x.GetChildValue("A"); }},
+        {"GetChildValueAt", [&] { x.GetChildValueAt(0); }},
+        {"GetChildName", [&] { x.GetChildName(0); }},
         {"GetChildAttribute", [&] { x.GetChildAttribute("A", "b"); }},
         {"GetChildAttributeAt", [&] { x.GetChildAttributeAt(0, "b"); }},
-        {"CountElements", [&] { x.CountElements("A"); }}, {"SetAttribute", [&] { x.SetAttribute("a", "1"); }},
+        {"CountElements", [&] { x.CountElements("A"); }},
+        {"SetAttribute", [&] { x.SetAttribute("a", "1"); }},
         {"AddChildElement", [&] { x.AddChildElement("A"); }},
         {"SetChildAttribute", [&] { x.SetChildAttribute("a", "1"); }},
     };
@@ -166,8 +171,8 @@ TEST(XMLWrapperTest, InitDocumentSkeletonsStartAfresh) {
 TEST(XMLWrapperTest, NamesMustBeXmlNames) {
     XMLWrapper x = statusDoc();
     const std::string before = x.XML();
-    for (const std::string& bad : {""s, "1abc"s, "-a"s, ".a"s, "a b"s, "<x>"s, "a&b"s, "a>"s, "a\"b"s, "a=b"s,
-                                   "a/b"s, "a\x01"s, "\xC3"s, "a\0b"s}) {
+    for (const std::string& bad : {""s, "1abc"s, "-a"s, ".a"s, "a b"s, "<x>"s, "a&b"s, "a>"s, "a\"b"s, "a=b"s, "a/b"s,
+                                   "a\x01"s, "\xC3"s, "a\0b"s}) {
         SCOPED_TRACE(bad);
         expectError([&] { x.AddElement(bad); }, errc::document_failure, "not a valid XML element name");
         expectError([&] { x.AddChildElement(bad); }, errc::document_failure, "element name");
@@ -179,7 +184,10 @@ TEST(XMLWrapperTest, NamesMustBeXmlNames) {
     expectError([&] { empty.AddElement("9"); }, errc::document_failure, "'9'");
     EXPECT_TRUE(empty.IsEmpty());
 
-    for (const std::string good : {"a", "_x", "A1-b.c", "ns:tag", "Gr\xC3\xB6\xC3\x9F" "e", "\xE6\x97\xA5"}) {
+    for (const std::string good : {"a", "_x", "A1-b.c", "ns:tag",
+                                   "Gr\xC3\xB6\xC3\x9F"
+                                   "e",
+                                   "\xE6\x97\xA5"}) {
         x.AddElement(good, "t");
         x.SetAttribute(good, "v");
         x.AddChildElement(good);
@@ -194,7 +202,7 @@ TEST(XMLWrapperTest, NavigationAndReading) {
     EXPECT_EQ(x.GetChildName(0), "B");
     expectError([&] { x.MoveToChild("C"); }, errc::missing_object, "'C'");
     expectError([&] { x.MoveToChild("b"); }, errc::missing_object, "'b'");  // case matters
-    x.MoveToChild("B");  // the failures left A current
+    x.MoveToChild("B");                                                     // the failures left A current
     EXPECT_EQ(x.GetRootName(), "R");
     x.MoveToRoot();
     EXPECT_EQ(x.GetChildAttributeAt(1, "n"), "2");
@@ -241,8 +249,19 @@ TEST(XMLWrapperTest, NavigationAndReading) {
 
 TEST(XMLWrapperTest, TextsAndAttributesRoundTripThroughXmlText) {
     const std::vector<std::string> texts = {
-        "plain", "a < b && c > d", "quote \" and 'apos'", "]]> and <![CDATA[", "line1\nline2", "tab\there",
-        "  padded  ", "   ", "\n", "Gr\xC3\xB6\xC3\x9F" "e \xE2\x82\xAC", "&amp; literal", "\xF0\x9F\x98\x80 \xEF\xBF\xBD",
+        "plain",
+        "a < b && c > d",
+        "quote \" and 'apos'",
+        "]]> and <![CDATA[",
+        "line1\nline2",
+        "tab\there",
+        "  padded  ",
+        "   ",
+        "\n",
+        "Gr\xC3\xB6\xC3\x9F"
+        "e \xE2\x82\xAC",
+        "&amp; literal",
+        "\xF0\x9F\x98\x80 \xEF\xBF\xBD",
     };
     XMLWrapper x = newDoc(doc_kind::datalog);
     x.SelectElement("Records");
@@ -288,11 +307,32 @@ TEST(XMLWrapperTest, LoadXmlReplacesTheDocumentOrRefusesAndChangesNothing) {
 
     // Malformed or too deep text is refused and changes nothing.
     const char* bad[] = {
-        "", "   ", "just text", "<R>", "<R></S>", "<R><A></R></A>", "<R a='1' a='2'/>", "<R a=1/>", "<R a='x<y'/>",
-        "<R>&</R>", "<R>&undeclared;</R>", "<R>&#0;</R>", "<R>&#xD800;</R>", "<R>&#xZZ;</R>", "<R>a ]]> b</R>",
-        "<R/><S/>", "<R/>trailing", "leading<R/>", "<R><!-- a -- b --></R>", "<R><![CDATA[x</R>", "<1R/>",
-        "<R><a b='1'c='2'/></R>", "<R/><?xml version='1.0'?>", "<R><!ELEMENT x ANY></R>",
-        "<!DOCTYPE R [<!ENTITY e 'x'>", "<R attr='unterminated/>",
+        "",
+        "   ",
+        "just text",
+        "<R>",
+        "<R></S>",
+        "<R><A></R></A>",
+        "<R a='1' a='2'/>",
+        "<R a=1/>",
+        "<R a='x<y'/>",
+        "<R>&</R>",
+        "<R>&undeclared;</R>",
+        "<R>&#0;</R>",
+        "<R>&#xD800;</R>",
+        "<R>&#xZZ;</R>",
+        "<R>a ]]> b</R>",
+        "<R/><S/>",
+        "<R/>trailing",
+        "leading<R/>",
+        "<R><!-- a -- b --></R>",
+        "<R><![CDATA[x</R>",
+        "<1R/>",
+        "<R><a b='1'c='2'/></R>",
+        "<R/><?xml version='1.0'?>",
+        "<R><!ELEMENT x ANY></R>",
+        "<!DOCTYPE R [<!ENTITY e 'x'>",
+        "<R attr='unterminated/>",
     };
     x = statusDoc();
     x.SelectElement("ErrCode");
@@ -344,7 +384,7 @@ TEST(XMLWrapperTest, EntitiesAndDtdsAreNeverExpanded) {
         XMLWrapper x = loaded(text);
         EXPECT_EQ(x.GetChildValue("A"), "&ext;");
         EXPECT_EQ(x.GetChildAttribute("B", "attr"), "&ext;");
-        EXPECT_EQ(x.XML().find("DOCTYPE"), std::string::npos);    // dropped
+        EXPECT_EQ(x.XML().find("DOCTYPE"), std::string::npos);   // dropped
         EXPECT_EQ(loaded(x.XML()).GetChildValue("A"), "&ext;");  // written back as plain text
     }
     // Entities would be declared in an internal subset: refused, whatever it holds.
@@ -400,8 +440,8 @@ TEST(XMLWrapperTest, CopiesAreDeepAndKeepThePositionsMovesLeaveAnEmptyDocument) 
     x.SelectElement("DeviceInfo");
 
     XMLWrapper c(x);
-    c.AddElement("SN", "copy");  // current: DeviceInfo
-    c.AddChildElement("Sub");    // last added: SN, in the copy only
+    c.AddElement("SN", "copy");        // current: DeviceInfo
+    c.AddChildElement("Sub");          // last added: SN, in the copy only
     x.SetChildAttribute("orig", "1");  // the original's last child is still Total
     EXPECT_EQ(x.GetChildCount(), 0);
     EXPECT_EQ(c.GetChildCount(), 1);

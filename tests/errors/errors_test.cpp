@@ -15,8 +15,9 @@ TEST(ErrPropagator, TraceGrowsOutermostFirstAndCleanupSeesIt) {
     std::string seen;
     const std::string trace = test::unexpectedTrace([&] {
         guarded("A", "outer", [&] {
-            guarded("B", "mid", [] { guarded("C", "inner", [] { throw std::out_of_range("x"); }); },
-                    [&](const IError& e) { seen = e.ErrorTrace; });
+            guarded(
+                "B", "mid", [] { guarded("C", "inner", [] { throw std::out_of_range("x"); }); },
+                [&](const IError& e) { seen = e.ErrorTrace; });
         });
     });
     EXPECT_EQ(trace, std::to_string(errc::subscript_out_of_range) + " outer --> mid --> inner --> ");
@@ -42,17 +43,37 @@ TEST(Rounding, HalvesToEvenAndOverflowRaises) {
 
 TEST(ErrorDescription, EveryListedCodeHasItsTextAndNoOtherCodeHasOne) {
     const std::map<long long, const char*> texts = {
-        {0, "Operation completed successfully"}, {-1, "Checksum error"}, {-2, "Timeout error"},
-        {-3, "Communication error"}, {-4, "Datalog comparison failure"}, {-6, "Datalog empty return code"},
-        {-7, "Memory allocation failure"}, {-8, "Different device detected"}, {-9, "Data failed validation"},
-        {-11, "Function is not supported"}, {-13, "No device found"}, {-14, "Meter is in Reset Meter mode"},
-        {-15, "No serial ports found on the system"}, {-17, "Operation failed"},
-        {-18, "Serial port has not been opened yet"}, {-19, "Bad parameter passed to the function"},
-        {-20, "General overflow error"}, {-21, "No data received from serial port"},
-        {-22, "Different device detected"}, {-23, "ESC was used to break out of delay"}, {-25, "Unsupported ports"},
-        {-26, "Bad device information"}, {-27, "CLSIDFromProgID failed"}, {-28, "CoCreateInstance failed"},
-        {-29, "DispEventAdvise failed"}, {-30, "DispEventUnadvise failed"}, {-31, "Partial success"},
-        {-32, "Fatal error"}, {-33, "Invalid XML"}, {-34, "Invalid registry entries"}, {-35, "Bad Device Block"},
+        {0, "Operation completed successfully"},
+        {-1, "Checksum error"},
+        {-2, "Timeout error"},
+        {-3, "Communication error"},
+        {-4, "Datalog comparison failure"},
+        {-6, "Datalog empty return code"},
+        {-7, "Memory allocation failure"},
+        {-8, "Different device detected"},
+        {-9, "Data failed validation"},
+        {-11, "Function is not supported"},
+        {-13, "No device found"},
+        {-14, "Meter is in Reset Meter mode"},
+        {-15, "No serial ports found on the system"},
+        {-17, "Operation failed"},
+        {-18, "Serial port has not been opened yet"},
+        {-19, "Bad parameter passed to the function"},
+        {-20, "General overflow error"},
+        {-21, "No data received from serial port"},
+        {-22, "Different device detected"},
+        {-23, "ESC was used to break out of delay"},
+        {-25, "Unsupported ports"},
+        {-26, "Bad device information"},
+        {-27, "CLSIDFromProgID failed"},
+        {-28, "CoCreateInstance failed"},
+        {-29, "DispEventAdvise failed"},
+        {-30, "DispEventUnadvise failed"},
+        {-31, "Partial success"},
+        {-32, "Fatal error"},
+        {-33, "Invalid XML"},
+        {-34, "Invalid registry entries"},
+        {-35, "Bad Device Block"},
         {-36, "Invalid Handle of Port"},
     };
     // -10 (clock error) and -16 (unknown) have no text of their own.

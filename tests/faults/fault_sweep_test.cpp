@@ -42,9 +42,9 @@ struct Fault {
 // What one run of a request left behind.
 struct Outcome {
     std::int32_t result = 0;
-    std::string raised;   // an unexpected error, "" when none
-    std::string output;   // the answer document, the meter clock value blanked
-    std::string status;   // the status document as written
+    std::string raised;  // an unexpected error, "" when none
+    std::string output;  // the answer document, the meter clock value blanked
+    std::string status;  // the status document as written
     sim::MeterProfile meterBefore, meterAfter;
     std::map<std::string, int> calls;  // transport calls the request made
     std::string recovery;              // "" when a fresh discover and readings worked
@@ -209,8 +209,10 @@ std::string editedSettings(const std::string& current) {
     if (pugi::xml_node lang = s.child("Language"); lang && lang.attribute("Mode").as_int() == 1)
         lang.attribute("Val").set_value("2");
     for (pugi::xml_node n : s.child("Insulins").child("Custom").children())
-        if (n.text().as_int() == 12) n.attribute("Txt").set_value("Night");
-        else if (n.text().as_int() == 13) n.attribute("Txt").set_value("BolusX");
+        if (n.text().as_int() == 12)
+            n.attribute("Txt").set_value("Night");
+        else if (n.text().as_int() == 13)
+            n.attribute("Txt").set_value("BolusX");
     for (pugi::xml_node n : s.child("Pills").child("Custom").children())
         if (n.text().as_int() == 7) n.attribute("Txt").set_value("Noon");
     if (pugi::xml_node fav = s.child("Insulins").child("Favorite")) {
@@ -270,15 +272,27 @@ const std::vector<MeterItem>& meterItems() {
     static const std::vector<MeterItem> items = [] {
         using P = sim::MeterProfile;
         std::vector<MeterItem> v = {
-            whole("type", &P::type), whole("port", &P::port), whole("serial", &P::serial),
-            whole("identity serial", &P::identitySerial), whole("firmware", &P::firmware), whole("name", &P::name),
-            whole("languages", &P::languages), whole("events", &P::events), whole("insulin kinds", &P::insulinKinds),
-            whole("plasma flag", &P::plasmaCalibrated), whole("initialised flag", &P::initializedFlag),
-            whole("capacity", &P::maxRecords), whole("datalog", &P::datalog),
-            whole("binary datalog", &P::binaryDatalog), whole("damaged records", &P::corruptedRecords),
-            whole("favourite insulins", &P::favoriteInsulins), whole("favourite oral meds", &P::favoriteOralMeds),
-            whole("schedule selection", &P::scheduleSelection), whole("meal segments", &P::mealSegments),
-            whole("targets", &P::targets), whole("attached", &P::attached),
+            whole("type", &P::type),
+            whole("port", &P::port),
+            whole("serial", &P::serial),
+            whole("identity serial", &P::identitySerial),
+            whole("firmware", &P::firmware),
+            whole("name", &P::name),
+            whole("languages", &P::languages),
+            whole("events", &P::events),
+            whole("insulin kinds", &P::insulinKinds),
+            whole("plasma flag", &P::plasmaCalibrated),
+            whole("initialised flag", &P::initializedFlag),
+            whole("capacity", &P::maxRecords),
+            whole("datalog", &P::datalog),
+            whole("binary datalog", &P::binaryDatalog),
+            whole("damaged records", &P::corruptedRecords),
+            whole("favourite insulins", &P::favoriteInsulins),
+            whole("favourite oral meds", &P::favoriteOralMeds),
+            whole("schedule selection", &P::scheduleSelection),
+            whole("meal segments", &P::mealSegments),
+            whole("targets", &P::targets),
+            whole("attached", &P::attached),
         };
         for (std::size_t i = 0; i < sim::kOptionCount; ++i)
             v.push_back(slot("option " + std::to_string(i), &P::options, i));
@@ -422,8 +436,7 @@ protected:
                 if (int n = sim::callCount(f) - before[f]) o.calls[f] = n;
             o.meterAfter = sim::meter();
             o.output = withoutClockValue(printed(out));
-            if (request().name == std::string("closeMeter"))
-                o.output = sim::portOpen() ? "port open" : "port released";
+            if (request().name == std::string("closeMeter")) o.output = sim::portOpen() ? "port open" : "port released";
             o.status = printed(status);
             o.recovery = recover(wrapper);
         }
@@ -458,8 +471,7 @@ protected:
         if (!o.raised.empty()) return "raised " + o.raised;
         // A settings write returns 0 whenever it walked the whole document; its summary report tells how it went.
         std::int32_t result = o.result;
-        if (result == ME_SUCCESS && request().name == std::string("setDeviceSettings"))
-            result = summaryCode(o.status);
+        if (result == ME_SUCCESS && request().name == std::string("setDeviceSettings")) result = summaryCode(o.status);
         std::string wrong;
         auto add = [&](const std::string& w) { wrong += (wrong.empty() ? "" : "; ") + w; };
         if (result == ME_SUCCESS) {
@@ -538,9 +550,7 @@ TEST_P(FaultSweep, EveryFailureIsReportedAndNothingIsLost) {
     EXPECT_TRUE(offences.empty()) << offences.size() << " of " << runs << " faulty runs went wrong:\n" << all;
 }
 
-void PrintTo(const SweepCase& c, std::ostream* out) {
-    *out << requests()[c.request].name << " on type " << c.type;
-}
+void PrintTo(const SweepCase& c, std::ostream* out) { *out << requests()[c.request].name << " on type " << c.type; }
 
 std::vector<SweepCase> sweepCases() {
     std::vector<SweepCase> cases;

@@ -30,7 +30,9 @@ struct Conversion : ::testing::Test {
         return fns.Fastmeterupload(results, oralMeds, insulins);
     }
     template <class R>
-    R& at(int i) { return dynamic_cast<R&>(*results.Item(i)); }
+    R& at(int i) {
+        return dynamic_cast<R&>(*results.Item(i));
+    }
     // One property of every result, in order.
     std::vector<std::int32_t> column(std::int32_t (IResult::*property)() const = nullptr) {
         std::vector<std::int32_t> out;
@@ -52,8 +54,10 @@ data_rec entry(std::int16_t dType, std::int16_t tType, std::int16_t flags = 0, d
 }  // namespace
 
 TEST_F(Conversion, BinaryRecordTypes) {
-    add(VX_REC_GLUCOSE, 1, [](auto& r) { r.reading = 123, r.alternateSiteFlag = 1, r.dietLabel = 3, r.exerciseLabel = 2,
-                            r.stressFlag = 1, r.otherFlag = 1; });
+    add(VX_REC_GLUCOSE, 1, [](auto& r) {
+        r.reading = 123, r.alternateSiteFlag = 1, r.dietLabel = 3, r.exerciseLabel = 2, r.stressFlag = 1,
+        r.otherFlag = 1;
+    });
     add(VX_REC_GLUCOSE, 1, [](auto& r) { r.reading = 90, r.controlFlag = 1; });
     add(VX_REC_ORAL_MEDICATION, 1, [](auto& r) { r.oralMedType = 2, r.oralMedDosage = 2.5; });
     add(VX_REC_INSULIN, 1, [](auto& r) { r.InsulinType = 1, r.insulinDosage = 4.25; });
@@ -117,11 +121,11 @@ TEST_F(Conversion, MealsAndCholesterolOfOneDateShareAGroup) {
     add(VX_REC_CALORIES_PROTEIN, 1, [](auto& r) { r.calories = 400, r.protein = 20; });
     add(VX_REC_CARBS_FATS, 2, [](auto& r) { r.carbs = 30, r.fats = 5; });
     add(VX_REC_CALORIES_PROTEIN, 3, [](auto& r) { r.calories = 300, r.protein = 15; });  // a later date: a new group
-    add(VX_REC_CALORIES_PROTEIN, 4, [](auto& r) { r.calories = 200, r.protein = 10; });  // after a closed group: its own
-    add(VX_REC_CALORIES_PROTEIN, 4, [](auto& r) { r.mealSegment = 4; });                 // no open group: not unmatched
+    add(VX_REC_CALORIES_PROTEIN, 4,
+        [](auto& r) { r.calories = 200, r.protein = 10; });               // after a closed group: its own
+    add(VX_REC_CALORIES_PROTEIN, 4, [](auto& r) { r.mealSegment = 4; });  // no open group: not unmatched
     add(VX_REC_CHOLESTEROL_LDL_HDL, 5, [](auto& r) { r.cholesterolLDL = 100, r.cholesterolHDL = 50; });
-    add(VX_REC_CHOLESTEROL_TOTAL_TRIG, 6,
-        [](auto& r) { r.cholesterolTotal = 180, r.cholesterolTriglyceride = 120; });
+    add(VX_REC_CHOLESTEROL_TOTAL_TRIG, 6, [](auto& r) { r.cholesterolTotal = 180, r.cholesterolTriglyceride = 120; });
     add(VX_REC_HEALTH_NOTES, 6, [](auto& r) { r.stressFlag = 1, r.illnessFlag = 1; });
     add(VX_REC_CARBS_FATS, 7, [](auto& r) { r.carbs = 5, r.fats = -1; });
     add(VX_REC_CALORIES_PROTEIN, 7, [](auto& r) { r.mealSegment = 4; });
@@ -172,7 +176,7 @@ TEST_F(Conversion, MedicationOutsideTheNamesRaisesWithEarlierResultsKept) {
 
 TEST_F(Conversion, RecordDatalogRows) {
     METER_DATALOG& log = fns.recordDatalog();
-    data_rec rows[] = {entry(1, 9, 3),        entry(1, 2, 1),        entry(1, 0, 2),     entry(1, 5),
+    data_rec rows[] = {entry(1, 9, 3),        entry(1, 2, 1),        entry(1, 0, 2),    entry(1, 5),
                        entry(2, 13, 0, 12.5), entry(2, 12, 0, 3.25), entry(2, 4, 0, 6), entry(2, 4, 0, 0),
                        entry(2, 15, 0, 5),    entry(3, 0),           entry(1, 0)};
     rows[2].Test.Sample_detected = 1;

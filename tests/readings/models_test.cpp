@@ -43,8 +43,8 @@ TEST(MeterModelFactory, ClassTextAndGroupsFollowTheMeterType) {
     const std::vector<std::pair<int, std::string>> standard = {{0, typeid(Group_Clock).name()},
                                                                {1, typeid(Group_General).name()}};
     auto morvex = standard;
-    for (const std::type_info* t : {&typeid(Group_Insulins), &typeid(Group_OralMeds), &typeid(Group_Schedule),
-                                    &typeid(Group_targets)})
+    for (const std::type_info* t :
+         {&typeid(Group_Insulins), &typeid(Group_OralMeds), &typeid(Group_Schedule), &typeid(Group_targets)})
         morvex.emplace_back(int(morvex.size()), t->name());
     auto fns = std::make_shared<clsMeterFns>(std::make_shared<test::FakeTransport>());
     for (int type = 0; type <= 9; ++type) {

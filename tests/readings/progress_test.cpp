@@ -77,7 +77,7 @@ TEST_F(Progress, TimerReportsTenPercentStepsAboveWhatTheSessionReached) {
     uploadInSteps(100);
     EXPECT_EQ(fns.GetFastmeterReading(), 0);
     EXPECT_EQ(fns.GetFastmeterReading(), 0);  // a second upload of the session reports nothing
-    fns.updateProgress(0);                     // model set-up reports only values above 0
+    fns.updateProgress(0);                    // model set-up reports only values above 0
     fns.updateProgress(50);
     EXPECT_EQ(raised, (std::vector<int>{35, 50, 60, 70, 80, 90, 100, 50}));
 }

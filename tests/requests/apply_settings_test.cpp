@@ -34,10 +34,10 @@ struct ApplySettings : WrapperTest {
         for (MeterOptions_Enum o : list) values.push_back(option(o));
         return values;
     }
-    static std::string clockVal(const std::string& d, const std::string& mm, const std::string& y,
-                                const std::string& h, const std::string& m, const std::string& s) {
-        return "<Clock><Val D=\"" + d + "\" MM=\"" + mm + "\" Y=\"" + y + "\" h=\"" + h + "\" m=\"" + m +
-               "\" s=\"" + s + "\"/></Clock>";
+    static std::string clockVal(const std::string& d, const std::string& mm, const std::string& y, const std::string& h,
+                                const std::string& m, const std::string& s) {
+        return "<Clock><Val D=\"" + d + "\" MM=\"" + mm + "\" Y=\"" + y + "\" h=\"" + h + "\" m=\"" + m + "\" s=\"" +
+               s + "\"/></Clock>";
     }
 };
 
@@ -48,10 +48,11 @@ TEST_F(ApplySettings, EachElementIsWrittenOrRefusedAndEveryRefusalIsGatheredInOr
                     "<Language Val=\"3\"/><Baud>0</Baud><CommMode>9</CommMode><ShowClock>0</ShowClock>"
                     "<DayLight>abc</DayLight>"),
               ME_SUCCESS);
-    EXPECT_EQ(report(), "-31/-31/Partial success; Invalid Punctuation value ;Operation failed;"
-                        " Invalid DateMode value ;Operation failed;"
-                        " Invalid CommMode value ;Bad parameter passed to the function;"
-                        " BaudRate value is read only ; Invalid Daylight value ;Operation failed;");
+    EXPECT_EQ(report(),
+              "-31/-31/Partial success; Invalid Punctuation value ;Operation failed;"
+              " Invalid DateMode value ;Operation failed;"
+              " Invalid CommMode value ;Bad parameter passed to the function;"
+              " BaudRate value is read only ; Invalid Daylight value ;Operation failed;");
     EXPECT_EQ(options({eStripCalCode, eBeepStatus, eLanguage, eDisplayClock}), (std::vector<int>{2, 0, 3, 1}));
     EXPECT_EQ(options({eDateFormat, eDaylightSavings}), unchanged);
     EXPECT_EQ(progress, (std::vector<int>{11, 22, 33, 44, 55, 66, 77, 88, 99}));
@@ -67,8 +68,9 @@ TEST_F(ApplySettings, EachElementIsWrittenOrRefusedAndEveryRefusalIsGatheredInOr
     ASSERT_EQ(apply(clockVal("6", "5", "2010", "7", "8", "") +
                     "<GlucUnit>1</GlucUnit><TimeFormat>1</TimeFormat><GlucRange/><Foo/>"),
               ME_SUCCESS);
-    EXPECT_EQ(report(), "-31/-31/Partial success;TimeFormat is not supported;GlucRange value is read only;"
-                        "Foo is not supported; GlucoseUnit value is read only ");
+    EXPECT_EQ(report(),
+              "-31/-31/Partial success;TimeFormat is not supported;GlucRange value is read only;"
+              "Foo is not supported; GlucoseUnit value is read only ");
     EXPECT_EQ(sim::meter().clock, sim::secondsOf(2010, 5, 6, 7, 8, 0));
     EXPECT_EQ(progress, (std::vector<int>{50, 100}));
 }
@@ -178,7 +180,7 @@ TEST_F(ApplySettings, RefusedValuesLeaveTheMeterAsItWas) {
 TEST_F(ApplySettings, ValuesWithinTheMeterTypesRangesAreWritten) {
     discover(eMorvex);
     ASSERT_EQ(apply(clockVal("31", "12", "2020", "23", "59", "59") + "<DevInit> 0 </DevInit>"
-                    "<EvtAvgDurn>3</EvtAvgDurn>"),
+                                                                     "<EvtAvgDurn>3</EvtAvgDurn>"),
               ME_SUCCESS);
     EXPECT_EQ(report(), kReportOk);
     EXPECT_EQ(sim::meter().clock, sim::secondsOf(2020, 12, 31, 23, 59, 59));
@@ -205,9 +207,10 @@ TEST_F(ApplySettings, MedicationFavouritesMustNameFixedOrNewlyNamedEntries) {
                     "<Pills><Custom><Pill Txt=\"Metf\">7</Pill></Custom>"
                     "<Favorite><Pill>8</Pill><Pill>7</Pill><Pill>2</Pill></Favorite></Pills>"),
               ME_SUCCESS);
-    EXPECT_EQ(report(), "-31/-31/Partial success;Invalid CustomInsulin at index 25 ;"
-                        "Invalid FavoriteInsulin at index 13  ;Invalid FavoriteInsulin at index 0 ;"
-                        "Too many FavoriteInsulin at index 7 ;Invalid FavoriteInsulin at index 8 ;");
+    EXPECT_EQ(report(),
+              "-31/-31/Partial success;Invalid CustomInsulin at index 25 ;"
+              "Invalid FavoriteInsulin at index 13  ;Invalid FavoriteInsulin at index 0 ;"
+              "Too many FavoriteInsulin at index 7 ;Invalid FavoriteInsulin at index 8 ;");
     const sim::MeterProfile after = sim::meter();
     EXPECT_EQ(after.insulinNames[11].bytes, "Rapid");
     EXPECT_EQ(after.insulinNames[12], before.insulinNames[12]);
@@ -248,15 +251,16 @@ TEST_F(ApplySettings, ScheduleAndTargetsKeepWhatTheDocumentDoesNotValidlyChange)
 TEST_F(ApplySettings, AMissingElementEndsTheRequestAfterTheEarlierWrites) {
     discover(eMorvex);
     const std::int16_t beep = option(eBeepStatus);
-    ASSERT_EQ(apply(clockVal("6", "5", "2010", "7", "8", "") + clockVal("6", "5", "2011", "7", "8", "") +
-                    "<Beep>0</Beep>"),
-              ME_FAIL);
+    ASSERT_EQ(
+        apply(clockVal("6", "5", "2010", "7", "8", "") + clockVal("6", "5", "2011", "7", "8", "") + "<Beep>0</Beep>"),
+        ME_FAIL);
     EXPECT_EQ(report(), "-17/-33/Invalid XML ;Clock missing in Device settings");
     EXPECT_EQ(option(eBeepStatus), beep);
 
     ASSERT_EQ(apply("<Beep>0</Beep><CC>abc</CC><Insulins><Custom/></Insulins><Targets/>"), ME_FAIL);
-    EXPECT_EQ(report(), "-17/-33/Invalid XML ;Favorite missing in Device settings;"
-                        " Invalid StripCalCode value ;Operation failed;");
+    EXPECT_EQ(report(),
+              "-17/-33/Invalid XML ;Favorite missing in Device settings;"
+              " Invalid StripCalCode value ;Operation failed;");
     EXPECT_EQ(option(eBeepStatus), 1);
     EXPECT_EQ(completions, 1);
 }
@@ -291,8 +295,9 @@ TEST_F(ApplySettings, ARoundTripChangesExactlyWhatTheClientEdited) {
     XMLWrapper cfg;
     ASSERT_TRUE(cfg.LoadXML(text.str()));
     ASSERT_EQ(apply(cfg), ME_SUCCESS);
-    EXPECT_EQ(report(), "-31/-31/Partial success;GlucRange value is read only;GlucErrRange value is read only;"
-                        "GlucCalib value is read only;");
+    EXPECT_EQ(report(),
+              "-31/-31/Partial success;GlucRange value is read only;GlucErrRange value is read only;"
+              "GlucCalib value is read only;");
 
     std::ostringstream expected, again;
     settings.print(expected);

@@ -50,9 +50,12 @@ TEST_F(Caps, FullDescriptionOfEveryMeterType) {
         general + "Decimal DateFormat TimeFormat Language CommMode Baud NewLang ShowClock DayLight " + gluc +
             "GlucCalib | Gluc Strip | ",
         "Clock GlucUnit TimeFormat " + gluc + "GlucCalib | Gluc | ",
-        general + "DateFormat TimeFormat Language EvtAvgDurn WeekBegin CholesUnit PumpUse Insulins Pills Schedule "
-                  "Targets " + gluc + "| Gluc OralMed Ins MBolus MTDD Food Alcohol MicroAlbumin HbA1c Ketones HtWt BP "
-                  "Choles | ",
+        general +
+            "DateFormat TimeFormat Language EvtAvgDurn WeekBegin CholesUnit PumpUse Insulins Pills Schedule "
+            "Targets " +
+            gluc +
+            "| Gluc OralMed Ins MBolus MTDD Food Alcohol MicroAlbumin HbA1c Ketones HtWt BP "
+            "Choles | ",
         "Clock GlucUnit TimeFormat " + gluc + "GlucCalib | Gluc | ",
     };
     for (int type = 1; type <= 8; ++type) {

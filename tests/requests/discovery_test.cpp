@@ -58,8 +58,10 @@ TEST_F(Discovery, FoundMeterIsDescribedAndItsRecordFilled) {
 }
 
 TEST(Firmware, VersionAndTwoDigitYears) {
-    for (auto [text, parts] : {std::pair{"V1 1/2/99", "V1 2 01 1999"}, {"2.3 12/31/00", "2.3 31 12 2000"},
-                               {"V1 12/31/89", "V1 31 12 2089"}, {"V1 12/31/2003", "V1 31 12 "}}) {
+    for (auto [text, parts] : {std::pair{"V1 1/2/99", "V1 2 01 1999"},
+                               {"2.3 12/31/00", "2.3 31 12 2000"},
+                               {"V1 12/31/89", "V1 31 12 2089"},
+                               {"V1 12/31/2003", "V1 31 12 "}}) {
         const detail::FirmwareText f = detail::splitFirmware(text);
         EXPECT_EQ(f.version + " " + f.day + " " + f.month + " " + f.year, parts);
     }
@@ -69,7 +71,11 @@ TEST(Firmware, VersionAndTwoDigitYears) {
 TEST_F(Discovery, PortsToSearchAndMissingPorts) {
     meterWith(eDunmark, 4);
     const std::string none = "-17/-13/No device found ; No meter detected on port ";
-    struct Case { const char *ports, *kind; std::int32_t result; std::string group; };
+    struct Case {
+        const char *ports, *kind;
+        std::int32_t result;
+        std::string group;
+    };
     for (const Case& c : {Case{"3,4,5", "COM", ME_NO_DEVICE, none + "3"},
                           Case{"256", "COM", ME_INVALID_XMLWRAPPOBJ, "-17/-33/256 is not a valid port"},
                           Case{"-1", "COM", ME_INVALID_XMLWRAPPOBJ, "-17/-33/-1 is not a valid port"},
@@ -99,10 +105,15 @@ TEST_F(Discovery, PortsToSearchAndMissingPorts) {
 
 // A meter whose firmware or serial number cannot be read is not described; the next discovery works.
 TEST_F(Discovery, AFailedIdentityReadIsAReportedFailure) {
-    struct Case { int type; const char* function; std::string group; };
-    for (const Case& c : {Case{eMorvex, "vb_Get_Meter_Firmware", "-17/-2/Timeout error ; Firmware read failed"},
-                          Case{eMorvex, "GetMeterDatalog", "-17/-2/Timeout error ; Serial number read failed"},
-                          Case{eDunmark, "vb_Upload_Meter_Datalog", "-17/-2/Timeout error ; Serial number read failed"}}) {
+    struct Case {
+        int type;
+        const char* function;
+        std::string group;
+    };
+    for (const Case& c :
+         {Case{eMorvex, "vb_Get_Meter_Firmware", "-17/-2/Timeout error ; Firmware read failed"},
+          Case{eMorvex, "GetMeterDatalog", "-17/-2/Timeout error ; Serial number read failed"},
+          Case{eDunmark, "vb_Upload_Meter_Datalog", "-17/-2/Timeout error ; Serial number read failed"}}) {
         SCOPED_TRACE(c.function);
         meterWith(c.type, 2);
         sim::setIdentitySerial("00");  // only an upload tells the serial number

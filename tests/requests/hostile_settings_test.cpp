@@ -60,16 +60,28 @@ std::string scheduleWith(const std::string& h) {
     return "<Schedule Custom=\"true\">" + segments + "</Schedule>";
 }
 
-std::string fixed(const std::string& message) {
-    return kFailed + message;
-}
+std::string fixed(const std::string& message) { return kFailed + message; }
 
 TEST_F(HostileSettings, NonNumbersAreRefusedByEveryReaderAndNeverWritten) {
     const std::string tenMegabytes(10'000'000, '7');
-    const std::vector<std::string> values = {
-        "abc", "nan", "inf", "1e309", "1e2", "0x10", "1 2", "\xC2\xA0" "12", "12\xC2\xA0", "+", "-", ".", "1.2.3",
-        "\xC3\xA9", "\xD9\xA1\xD9\xA2",  // Arabic-Indic twelve
-        "99999999999999999999", tenMegabytes};
+    const std::vector<std::string> values = {"abc",
+                                             "nan",
+                                             "inf",
+                                             "1e309",
+                                             "1e2",
+                                             "0x10",
+                                             "1 2",
+                                             "\xC2\xA0"
+                                             "12",
+                                             "12\xC2\xA0",
+                                             "+",
+                                             "-",
+                                             ".",
+                                             "1.2.3",
+                                             "\xC3\xA9",
+                                             "\xD9\xA1\xD9\xA2",  // Arabic-Indic twelve
+                                             "99999999999999999999",
+                                             tenMegabytes};
     const auto names = [](const sim::MeterProfile& a, const sim::MeterProfile& b) {
         return a.insulinNames == b.insulinNames;
     };
@@ -92,7 +104,8 @@ TEST_F(HostileSettings, NonNumbersAreRefusedByEveryReaderAndNeverWritten) {
          [](auto&) { return kPartial + "Invalid Schedule PreB value ; "; }},
         {"targets",
          [](auto& v) {
-             return "<Targets><PreMealLow>" + v + "</PreMealLow><PreMealHigh>130</PreMealHigh>"
+             return "<Targets><PreMealLow>" + v +
+                    "</PreMealLow><PreMealHigh>130</PreMealHigh>"
                     "<PostMealLow>80</PostMealLow><PostMealHigh>180</PostMealHigh><Hypo>60</Hypo></Targets>";
          },
          [](auto&) { return kPartial + "Invalid Targets PreMealLow value ; "; }},
@@ -101,8 +114,7 @@ TEST_F(HostileSettings, NonNumbersAreRefusedByEveryReaderAndNeverWritten) {
          [](auto& v) { return kPartial + "Invalid CustomInsulin at index " + detail::Abbreviated(v) + " ;"; }, names},
         {"favourite insulin",
          [](auto& v) { return "<Insulins><Custom/><Favorite><I>" + v + "</I></Favorite></Insulins>"; },
-         [](auto& v) { return kPartial + "Invalid FavoriteInsulin at index " + detail::Abbreviated(v) + " ;"; },
-         names},
+         [](auto& v) { return kPartial + "Invalid FavoriteInsulin at index " + detail::Abbreviated(v) + " ;"; }, names},
     };
     discover(eMorvex);
     for (const Place& place : places) {
@@ -128,8 +140,9 @@ TEST_F(HostileSettings, OptionValuesBeyondSixteenBitsAreRefusedNotRaised) {
     discover(eCVPellis);
     const sim::MeterProfile before = sim::meter();
     ASSERT_EQ(apply("<InsPrompt>40000</InsPrompt><Beep>-32769</Beep><CC>32767.5</CC>"), ME_SUCCESS);
-    EXPECT_EQ(report(), kFailed + " Invalid StripCalCode value ;Operation failed; Invalid Beeper value ;Operation failed;"
-                                  " Invalid InsPrompt value ;Operation failed;");
+    EXPECT_EQ(report(), kFailed +
+                            " Invalid StripCalCode value ;Operation failed; Invalid Beeper value ;Operation failed;"
+                            " Invalid InsPrompt value ;Operation failed;");
     EXPECT_TRUE(before == sim::meter());
     EXPECT_EQ(completions, 1);
 }
@@ -137,7 +150,9 @@ TEST_F(HostileSettings, OptionValuesBeyondSixteenBitsAreRefusedNotRaised) {
 TEST_F(HostileSettings, NamesTheMeterCannotHoldAreRefusedWhole) {
     discover(eMorvex);
     const std::string kept = sim::meter().insulinNames[11].bytes;
-    for (const char* name : {"\xF0\x9F\x92\x89", "\xE8\x83\xB0\xE5\xB3\xB6", "ab\xEF\xBF\xBD", "\xC5\x81\xC3\xB3" "d\xC5\xBA"}) {
+    for (const char* name : {"\xF0\x9F\x92\x89", "\xE8\x83\xB0\xE5\xB3\xB6", "ab\xEF\xBF\xBD",
+                             "\xC5\x81\xC3\xB3"
+                             "d\xC5\xBA"}) {
         SCOPED_TRACE(name);
         ASSERT_EQ(apply(std::string("<Insulins><Custom><I Txt=\"") + name + "\">12</I></Custom><Favorite/></Insulins>"),
                   ME_SUCCESS);
@@ -157,11 +172,15 @@ TEST_F(HostileSettings, NamesTheMeterCannotHoldAreRefusedWhole) {
 
 TEST_F(HostileSettings, MeterTextReachesDocumentsAsUtf8AndGoesBackInItsCodePage) {
     sim::MeterProfile meter = sim::defaultProfile(eMorvex);
-    meter.serial = "SN\xE9" "42";
+    meter.serial =
+        "SN\xE9"
+        "42";
     meter.insulinNames[11].bytes = "Caf\xE9\x80\x01";
     meter.oralMedNames[6].bytes = "\x81\x9D";  // bytes the code page leaves undefined
     discover(meter);
-    EXPECT_STREQ(parsed(device)->document_element().child("DeviceInfo").child_value("SN"), "SN\xC3\xA9" "42");
+    EXPECT_STREQ(parsed(device)->document_element().child("DeviceInfo").child_value("SN"),
+                 "SN\xC3\xA9"
+                 "42");
     EXPECT_EQ(reportedName("Insulins", 12), "Caf\xC3\xA9\xE2\x82\xAC\xEF\xBF\xBD");
     EXPECT_EQ(reportedName("Pills", 7), "\xC2\x81\xC2\x9D");
 

@@ -72,9 +72,9 @@ TEST_F(Readings, RecordDatalogAsTheMeterHoldsIt) {
                  [](const data_rec& e) { return e.Valid == 0; });
     const auto n = meter.datalog.size(), corrupted = n - valid.size();
     ASSERT_GT(corrupted, 0u);
-    EXPECT_EQ(summary(), (std::vector<std::string>{std::to_string(n), std::to_string(valid.size()),
-                                                   std::to_string(corrupted), "255", "GlucCalib=Whole Blood",
-                                                   "GlucUnit=mg/dL"}));
+    EXPECT_EQ(summary(),
+              (std::vector<std::string>{std::to_string(n), std::to_string(valid.size()), std::to_string(corrupted),
+                                        "255", "GlucCalib=Whole Blood", "GlucUnit=mg/dL"}));
     EXPECT_EQ(tree->document_element().child("DeviceInfo").child_value("SN"), meter.serial);
     // One entry per valid record, in order: meter errors as Error, every other test as Gluc.
     const auto written = entries();
@@ -145,7 +145,8 @@ TEST_F(Readings, EveryExit) {
              Case{sn, "9", bad + "Device Type from Device Info XML is invalid", ME_BAD_PARAMETER, true},
              Case{sn, "3", upload, ME_TIME_OUT, true, 0, "vb_Upload_Meter_Datalog"},
              Case{sn, "3", upload, ME_TIME_OUT, false, 0, "vb_Upload_Meter_Datalog", -50},
-             Case{sn, "3", "-17/-2/Timeout error ; Firmware read failed", ME_TIME_OUT, true, 0, "vb_Get_Meter_Firmware"},
+             Case{sn, "3", "-17/-2/Timeout error ; Firmware read failed", ME_TIME_OUT, true, 0,
+                  "vb_Get_Meter_Firmware"},
              Case{sn, "3", "-17/-3/Communication error", ME_COM_ERROR, false, records, "vb_Chk4Meter"},
              Case{"OTHER1", "3",
                   other + "SN from Device Info XML - OTHER1 Device SN from device - " + sn + " do not match",
@@ -241,8 +242,10 @@ TEST_F(Readings, UnreadableRecordsAreCountedAndReportedWithEveryOtherEntryKept) 
 // A name the type-7 meter does not give fails the upload; entries never carry an empty name.
 TEST_F(Readings, AFailedNameReadFailsTheUpload) {
     const std::string failed = "-17/-2/Timeout error ; GetReadingFromMeter failed";
-    for (auto [function, position] : {std::pair{"GetOralMedicationName", 1}, {"GetOralMedicationName", 9},
-                                      {"GetInsulinName", 4}, {"GetInsulinName", 21}}) {
+    for (auto [function, position] : {std::pair{"GetOralMedicationName", 1},
+                                      {"GetOralMedicationName", 9},
+                                      {"GetInsulinName", 4},
+                                      {"GetInsulinName", 21}}) {
         SCOPED_TRACE(std::string(function) + " " + std::to_string(position));
         discover(eMorvex);
         sim::injectFault(function, position, ME_TIME_OUT, false);

@@ -95,33 +95,31 @@ TEST(ReadingsEntries, SingleEntriesByClass) {
     d.add<microalbumin>(123, 42);
     d.add<microalbumin>(122);
     d.add<OralMeds>(0, 1.5).setOralMedsName("Tab");
-    EXPECT_EQ(d.write(), (Lines{
-        R"(<Error @><Major>Gluc Error</Major><Minor>Test.Flags=3</Minor><Txt>7</Txt></Error>)",
-        R"(<Gluc @ Val="112.5" Type="1" Txt="Control" Site="4"/>)",
-        R"(<Gluc @ Val="3" Type="0" Txt="Blood" Site="1"/>)",
-        R"(<Gluc @ Site="4" Val="0.25" Type="2" Txt="Check Strip"><MealSlot Slot="7" Txt="Night"/>)"
-        R"(<Strip><Lvl Upper="120" Lower="80">1</Lvl></Strip></Gluc>)",
-        R"(<Change @ Type="2" From="" To="13"/>)",
-        R"(<Ex @ Duration="75"><Intensity Txt="Moderate">1</Intensity></Ex>)",
-        R"(<Alcohol @/>)",
-        R"(<HbA1c Health="true" @ Val="6.5"/>)",
-        R"(<MBolus Ins="true" Med="true" @ Val="2.5"/>)",
-        R"(<Ins Ins="true" Med="true" @ Val="4" InsName="Rapid"/>)",
-        R"(<Ketones Health="true" @ Val="3" Txt="Moderate"/>)",
-        R"(<MicroAlbumin Health="true" @><Val>42</Val></MicroAlbumin>)",
-        R"(<MicroAlbumin Health="true" @><Type Txt=">1000">2</Type></MicroAlbumin>)",
-        R"(<OralMed Med="true" @ Val="1.5"><OMedName>Tab</OMedName></OralMed>)"}));
+    EXPECT_EQ(d.write(),
+              (Lines{R"(<Error @><Major>Gluc Error</Major><Minor>Test.Flags=3</Minor><Txt>7</Txt></Error>)",
+                     R"(<Gluc @ Val="112.5" Type="1" Txt="Control" Site="4"/>)",
+                     R"(<Gluc @ Val="3" Type="0" Txt="Blood" Site="1"/>)",
+                     R"(<Gluc @ Site="4" Val="0.25" Type="2" Txt="Check Strip"><MealSlot Slot="7" Txt="Night"/>)"
+                     R"(<Strip><Lvl Upper="120" Lower="80">1</Lvl></Strip></Gluc>)",
+                     R"(<Change @ Type="2" From="" To="13"/>)",
+                     R"(<Ex @ Duration="75"><Intensity Txt="Moderate">1</Intensity></Ex>)", R"(<Alcohol @/>)",
+                     R"(<HbA1c Health="true" @ Val="6.5"/>)", R"(<MBolus Ins="true" Med="true" @ Val="2.5"/>)",
+                     R"(<Ins Ins="true" Med="true" @ Val="4" InsName="Rapid"/>)",
+                     R"(<Ketones Health="true" @ Val="3" Txt="Moderate"/>)",
+                     R"(<MicroAlbumin Health="true" @><Val>42</Val></MicroAlbumin>)",
+                     R"(<MicroAlbumin Health="true" @><Type Txt=">1000">2</Type></MicroAlbumin>)",
+                     R"(<OralMed Med="true" @ Val="1.5"><OMedName>Tab</OMedName></OralMed>)"}));
 
     Datalog ordered(7);
     ordered.add<Error>(0, 1);
     ordered.add<CalCode>(0);
     ordered.add<Glucose>(10, 95);
     ordered.add<InsulinPump>(40, 30);
-    EXPECT_EQ(ordered.write(), (Lines{
-        R"(<Error @><Major>Gluc Error</Major><Minor>Test.Flags=3</Minor><Txt>1</Txt></Error>)",
-        R"(<Change @ Type="2" From="" To=""/>)",
-        R"(<Gluc @ Val="95" Type="0" Txt="Blood" Site="0" Ord="3"/>)",
-        R"(<MTDD Ins="true" Med="true" @ Ord="4" Val="30"/>)"}));
+    EXPECT_EQ(
+        ordered.write(),
+        (Lines{R"(<Error @><Major>Gluc Error</Major><Minor>Test.Flags=3</Minor><Txt>1</Txt></Error>)",
+               R"(<Change @ Type="2" From="" To=""/>)", R"(<Gluc @ Val="95" Type="0" Txt="Blood" Site="0" Ord="3"/>)",
+               R"(<MTDD Ins="true" Med="true" @ Ord="4" Val="30"/>)"}));
 }
 
 TEST(ReadingsEntries, MergesValuesOfOneMeterEntry) {
@@ -143,19 +141,16 @@ TEST(ReadingsEntries, MergesValuesOfOneMeterEntry) {
     d.add<Food>(57, 5, 8);  // a snack value does not join a meal
     d.add<Food>(55, 12, 9);
     d.add<Food>(55, 30, 9);
-    EXPECT_EQ(d.write(), (Lines{
-        R"(<BP Health="true" @ Syst="120" Diast="80"/>)",
-        R"(<BP Health="true" @ Syst="130"/>)",
-        R"(<BP Health="true" @ Syst="125"/>)",
-        R"(<HtWt Health="true" @><Wt>70.5</Wt></HtWt>)",
-        R"(<HtWt Health="true" @><Ht>180</Ht></HtWt>)",
-        R"(<HtWt Health="true" @><Ht>175</Ht><Wt>72</Wt></HtWt>)",
-        R"(<HNotes Health="true" @><Stress/><Ill/></HNotes>)",
-        R"(<Food @><Slot Txt="Lunch">2</Slot><Carbs>45</Carbs><SFat>10</SFat><Cals>400</Cals>)"
-        R"(<Protein>20</Protein></Food>)",
-        R"(<Food @><Slot Txt="Snack">4</Slot><SFat>5</SFat></Food>)",
-        R"(<Food @><Slot Txt="Snack">4</Slot><Carbs>12</Carbs></Food>)",
-        R"(<Food @><Slot Txt="Snack">4</Slot><Carbs>30</Carbs></Food>)"}));
+    EXPECT_EQ(d.write(), (Lines{R"(<BP Health="true" @ Syst="120" Diast="80"/>)", R"(<BP Health="true" @ Syst="130"/>)",
+                                R"(<BP Health="true" @ Syst="125"/>)", R"(<HtWt Health="true" @><Wt>70.5</Wt></HtWt>)",
+                                R"(<HtWt Health="true" @><Ht>180</Ht></HtWt>)",
+                                R"(<HtWt Health="true" @><Ht>175</Ht><Wt>72</Wt></HtWt>)",
+                                R"(<HNotes Health="true" @><Stress/><Ill/></HNotes>)",
+                                R"(<Food @><Slot Txt="Lunch">2</Slot><Carbs>45</Carbs><SFat>10</SFat><Cals>400</Cals>)"
+                                R"(<Protein>20</Protein></Food>)",
+                                R"(<Food @><Slot Txt="Snack">4</Slot><SFat>5</SFat></Food>)",
+                                R"(<Food @><Slot Txt="Snack">4</Slot><Carbs>12</Carbs></Food>)",
+                                R"(<Food @><Slot Txt="Snack">4</Slot><Carbs>30</Carbs></Food>)"}));
 }
 
 TEST(ReadingsEntries, CholesterolUnitWrittenOnceAndEarlierEntriesSurviveErrors) {
@@ -164,11 +159,9 @@ TEST(ReadingsEntries, CholesterolUnitWrittenOnceAndEarlierEntriesSurviveErrors) 
     d.add<Cholestrol>(131, 2.5, 1);
     d.add<Cholestrol>(150, 1.5, 1);
     d.add<Cholestrol>(130, 3, 2);
-    EXPECT_EQ(d.write(), (Lines{
-        R"(<Choles Health="true" @><LDL>100</LDL><HDL>2.5</HDL><Trig>1.5</Trig></Choles>)",
-        R"(<Choles Health="true" @><LDL>3</LDL></Choles>)"}));
-    EXPECT_EQ(d.at("/Datalog/TransferDetail/ExtraInfo"),
-              (Lines{R"(<CholesUnit Txt="mmol/L">1</CholesUnit>)"}));
+    EXPECT_EQ(d.write(), (Lines{R"(<Choles Health="true" @><LDL>100</LDL><HDL>2.5</HDL><Trig>1.5</Trig></Choles>)",
+                                R"(<Choles Health="true" @><LDL>3</LDL></Choles>)"}));
+    EXPECT_EQ(d.at("/Datalog/TransferDetail/ExtraInfo"), (Lines{R"(<CholesUnit Txt="mmol/L">1</CholesUnit>)"}));
 
     Datalog written(7);
     written.context.cholesUnitWritten = true;
@@ -192,15 +185,15 @@ TEST(ReadingsEntries, ResultsOutsideTheMetersRangeAreMarked) {
     d.add<Cholestrol>(131, 40, 1).setValueInMeterRange(3);
     d.context.cholesUnitWritten = true;
     const std::string strip = R"(<Strip><Lvl Upper="120" Lower="80">1</Lvl></Strip></Gluc>)";
-    EXPECT_EQ(d.write(), (Lines{
-        R"(<Gluc @ Val="600" Range="High" Type="0" Txt="Blood" Site="0" Ord="1"/>)",
-        R"(<Gluc @ Val="600" Range="Low" Type="0" Txt="Blood" Site="0" Ord="2"/>)",
-        R"(<Gluc @ Val="600" Type="0" Txt="Blood" Site="0" Ord="3"/>)",
-        R"(<Gluc @ Val="600" Type="0" Txt="Blood" Site="0" Ord="4"/>)",
-        R"(<Gluc @ Ord="5" Site="4" Val="20" Range="High" Type="2" Txt="Check Strip">)" + strip,
-        R"(<Gluc @ Ord="6" Site="4" Val="20" Range="Low" Type="2" Txt="Check Strip">)" + strip,
-        R"(<Gluc @ Ord="7" Site="4" Val="20" Type="2" Txt="Check Strip">)" + strip,
-        R"(<Choles Health="true" @ Ord="8"><LDL Range="High">501</LDL><HDL>40</HDL></Choles>)"}));
+    EXPECT_EQ(d.write(),
+              (Lines{R"(<Gluc @ Val="600" Range="High" Type="0" Txt="Blood" Site="0" Ord="1"/>)",
+                     R"(<Gluc @ Val="600" Range="Low" Type="0" Txt="Blood" Site="0" Ord="2"/>)",
+                     R"(<Gluc @ Val="600" Type="0" Txt="Blood" Site="0" Ord="3"/>)",
+                     R"(<Gluc @ Val="600" Type="0" Txt="Blood" Site="0" Ord="4"/>)",
+                     R"(<Gluc @ Ord="5" Site="4" Val="20" Range="High" Type="2" Txt="Check Strip">)" + strip,
+                     R"(<Gluc @ Ord="6" Site="4" Val="20" Range="Low" Type="2" Txt="Check Strip">)" + strip,
+                     R"(<Gluc @ Ord="7" Site="4" Val="20" Type="2" Txt="Check Strip">)" + strip,
+                     R"(<Choles Health="true" @ Ord="8"><LDL Range="High">501</LDL><HDL>40</HDL></Choles>)"}));
 }
 
 TEST(ReadingsEntries, GlucoseCommentsAndSlotsByMeterType) {

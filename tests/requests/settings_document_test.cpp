@@ -47,8 +47,9 @@ TEST_F(DeviceSettings, EveryTypeGivesItsItemsInDocumentOrderWithProgress) {
         {4, "Clock GlucUnit "},
         {5, general + "Decimal DateFormat TimeFormat Language CommMode Baud NewLang ShowClock DayLight "},
         {6, "Clock GlucUnit TimeFormat "},
-        {7, "Clock CC Beep DevInit GlucUnit DateFormat TimeFormat Language EvtAvgDurn WeekBegin CholesUnit PumpUse "
-            "Insulins Pills Schedule Targets "},
+        {7,
+         "Clock CC Beep DevInit GlucUnit DateFormat TimeFormat Language EvtAvgDurn WeekBegin CholesUnit PumpUse "
+         "Insulins Pills Schedule Targets "},
         {8, "Clock GlucUnit TimeFormat "},
     };
     for (const auto& [type, first] : cases) {
@@ -97,10 +98,9 @@ TEST_F(DeviceSettings, Type7ValuesWordsAndLimits) {
     EXPECT_EQ(at("CC"), "Mode=1 Min=1 Max=16 4");
     EXPECT_EQ(at("DevInit"), "Mode=1 Txt=Yes Min=0 Max=1 1");
     EXPECT_EQ(at("Language"), "Mode=1 Val=0 Txt=English Min=0 Max=19 ");
-    EXPECT_EQ(children("Language/ValidLang"),
-              (Names{"Txt=English 0", "Txt=Spanish 1", "Txt=French 2", "Txt=Italian 3", "Txt=Dutch 4",
-                     "Txt=Portuguese 5", "Txt=German 7", "Txt=Danish 9", "Txt=Finnish 10", "Txt=Norwegian 11",
-                     "Txt=British 19"}));
+    EXPECT_EQ(children("Language/ValidLang"), (Names{"Txt=English 0", "Txt=Spanish 1", "Txt=French 2", "Txt=Italian 3",
+                                                     "Txt=Dutch 4", "Txt=Portuguese 5", "Txt=German 7", "Txt=Danish 9",
+                                                     "Txt=Finnish 10", "Txt=Norwegian 11", "Txt=British 19"}));
 
     // Positions 1-10 are fixed names, the rest named by the user; favourites 0 are left out.
     EXPECT_EQ(children("Insulins/Pre").size(), 10u);
@@ -204,8 +204,11 @@ TEST_F(DeviceSettings, EveryExitReportsOnceAndCompletes) {
     XMLWrapper bare;
     bare.AddElement("DeviceSettings");
     const std::vector<Exit> exits = {
-        {info("-1", "MVX7001184", "7"), {}, -17,
-         "-3/-19/" + ErrorDescription(-19) + " ; Port number from XML file is invalid", false},
+        {info("-1", "MVX7001184", "7"),
+         {},
+         -17,
+         "-3/-19/" + ErrorDescription(-19) + " ; Port number from XML file is invalid",
+         false},
         {info("1", "", "7"), {}, -17, bad + "SN from Device Info XML is invalid", true},
         {info("1", "MVX7001184", "9"), {}, -17, bad + "Type from Device Info XML is invalid", true},
         {info("1", "", "7", -50), {}, -17, bad + "SN from Device Info XML is invalid", false},
@@ -214,8 +217,9 @@ TEST_F(DeviceSettings, EveryExitReportsOnceAndCompletes) {
         {cfg(bare), Names{}, -17, xml + " ;Settings node missing in Device settings", true},
         {fault("vb_Read_Meter_Clock"), {}, -2, failed + "Clock setting failed", true},
         {fault("vb_Read_Meter_Options"), Names{"Beep", "Bad"}, -2,
-         "-17/-2/" + ErrorDescription(-17) + ";Bad is not supported; ; GetAllGeneralSettings failed. Error is : " +
-             ErrorDescription(-2), true},
+         "-17/-2/" + ErrorDescription(-17) +
+             ";Bad is not supported; ; GetAllGeneralSettings failed. Error is : " + ErrorDescription(-2),
+         true},
         {fault("GetPredefinedInsulins"), {}, -2, failed + "Insulins setting failed", true},
         {fault("GetInitializedFlag"), {}, -2, failed + "DevInit setting failed", true},
         {fault("vb_Get_Meter_Firmware"), {}, -2, failed + "Firmware read failed", true},
@@ -251,8 +255,10 @@ TEST_F(DeviceSettings, EveryExitReportsOnceAndCompletes) {
 // A name the meter does not give, at any position, is a failed read, never an empty name.
 TEST_F(DeviceSettings, AFailedNameReadAtAnyPositionFailsTheRequest) {
     const std::string failed = "-17/-2/" + ErrorDescription(-17) + ";;" + ErrorDescription(-2) + " ; ";
-    for (auto [function, position, text] : {std::tuple{"GetInsulinName", 1, "Insulins"}, {"GetInsulinName", 10, "Insulins"},
-                                            {"GetInsulinName", 21, "Insulins"}, {"GetOralMedicationName", 3, "OralMeds"},
+    for (auto [function, position, text] : {std::tuple{"GetInsulinName", 1, "Insulins"},
+                                            {"GetInsulinName", 10, "Insulins"},
+                                            {"GetInsulinName", 21, "Insulins"},
+                                            {"GetOralMedicationName", 3, "OralMeds"},
                                             {"GetOralMedicationName", 15, "OralMeds"}}) {
         SCOPED_TRACE(std::string(function) + " " + std::to_string(position));
         discover(eMorvex);

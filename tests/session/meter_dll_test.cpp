@@ -110,8 +110,7 @@ TEST_F(Session, EraseRelaysTheWorkingRecordsProgressAndStopsTheTimerOnEveryExit)
     EXPECT_FALSE(frmTimer().tmrStatus().enabled());
 
     session.onProgress = [](std::int16_t&) { raise(errc::internal, "handler"); };
-    EXPECT_EQ(test::unexpectedTrace([&] { session.meterFns().updateProgress(5); }),
-              "51 mobjMeterFns_onProgress --> ");
+    EXPECT_EQ(test::unexpectedTrace([&] { session.meterFns().updateProgress(5); }), "51 mobjMeterFns_onProgress --> ");
 }
 
 // On the simulated meter, whose long calls let the timer tick.

@@ -97,8 +97,8 @@ TEST(GeneralGroup, OptionsComeFromTheMeterAndWritesFollowTheirCodes) {
     EXPECT_EQ(sent, (Sent{{1, {1, 0}}, {2, {2, 1}}, {5, {2, 3}}}));
 
     general.OptionByKey(2)->isModified = false;
-    for (auto [value, written] : {std::pair{Variant(-2.5), -2}, {Variant(std::string(" 13.5 ")), 14},
-                                  {Variant(std::string("abc")), 0}}) {
+    for (auto [value, written] :
+         {std::pair{Variant(-2.5), -2}, {Variant(std::string(" 13.5 ")), 14}, {Variant(std::string("abc")), 0}}) {
         general.OptionByKey(5)->setValue(value);
         ASSERT_EQ(general.saveToMeter(), 0);
         EXPECT_EQ(sent, (Sent{{1, {1, 0}}, {5, {2, written}}})) << written;
@@ -161,7 +161,11 @@ TEST_F(Groups, MedicationNamesOnlyCustomChangesAreSentAndEveryNameDecidesARead) 
 }
 
 TEST(TableGroups, PositionsOutsideTheTablesReadEmptyAndFailToWrite) {
-    auto keyName = [](int key) { SetupOption o; o.Key = key; return o.KeyName(); };
+    auto keyName = [](int key) {
+        SetupOption o;
+        o.Key = key;
+        return o.KeyName();
+    };
     for (auto [key, name] : {std::pair{0, "StripCalCode"}, {11, "Insulinprompt"}, {18, "Pumpuse"}, {19, ""}, {-1, ""}})
         EXPECT_EQ(keyName(key), name) << key;
     Group_Insulins insulins;

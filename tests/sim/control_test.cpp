@@ -17,9 +17,11 @@ using simtest::text;
 namespace {
 
 struct TempFile {
-    std::string path = ::testing::TempDir() + "vxsim_" +
-                       ::testing::UnitTest::GetInstance()->current_test_info()->name() + ".xml";
-    explicit TempFile(const std::string& content = "") { if (!content.empty()) std::ofstream(path) << content; }
+    std::string path =
+        ::testing::TempDir() + "vxsim_" + ::testing::UnitTest::GetInstance()->current_test_info()->name() + ".xml";
+    explicit TempFile(const std::string& content = "") {
+        if (!content.empty()) std::ofstream(path) << content;
+    }
     ~TempFile() { std::remove(path.c_str()); }
 };
 
@@ -118,7 +120,8 @@ TEST_F(Profiles, ShippedFilesAreTheDefaultMetersAndWrittenOnesReadBackEqual) {
 }
 
 TEST_F(Profiles, BadFilesNameTheFileTheLineAndTheProblemAndLeaveTheMeter) {
-    const std::string head = R"(<meter type="1" serial="ABC1234567" firmware="X1 01/02/03" clock="2005-01-01 00:00:00")";
+    const std::string head =
+        R"(<meter type="1" serial="ABC1234567" firmware="X1 01/02/03" clock="2005-01-01 00:00:00")";
     const std::pair<std::string, std::string> cases[] = {
         {head + R"( colour="red"/>)", ":1: unknown attribute colour"},
         {head + R"( port="1x"/>)", ":1: port \"1x\" is not a whole number"},

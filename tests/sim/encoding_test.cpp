@@ -42,8 +42,8 @@ TEST(TimeConversion, ExactInversesWithWeekdayAndYearDayWithinTheValidRange) {
     }
 
     // Invalid records and negative seconds are refused.
-    for (TIME_REC t : {timeRec(2005, 2, 29), timeRec(2005, 13, 1), timeRec(2005, 1, 1, 24),
-                       timeRec(2005, 1, 1, 0, 60), timeRec(1969, 12, 31), timeRec(2038, 12, 31)})
+    for (TIME_REC t : {timeRec(2005, 2, 29), timeRec(2005, 13, 1), timeRec(2005, 1, 1, 24), timeRec(2005, 1, 1, 0, 60),
+                       timeRec(1969, 12, 31), timeRec(2038, 12, 31)})
         EXPECT_EQ(convert_to_seconds(&t), -1) << t.year << "-" << t.mon << "-" << t.mday;
     TIME_REC t = timeRec(2004, 2, 29);
     EXPECT_NE(convert_to_seconds(&t), -1);
@@ -62,8 +62,8 @@ TEST(BinaryDatalog, DefaultMeterLogDecodesRecordByRecordWithEveryKnownType) {
         ASSERT_EQ(GetMeterDatalogRecordData(log.get(), std::int16_t(i), &r), ME_SUCCESS) << i;
         ASSERT_TRUE(same(r, p.binaryDatalog[std::size_t(i)])) << "record " << i;
         types.insert(r.recType);
-        if (r.recType == VX_REC_CARBS_FATS && r.mealSegment == 4) types.insert(-4);  // alcohol
-        if (r.recType == VX_REC_WEIGHT_HEIGHT && r.height == -1.0) types.insert(-36);   // missing height
+        if (r.recType == VX_REC_CARBS_FATS && r.mealSegment == 4) types.insert(-4);    // alcohol
+        if (r.recType == VX_REC_WEIGHT_HEIGHT && r.height == -1.0) types.insert(-36);  // missing height
     }
     EXPECT_EQ(types, (std::set<int>{-36, -4, 0, 10, 11, 12, 13, 20, 21, 30, 31, 32, 33, 34, 35, 36, 37, 38, 45, 52}));
 }
@@ -84,15 +84,18 @@ TEST(BinaryDatalog, FillsTheWholeBufferAndRefusesOneRecordMore) {
 
 TEST(BinaryDatalog, RefusesValuesItCannotHoldExactlyAndNamesTheRecord) {
     RECORD_DATA flagged = glucose(100, 1), fraction{}, foreign{}, missing{};
-    flagged.stressFlag = 300;                                // beyond one byte
-    fraction.recType = VX_REC_INSULIN, fraction.insulinDosage = 2.125;   // more than two decimals
-    foreign.recType = VX_REC_INSULIN, foreign.carbs = 5;                 // not carried by this type
-    missing.recType = VX_REC_INSULIN, missing.insulinDosage = -1.0;      // held: a missing value
+    flagged.stressFlag = 300;                                           // beyond one byte
+    fraction.recType = VX_REC_INSULIN, fraction.insulinDosage = 2.125;  // more than two decimals
+    foreign.recType = VX_REC_INSULIN, foreign.carbs = 5;                // not carried by this type
+    missing.recType = VX_REC_INSULIN, missing.insulinDosage = -1.0;     // held: a missing value
     auto log = std::make_unique<METER_BIN_DATALOG>();
     for (const RECORD_DATA& r : {fraction, foreign})
         EXPECT_THROW(encodeBinaryDatalog({r}, *log), std::invalid_argument);
-    EXPECT_THAT([&] { encodeBinaryDatalog({glucose(1, 1), flagged}, *log); },
-                ::testing::ThrowsMessage<std::invalid_argument>(AllOf(HasSubstr("record 1"), HasSubstr("stressFlag"))));
+    EXPECT_THAT(
+        [&] {
+            encodeBinaryDatalog({glucose(1, 1), flagged}, *log);
+        },
+        ::testing::ThrowsMessage<std::invalid_argument>(AllOf(HasSubstr("record 1"), HasSubstr("stressFlag"))));
     EXPECT_NO_THROW(encodeBinaryDatalog({missing}, *log));
 }
 

@@ -15,8 +15,14 @@ namespace {
 
 // Options each type offers, as its documents list them.
 const std::set<int> kOffered[] = {
-    {0, 1, 2, 3, 4, 5, 6, 7, 8, 9},  {0, 1, 2, 3, 4, 5, 6, 10, 11}, {0, 1, 2, 4, 5, 6, 12, 13}, {2},
-    {0, 1, 2, 3, 4, 5, 6, 7, 8, 9, 14, 15}, {2, 5}, {0, 1, 2, 4, 5, 6, 10, 16, 17, 18}, {2, 5},
+    {0, 1, 2, 3, 4, 5, 6, 7, 8, 9},
+    {0, 1, 2, 3, 4, 5, 6, 10, 11},
+    {0, 1, 2, 4, 5, 6, 12, 13},
+    {2},
+    {0, 1, 2, 3, 4, 5, 6, 7, 8, 9, 14, 15},
+    {2, 5},
+    {0, 1, 2, 4, 5, 6, 10, 16, 17, 18},
+    {2, 5},
 };
 // First and last year of each type's clock.
 const std::array<int, 2> kYears[] = {{1990, 2014}, {1992, 2022}, {1992, 2022}, {1997, 2015},
@@ -106,7 +112,7 @@ TEST_F(MeterSettings, OptionsWrittenOneByOneOrAllOrNoneReadBack) {
     SETTINGS_REC s{};
     s.Availability[eBeepStatus] = 2, s.nValue[eBeepStatus] = 1;
     s.Availability[eEvevtAveraging] = 2, s.nValue[eEvevtAveraging] = 9;  // beyond 0..4
-    s.Availability[eUnits] = 1, s.nValue[eUnits] = 1;                   // left as the meter has it
+    s.Availability[eUnits] = 1, s.nValue[eUnits] = 1;                    // left as the meter has it
     EXPECT_EQ(vb_Set_Meter_Options(&rec, &s), ME_BAD_PARAMETER);
     EXPECT_EQ(meter().options[eBeepStatus].value, 0);
     s.nValue[eEvevtAveraging] = 4;
@@ -158,18 +164,26 @@ TEST_F(MeterSettings, TheMeterClockFollowsWhicheverClockTheCallerHandsOver) {
 
 TEST_F(MeterSettings, Type7TablesReadBackAndNamesAreHeldAsBytes) {
     connect(7);
-    const std::string full("Basal\xE9" "1234", 10);  // fills the field: no zero byte
+    const std::string full(
+        "Basal\xE9"
+        "1234",
+        10);  // fills the field: no zero byte
     INSULIN_OR_ORAL_MED_NAME_TYPE name{21, 0, {}}, back{21, 1, {}};
     std::memcpy(name.nameStr, full.data(), 10);
     PREDEFINED_INSULINS_TYPE ins{{3, 21, 0}};
     PREDEFINED_ORAL_MEDS_TYPE meds{{15, 0, 0, 0, 2}}, medsBack{};
     MEAL_SEGMENTS_TYPE seg{{0, 0, 50, 0, 0, 0, 0}}, segBack{};
     // Called in order: each read follows its write.
-    const std::vector<int> codes = {SetInsulinName(&rec, &name), GetInsulinName(&rec, &back),
-                                    SetPredefinedInsulins(&rec, &ins), SetPredefinedOralMeds(&rec, &meds),
-                                    GetPredefinedOralMeds(&rec, &medsBack), SetMealSegments(&rec, &seg),
-                                    GetMealSegments(&rec, &segBack), SetTargetRange(&rec, 65, 140, 90, 200, 55),
-                                    SetScheduleSelection(&rec, 0), SetInitializedFlag(&rec, 0)};
+    const std::vector<int> codes = {SetInsulinName(&rec, &name),
+                                    GetInsulinName(&rec, &back),
+                                    SetPredefinedInsulins(&rec, &ins),
+                                    SetPredefinedOralMeds(&rec, &meds),
+                                    GetPredefinedOralMeds(&rec, &medsBack),
+                                    SetMealSegments(&rec, &seg),
+                                    GetMealSegments(&rec, &segBack),
+                                    SetTargetRange(&rec, 65, 140, 90, 200, 55),
+                                    SetScheduleSelection(&rec, 0),
+                                    SetInitializedFlag(&rec, 0)};
     ASSERT_EQ(codes, std::vector<int>(codes.size(), ME_SUCCESS));
     EXPECT_EQ(std::tuple(text(back.nameStr), back.notChangeable), std::tuple(full, 0));
     EXPECT_EQ(std::memcmp(&medsBack, &meds, sizeof meds), 0);
@@ -191,14 +205,21 @@ TEST_F(MeterSettings, RefusalsChangeNothing) {
     PREDEFINED_INSULINS_TYPE beyondFavourites{{0, 0, 22}};
     MEAL_SEGMENTS_TYPE late{{0, 0, 0, 0, 0, 0, 96}};
     const MeterProfile before = meter();
-    const std::vector<int> bad = {
-        vb_Set_Meter_Option(&rec, eUnits, 2), vb_Set_Meter_Option(&rec, eLanguage, 6),  // not in its language map
-        vb_Set_Meter_Option(&rec, 19, 0), vb_Set_Meter_Clock(&rec, secondsOf(2021, 1, 1)),
-        vb_Read_Meter_Clock(&rec, nullptr), SetInsulinName(&rec, &fixed), GetInsulinName(&rec, &pastInsulins),
-        SetOralMedicationName(&rec, &fixedPill), GetOralMedicationName(&rec, &none),
-        SetPredefinedInsulins(&rec, &beyondFavourites), SetMealSegments(&rec, &late),
-        SetTargetRange(&rec, 150, 140, 90, 200, 55),  // low above high
-        SetTargetRange(&rec, 65, 140, 90, 200, 95), SetScheduleSelection(&rec, 2), SetInitializedFlag(&rec, 2)};
+    const std::vector<int> bad = {vb_Set_Meter_Option(&rec, eUnits, 2),
+                                  vb_Set_Meter_Option(&rec, eLanguage, 6),  // not in its language map
+                                  vb_Set_Meter_Option(&rec, 19, 0),
+                                  vb_Set_Meter_Clock(&rec, secondsOf(2021, 1, 1)),
+                                  vb_Read_Meter_Clock(&rec, nullptr),
+                                  SetInsulinName(&rec, &fixed),
+                                  GetInsulinName(&rec, &pastInsulins),
+                                  SetOralMedicationName(&rec, &fixedPill),
+                                  GetOralMedicationName(&rec, &none),
+                                  SetPredefinedInsulins(&rec, &beyondFavourites),
+                                  SetMealSegments(&rec, &late),
+                                  SetTargetRange(&rec, 150, 140, 90, 200, 55),  // low above high
+                                  SetTargetRange(&rec, 65, 140, 90, 200, 95),
+                                  SetScheduleSelection(&rec, 2),
+                                  SetInitializedFlag(&rec, 2)};
     EXPECT_EQ(bad, std::vector<int>(bad.size(), ME_BAD_PARAMETER));
     EXPECT_EQ(vb_Set_Meter_Option(&rec, eCommunicationRate, 0), ME_NOT_SUPPORTED);
     EXPECT_EQ(vb_Read_Meter_Option(&rec, eDayAverage), ME_NOT_SUPPORTED);

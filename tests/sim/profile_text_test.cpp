@@ -14,8 +14,8 @@ using simtest::SimTest;
 namespace {
 
 struct ProfileFile {
-    std::string path = ::testing::TempDir() + "vxsim_text_" +
-                       ::testing::UnitTest::GetInstance()->current_test_info()->name() + ".xml";
+    std::string path =
+        ::testing::TempDir() + "vxsim_text_" + ::testing::UnitTest::GetInstance()->current_test_info()->name() + ".xml";
     explicit ProfileFile(const std::string& content = "") {
         if (!content.empty()) std::ofstream(path, std::ios::binary) << content;
     }
@@ -35,8 +35,12 @@ TEST_F(ProfileText, HostileTextIsRefusedWithTheLineAndTheMeterIsKept) {
         {kHead + R"( serial="AB&#1;C"/>)", ":1: character reference to U+0001"},
         {kHead + R"( serial="AB&#xFFFE;C"/>)", "U+FFFE"},
         {kHead + R"( serial="AB&#xD800;C"/>)", "U+D800"},
-        {kHead + " serial=\"AB\x01" "C\"/>", ":1: character U+0001, which XML does not allow"},
-        {kHead + " serial=\"AB\xE9" "C\"/>", ":1: invalid UTF-8 (byte 0xE9)"},
+        {kHead + " serial=\"AB\x01"
+                 "C\"/>",
+         ":1: character U+0001, which XML does not allow"},
+        {kHead + " serial=\"AB\xE9"
+                 "C\"/>",
+         ":1: invalid UTF-8 (byte 0xE9)"},
         {kHead + R"( serial="&bogus;"/>)", "undeclared entity bogus"},
         {kHead + R"( serial="ABC1234567"/><meter/>)", "content after the document element"},
         {kHead + R"( serial="A<B"/>)", "'<' in an attribute value"},
@@ -56,7 +60,9 @@ TEST_F(ProfileText, HostileTextIsRefusedWithTheLineAndTheMeterIsKept) {
 
 TEST_F(ProfileText, TheWriterRefusesTextTheReaderWouldRefuse) {
     MeterProfile p = defaultProfile(2);
-    p.serial = "AB\x01" "C";
+    p.serial =
+        "AB\x01"
+        "C";
     ProfileFile file;
     EXPECT_THROW(writeProfileFile(p, file.path), std::runtime_error);
     p.serial = "ABC";

@@ -12,12 +12,12 @@
 
 static int failures = 0;
 
-#define CHECK(cond)                                                   \
-    do {                                                              \
-        if (!(cond)) {                                                \
+#define CHECK(cond)                                                            \
+    do {                                                                       \
+        if (!(cond)) {                                                         \
             fprintf(stderr, "%s:%d: failed: %s\n", __FILE__, __LINE__, #cond); \
-            ++failures;                                               \
-        }                                                             \
+            ++failures;                                                        \
+        }                                                                      \
     } while (0)
 
 /* Every function of the library, resolved by name. */
@@ -76,7 +76,7 @@ int main(int argc, char** argv) {
         fprintf(stderr, "%s\n", dlerror());
         return 1;
     }
-#define RESOLVE(ret, name, ...) \
+#define RESOLVE(ret, name, ...)                \
     *(void**)&vx.name = dlsym(library, #name); \
     CHECK(vx.name != NULL);
     VX_TRANSPORT_FUNCTIONS(RESOLVE)

@@ -20,7 +20,7 @@ namespace varnel::test {
 
 // The arguments of one call, for an effect to read or fill.
 struct FakeArgs {
-    METER_REC* rec = nullptr;  // null for the functions without one
+    METER_REC* rec = nullptr;          // null for the functions without one
     std::vector<std::int32_t> values;  // by-value numbers, in argument order
     std::vector<std::pair<const std::type_info*, void*>> refs;
 
@@ -63,7 +63,8 @@ public:
     // Every meter function logs its call and runs its script.
 #define VARNEL_FAKE_ARG(kind, type, name) , VARNEL_FAKE_ARG_##kind(name)
 #define VARNEL_FAKE_ARG_REC(name) Rec{&name}
-#define VARNEL_FAKE_ARG_VALUE(name) Value{name}
+#define VARNEL_FAKE_ARG_VALUE(name) \
+    Value { name }
 #define VARNEL_FAKE_ARG_IN(name) name
 #define VARNEL_FAKE_ARG_OUT(name) name
 #define VARNEL_FAKE_ARG_INOUT(name) name

@@ -1,12 +1,12 @@
 // The varnel command run as a user runs it, as a process, on a small simulated meter.
 #pragma once
 
-#include <gtest/gtest.h>
-#include <pugixml.hpp>
 #include <fcntl.h>
+#include <gtest/gtest.h>
 #include <spawn.h>
 #include <sys/wait.h>
 #include <unistd.h>
+#include <pugixml.hpp>
 
 #include <cstdio>
 #include <filesystem>

@@ -24,8 +24,13 @@ TEST(MeterText, EveryByteDecodesToACharacterADocumentCanCarry) {
         // Everything else comes back as the very byte, the code page's five gaps included.
         EXPECT_EQ(EncodeMeterText(decoded(std::uint8_t(b))), std::string(1, char(b)));
     }
-    for (auto [byte, text] : {std::pair{0x80, "\xE2\x82\xAC"}, {0x81, "\xC2\x81"}, {0x8A, "\xC5\xA0"},
-                              {0x9F, "\xC5\xB8"}, {0xA0, "\xC2\xA0"}, {0xE9, "\xC3\xA9"}, {0xFF, "\xC3\xBF"}})
+    for (auto [byte, text] : {std::pair{0x80, "\xE2\x82\xAC"},
+                              {0x81, "\xC2\x81"},
+                              {0x8A, "\xC5\xA0"},
+                              {0x9F, "\xC5\xB8"},
+                              {0xA0, "\xC2\xA0"},
+                              {0xE9, "\xC3\xA9"},
+                              {0xFF, "\xC3\xBF"}})
         EXPECT_EQ(decoded(std::uint8_t(byte)), text) << byte;
 }
 

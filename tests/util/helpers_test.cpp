@@ -1,9 +1,9 @@
 #include <gtest/gtest.h>
 
 #include <cstdint>
+#include <limits>
 #include <optional>
 #include <string>
-#include <limits>
 #include <thread>
 #include <tuple>
 
@@ -13,13 +13,19 @@
 using namespace varnel::detail;
 
 TEST(ToNumber, CDecimalSyntaxWithBlanksAroundAndNothingElse) {
-    for (auto [text, value] : {std::pair{"  12 ", 12.0}, {"\t-3", -3.0}, {"+4.5", 4.5}, {".5", 0.5}, {"7.", 7.0},
-                               {"1.5e3", 1500.0}, {"25E-1", 2.5}, {" 0 ", 0.0}}) {
+    for (auto [text, value] : {std::pair{"  12 ", 12.0},
+                               {"\t-3", -3.0},
+                               {"+4.5", 4.5},
+                               {".5", 0.5},
+                               {"7.", 7.0},
+                               {"1.5e3", 1500.0},
+                               {"25E-1", 2.5},
+                               {" 0 ", 0.0}}) {
         EXPECT_TRUE(IsNumeric(text)) << text;
         EXPECT_EQ(ToNumber(text), value) << text;
     }
-    for (const char* text : {"", "   ", "12a", "1.2.3", "0x10", "inf", "nan", "-", ".", "1e", "e5", "+-1", "1 2",
-                             "1,5", "- 3", "1e400", "-1e400"}) {
+    for (const char* text : {"", "   ", "12a", "1.2.3", "0x10", "inf", "nan", "-", ".", "1e", "e5", "+-1", "1 2", "1,5",
+                             "- 3", "1e400", "-1e400"}) {
         EXPECT_FALSE(IsNumeric(text)) << text;
         EXPECT_EQ(ToNumber(text), 0) << text;
     }
@@ -28,22 +34,52 @@ TEST(ToNumber, CDecimalSyntaxWithBlanksAroundAndNothingElse) {
 // Texts clients put in settings documents: what is a number and what only looks like one.
 TEST(DocumentNumber, PlainDecimalsOnly) {
     const std::string tiny = "0." + std::string(400, '0') + "1", tenMegabytes(10'000'000, '9');
-    for (auto [text, value] : {std::pair<std::string, double>{"12", 12}, {"-3", -3}, {"+4.5", 4.5}, {".5", 0.5},
-                               {"7.", 7}, {"007", 7}, {"99999999999999999999", 1e20}, {tiny, 0},
+    for (auto [text, value] : {std::pair<std::string, double>{"12", 12},
+                               {"-3", -3},
+                               {"+4.5", 4.5},
+                               {".5", 0.5},
+                               {"7.", 7},
+                               {"007", 7},
+                               {"99999999999999999999", 1e20},
+                               {tiny, 0},
                                {"1." + std::string(10'000'000, '0'), 1}})
         EXPECT_EQ(DocumentNumber(text), value) << text.substr(0, 20);
-    for (std::string_view text : std::initializer_list<std::string_view>{
-             "", " ", "abc", "nan", "NaN", "inf", "-infinity", "1e309", "1e5", "1E5", "0x10", " 12", "12 ", "1 2",
-             "\t12", "+", "-", ".", "-.", "1.2.3", "+-1", "12a", "1,5", "\xC3\xA9",
-             "\xD9\xA1\xD9\xA2",  // Arabic-Indic one, two
-             "\xEF\xBC\x91",       // fullwidth one
-             std::string_view("1\0" "2", 3), tenMegabytes}) {
+    for (std::string_view text : std::initializer_list<std::string_view>{"",
+                                                                         " ",
+                                                                         "abc",
+                                                                         "nan",
+                                                                         "NaN",
+                                                                         "inf",
+                                                                         "-infinity",
+                                                                         "1e309",
+                                                                         "1e5",
+                                                                         "1E5",
+                                                                         "0x10",
+                                                                         " 12",
+                                                                         "12 ",
+                                                                         "1 2",
+                                                                         "\t12",
+                                                                         "+",
+                                                                         "-",
+                                                                         ".",
+                                                                         "-.",
+                                                                         "1.2.3",
+                                                                         "+-1",
+                                                                         "12a",
+                                                                         "1,5",
+                                                                         "\xC3\xA9",
+                                                                         "\xD9\xA1\xD9\xA2",  // Arabic-Indic one, two
+                                                                         "\xEF\xBC\x91",      // fullwidth one
+                                                                         std::string_view("1\0"
+                                                                                          "2",
+                                                                                          3),
+                                                                         tenMegabytes}) {
         EXPECT_EQ(DocumentNumber(text), std::nullopt) << text.substr(0, 20);
         EXPECT_EQ(DocumentInt16(text), std::nullopt) << text.substr(0, 20);
     }
     // Sixteen bits, halves to even.
-    for (auto [text, value] : {std::pair{"32767", 32767}, {"-32768", -32768}, {"12.5", 12}, {"13.5", 14},
-                               {"-0.5", 0}, {"32767.4", 32767}})
+    for (auto [text, value] :
+         {std::pair{"32767", 32767}, {"-32768", -32768}, {"12.5", 12}, {"13.5", 14}, {"-0.5", 0}, {"32767.4", 32767}})
         EXPECT_EQ(DocumentInt16(text), std::optional<std::int16_t>(value)) << text;
     for (const char* text : {"32768", "-32769", "32767.5", "99999999999999999999"})
         EXPECT_EQ(DocumentInt16(text), std::nullopt) << text;
@@ -111,9 +147,9 @@ TEST(IsValidDate, NumericPattern) {
     const char* p = "dd/MM/yyyy";
     for (const char* ok : {"29/02/2004", "29/02/2000", "1/2/1601", "31/12/9998", "", "   "})
         EXPECT_TRUE(IsValidDate(ok, "/", p)) << ok;
-    for (const char* bad : {"29/02/2003", "29/02/1900", "1/13/2004", "01/02/1600", "01/02/9999", "31/04/2004",
-                            "0/01/2004", "01-02-2004", "1a/02/2004", "01/02/2004/", "01//2004", "01/02/20o4",
-                            " 01/02/2004"})
+    for (const char* bad :
+         {"29/02/2003", "29/02/1900", "1/13/2004", "01/02/1600", "01/02/9999", "31/04/2004", "0/01/2004", "01-02-2004",
+          "1a/02/2004", "01/02/2004/", "01//2004", "01/02/20o4", " 01/02/2004"})
         EXPECT_FALSE(IsValidDate(bad, "/", p)) << bad;
     EXPECT_TRUE(IsValidDate("2004-02-29", "-", "yyyy-MM-dd"));
     EXPECT_TRUE(IsValidDate("29.02.2004", " . ", "dd.MM.yyyy"));
@@ -146,10 +182,12 @@ TEST(ContinueFlag, IsPerThreadAndStartsTrue) {
 }
 
 TEST(MinMaxDates, RangesByMeterType) {
-    struct Range { int type, y0, y1; };
-    for (auto [type, y0, y1] : {Range{1, 1990, 2014}, Range{2, 1992, 2022}, Range{3, 1992, 2022},
-                                Range{4, 1997, 2015}, Range{5, 1996, 2026}, Range{6, 2000, 2020},
-                                Range{7, 2000, 2020}, Range{8, 2000, 2020}, Range{0, 0, 0}, Range{9, 0, 0}}) {
+    struct Range {
+        int type, y0, y1;
+    };
+    for (auto [type, y0, y1] :
+         {Range{1, 1990, 2014}, Range{2, 1992, 2022}, Range{3, 1992, 2022}, Range{4, 1997, 2015}, Range{5, 1996, 2026},
+          Range{6, 2000, 2020}, Range{7, 2000, 2020}, Range{8, 2000, 2020}, Range{0, 0, 0}, Range{9, 0, 0}}) {
         std::int32_t lo = 7, hi = 8;  // other types leave both untouched
         getMinMaxDates(type, lo, hi);
         EXPECT_EQ(lo, y0 ? DateTime::fromParts(y0, 1, 1)->dayNumber() : 7) << type;
@@ -159,8 +197,14 @@ TEST(MinMaxDates, RangesByMeterType) {
 
 TEST(UniqueChecker, FoldsAsciiCaseKeepsOrderAndClears) {
     varnel::UniqueChecker checker;
-    for (auto [text, added] : {std::pair{"abc", true}, {"ABC", false}, {"aBc", false}, {"abc ", true},
-                               {"\xC3\xA9", true}, {"\xC3\x89", true}, {"", true}, {"", false}})
+    for (auto [text, added] : {std::pair{"abc", true},
+                               {"ABC", false},
+                               {"aBc", false},
+                               {"abc ", true},
+                               {"\xC3\xA9", true},
+                               {"\xC3\x89", true},
+                               {"", true},
+                               {"", false}})
         EXPECT_EQ(checker.AddValue(text), added) << text;  // bytes beyond ASCII compare exactly
     EXPECT_EQ(checker.Values(), (std::vector<std::string>{"abc", "abc ", "\xC3\xA9", "\xC3\x89", ""}));
 
@@ -175,17 +219,22 @@ TEST(UniqueChecker, FoldsAsciiCaseKeepsOrderAndClears) {
 // match across case, whatever locale the client process runs under.
 TEST(CaseFold, AsciiLettersOnly) {
     EXPECT_EQ(LowerCase("AbZ@[`{09 \xC3\x89"), "abz@[`{09 \xC3\x89");
-    for (auto [a, b, equal] : {std::tuple{"SN123ab", "sn123AB", true}, {"com", "COM", true}, {"", "", true},
-                               {"abc", "abcd", false}, {"abc", "ab", false}, {"@", "`", false}, {"[", "{", false},
-                               {"\xC3\xA9", "\xC3\x89", false}, {"I", "\xC4\xB1", false}})
+    for (auto [a, b, equal] : {std::tuple{"SN123ab", "sn123AB", true},
+                               {"com", "COM", true},
+                               {"", "", true},
+                               {"abc", "abcd", false},
+                               {"abc", "ab", false},
+                               {"@", "`", false},
+                               {"[", "{", false},
+                               {"\xC3\xA9", "\xC3\x89", false},
+                               {"I", "\xC4\xB1", false}})
         EXPECT_EQ(EqualsNoCase(a, b), equal) << a << " / " << b;
 }
 
 // The type a document or a meter names: the family's eight members, a fraction among them only
 // for the identity check to refuse later, and nothing else.
 TEST(MeterType, FamilyRangeOnly) {
-    for (double type : {1.0, 2.0, 7.0, 8.0, 0.5, 7.5})
-        EXPECT_TRUE(IsMeterType(type)) << type;
+    for (double type : {1.0, 2.0, 7.0, 8.0, 0.5, 7.5}) EXPECT_TRUE(IsMeterType(type)) << type;
     for (double type : {0.0, -0.0, -1.0, 8.0001, 9.0, 65535.0, std::numeric_limits<double>::quiet_NaN(),
                         std::numeric_limits<double>::infinity()})
         EXPECT_FALSE(IsMeterType(type)) << type;
