@@ -76,10 +76,11 @@ VARNEL_API int32_t varnel_clear_meter(varnel_component* c, METER_REC* rec, varne
 /* Releases the meter. */
 VARNEL_API int32_t varnel_close_meter(varnel_component* c, METER_REC* rec);
 
-/* Progress of the running request (1-100) on the caller's thread; the handler
+/* Progress of the running request (0-100) on the caller's thread; the handler
    may change *percent. NULL fn removes the handler. */
 VARNEL_API void varnel_on_progress(varnel_component* c, void (*fn)(int16_t* percent, void* user), void* user);
-/* Raised at the end of most exits of a request (closeMeter never). NULL fn removes the handler. */
+/* Raised at the end of most exits of a request (dll_wrapper.h lists which); closeMeter raises it only
+   when it fails unexpectedly. NULL fn removes the handler. */
 VARNEL_API void varnel_on_complete(varnel_component* c, void (*fn)(void* user), void* user);
 
 /* After a request that raised an unexpected error (a ComponentError in C++): its number, and a text with
