@@ -256,6 +256,13 @@ private:
             bool good = !enc.empty() && alpha(enc[0]);
             for (char c : enc) good = good && (alpha(c) || (c >= '0' && c <= '9') || c == '.' || c == '_' || c == '-');
             if (!good) fail("malformed encoding name");
+            // Every text is read as UTF-8; a document declaring another encoding would be misread.
+            const auto utf8 = [](std::string_view n) {
+                std::string folded;
+                for (char c : n) folded += (c >= 'a' && c <= 'z') ? char(c - 'a' + 'A') : c;
+                return folded == "UTF-8" || folded == "UTF8";
+            };
+            if (!utf8(enc)) fail("encoding " + std::string(enc) + " is not supported: documents are UTF-8");
             skipSpace();
             space = true;  // strict parsers need no blank between encoding and standalone
         }

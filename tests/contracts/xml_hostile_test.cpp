@@ -84,6 +84,7 @@ TEST(XMLHostileText, LoadRefusesWithWhatAndWhereAndChangesNothing) {
         {"declaration", "<?xml version='2.0'?><R/>", "unsupported XML version"},
         {"declaration", "<?xml version='1.0' standalone='maybe'?><R/>", "standalone"},
         {"declaration", "<?xml version='1.0' encoding='8bit'?><R/>", "encoding name"},
+        {"declaration", "<?xml version='1.0' encoding='ISO-8859-1'?><R>caf\xC3\xA9</R>", "documents are UTF-8"},
         {"deep", nested(257), "nested deeper than 256 levels"},
         {"deep", nested(256, "<b/>"), "nested deeper than 256 levels"},
         {"deep", nested(100'000), "nested deeper than 256 levels at line 1, offset 768"},
