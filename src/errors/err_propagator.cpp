@@ -71,20 +71,21 @@ std::int16_t toInt16(long long value) {
     return static_cast<std::int16_t>(value);
 }
 
-std::int16_t roundToInt16(double value) {
+namespace {
+
+// The nearest integer of type T (halves to even), or the overflow error when T cannot hold it.
+template <class T>
+T roundChecked(double value) {
     if (!std::isfinite(value)) raise(errc::overflow, "Overflow");
     double r = std::nearbyint(value);
-    if (r < std::numeric_limits<std::int16_t>::min() || r > std::numeric_limits<std::int16_t>::max())
-        raise(errc::overflow, "Overflow");
-    return static_cast<std::int16_t>(r);
+    if (r < std::numeric_limits<T>::min() || r > std::numeric_limits<T>::max()) raise(errc::overflow, "Overflow");
+    return static_cast<T>(r);
 }
 
-std::int32_t roundToInt32(double value) {
-    if (!std::isfinite(value)) raise(errc::overflow, "Overflow");
-    double r = std::nearbyint(value);
-    if (r < std::numeric_limits<std::int32_t>::min() || r > std::numeric_limits<std::int32_t>::max())
-        raise(errc::overflow, "Overflow");
-    return static_cast<std::int32_t>(r);
-}
+}  // namespace
+
+std::int16_t roundToInt16(double value) { return roundChecked<std::int16_t>(value); }
+
+std::int32_t roundToInt32(double value) { return roundChecked<std::int32_t>(value); }
 
 }  // namespace varnel::detail
