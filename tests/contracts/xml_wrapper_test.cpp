@@ -3,7 +3,6 @@
 #include "varnel/xml_wrapper.h"
 
 #include <gtest/gtest.h>
-#include <unistd.h>
 
 #include <filesystem>
 #include <fstream>
@@ -13,6 +12,7 @@
 #include <vector>
 
 #include "support/expect_error.h"
+#include "support/temp_dir.h"
 #include "support/wrapper_fixture.h"
 #include "varnel/component_error.h"
 
@@ -23,18 +23,7 @@ using namespace std::string_literals;
 namespace {
 
 using test::expectError;
-
-// A directory for one test, removed afterwards.
-struct TempDir {
-    std::filesystem::path path = std::filesystem::temp_directory_path() / ("varnel_xml_" + std::to_string(::getpid()));
-    TempDir() { std::filesystem::create_directories(path); }
-    ~TempDir() { std::filesystem::remove_all(path); }
-    std::string file(const std::string& name, const std::string& content = {}) const {
-        std::string p = (path / name).string();
-        if (!content.empty()) std::ofstream(p, std::ios::binary) << content;
-        return p;
-    }
-};
+using test::TempDir;
 
 XMLWrapper loaded(const std::string& text) {
     XMLWrapper x;
@@ -248,21 +237,19 @@ TEST(XMLWrapperTest, NavigationAndReading) {
 }
 
 TEST(XMLWrapperTest, TextsAndAttributesRoundTripThroughXmlText) {
-    const std::vector<std::string> texts = {
-        "plain",
-        "a < b && c > d",
-        "quote \" and 'apos'",
-        "]]> and <![CDATA[",
-        "line1\nline2",
-        "tab\there",
-        "  padded  ",
-        "   ",
-        "\n",
-        "Gr\xC3\xB6\xC3\x9F"
-        "e \xE2\x82\xAC",
-        "&amp; literal",
-        "\xF0\x9F\x98\x80 \xEF\xBF\xBD",
-    };
+    const std::vector<std::string> texts = {"plain",
+                                            "a < b && c > d",
+                                            "quote \" and 'apos'",
+                                            "]]> and <![CDATA[",
+                                            "line1\nline2",
+                                            "tab\there",
+                                            "  padded  ",
+                                            "   ",
+                                            "\n",
+                                            "Gr\xC3\xB6\xC3\x9F"
+                                            "e \xE2\x82\xAC",
+                                            "&amp; literal",
+                                            "\xF0\x9F\x98\x80 \xEF\xBF\xBD"};
     XMLWrapper x = newDoc(doc_kind::datalog);
     x.SelectElement("Records");
     for (const std::string& t : texts) {
@@ -305,35 +292,29 @@ TEST(XMLWrapperTest, LoadXmlReplacesTheDocumentOrRefusesAndChangesNothing) {
     EXPECT_EQ(x.GetChildAttribute("T", "b"), "<&AB");
     EXPECT_EQ(x.GetChildValue("T"), ">\"'");
 
-    // Malformed or too deep text is refused and changes nothing.
-    const char* bad[] = {
-        "",
-        "   ",
-        "just text",
-        "<R>",
-        "<R></S>",
-        "<R><A></R></A>",
-        "<R a='1' a='2'/>",
-        "<R a=1/>",
-        "<R a='x<y'/>",
-        "<R>&</R>",
-        "<R>&undeclared;</R>",
-        "<R>&#0;</R>",
-        "<R>&#xD800;</R>",
-        "<R>&#xZZ;</R>",
-        "<R>a ]]> b</R>",
-        "<R/><S/>",
-        "<R/>trailing",
-        "leading<R/>",
-        "<R><!-- a -- b --></R>",
-        "<R><![CDATA[x</R>",
-        "<1R/>",
-        "<R><a b='1'c='2'/></R>",
-        "<R/><?xml version='1.0'?>",
-        "<R><!ELEMENT x ANY></R>",
-        "<!DOCTYPE R [<!ENTITY e 'x'>",
-        "<R attr='unterminated/>",
-    };
+    // Malformed text is refused and changes nothing (hostile text: xml_hostile_test).
+    const char* bad[] = {"",
+                         "   ",
+                         "just text",
+                         "<R>",
+                         "<R></S>",
+                         "<R><A></R></A>",
+                         "<R a=1/>",
+                         "<R a='x<y'/>",
+                         "<R>&</R>",
+                         "<R>&#xZZ;</R>",
+                         "<R>a ]]> b</R>",
+                         "<R/><S/>",
+                         "<R/>trailing",
+                         "leading<R/>",
+                         "<R><!-- a -- b --></R>",
+                         "<R><![CDATA[x</R>",
+                         "<1R/>",
+                         "<R><a b='1'c='2'/></R>",
+                         "<R/><?xml version='1.0'?>",
+                         "<R><!ELEMENT x ANY></R>",
+                         "<!DOCTYPE R [<!ENTITY e 'x'>",
+                         "<R attr='unterminated/>"};
     x = statusDoc();
     x.SelectElement("ErrCode");
     const std::string before = x.XML();
@@ -351,17 +332,9 @@ TEST(XMLWrapperTest, LoadXmlReplacesTheDocumentOrRefusesAndChangesNothing) {
     EXPECT_FALSE(e.LoadXML("<R>"));
     EXPECT_TRUE(e.IsEmpty());
 
-    auto nested = [](int depth) {
-        std::string open, close;
-        for (int i = 0; i < depth; ++i) open += "<a>", close += "</a>";
-        return open + close;
-    };
-    EXPECT_TRUE(x.LoadXML(nested(256))) << x.LastLoadError();
+    EXPECT_NE(x.LastLoadError(), "");
+    EXPECT_TRUE(x.LoadXML("<R/>"));
     EXPECT_EQ(x.LastLoadError(), "");  // forgotten after a successful load
-    EXPECT_FALSE(x.LoadXML(nested(257)));
-    EXPECT_NE(x.LastLoadError().find("256"), std::string::npos) << x.LastLoadError();
-    EXPECT_FALSE(x.LoadXML(nested(100000)));
-    EXPECT_EQ(x.CountElements("a"), 255);
 }
 
 TEST(XMLWrapperTest, EntitiesAndDtdsAreNeverExpanded) {
