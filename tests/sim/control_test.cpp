@@ -3,29 +3,18 @@
 #include <dlfcn.h>
 
 #include <cctype>
-#include <cstdio>
 #include <fstream>
 #include <sstream>
 
 #include "fixture.h"
+#include "support/temp_dir.h"
 #include "varnel/vxsim.h"
 
 using namespace varnel::sim;
 using simtest::SimTest;
 using simtest::text;
 
-namespace {
-
-struct TempFile {
-    std::string path =
-        ::testing::TempDir() + "vxsim_" + ::testing::UnitTest::GetInstance()->current_test_info()->name() + ".xml";
-    explicit TempFile(const std::string& content = "") {
-        if (!content.empty()) std::ofstream(path) << content;
-    }
-    ~TempFile() { std::remove(path.c_str()); }
-};
-
-}  // namespace
+using varnel::test::TempDir;
 
 using Faults = SimTest;
 
@@ -112,10 +101,10 @@ TEST_F(Profiles, ShippedFilesAreTheDefaultMetersAndWrittenOnesReadBackEqual) {
     p.binaryDatalog[3].timeStamp = p.binaryDatalog[2].timeStamp;
     MeterProfile records = defaultProfile(2);
     records.datalog[0].Test.Medication = 0.1;
+    TempDir dir;
     for (const MeterProfile& written : {p, records}) {
-        TempFile file;
-        writeProfileFile(written, file.path);
-        EXPECT_EQ(readProfileFile(file.path), written) << written.type;
+        writeProfileFile(written, dir.file("meter.xml"));
+        EXPECT_EQ(readProfileFile(dir.file("meter.xml")), written) << written.type;
     }
 }
 
@@ -141,20 +130,21 @@ TEST_F(Profiles, BadFilesNameTheFileTheLineAndTheProblemAndLeaveTheMeter) {
          "<binaryDatalog><record type='256' time='2008-01-01 00:00:00'/></binaryDatalog></meter>",
          ":1: type 256 is outside 0..255"},
     };
+    TempDir dir;
     for (const auto& [content, expected] : cases) {
         SCOPED_TRACE(content);
-        TempFile file(content);
-        EXPECT_EQ(vxsim_load_profile(file.path.c_str()), ME_FAIL);
+        const std::string file = dir.file("meter.xml", content);
+        EXPECT_EQ(vxsim_load_profile(file.c_str()), ME_FAIL);
         const std::string error = vxsim_last_error();
-        EXPECT_EQ(error.rfind(file.path, 0), 0u) << error;
+        EXPECT_EQ(error.rfind(file, 0), 0u) << error;
         EXPECT_NE(error.find(expected), std::string::npos) << error;
         EXPECT_EQ(meter().type, eMorvex);
     }
     EXPECT_EQ(vxsim_load_profile("/nonexistent/meter.xml"), ME_FAIL);
     EXPECT_NE(std::string(vxsim_last_error()).find("/nonexistent/meter.xml"), std::string::npos);
 
-    TempFile good(head + "><ranges glucoseLow='20' glucoseHigh='600'/></meter>");
-    ASSERT_EQ(vxsim_load_profile(good.path.c_str()), ME_SUCCESS) << vxsim_last_error();
+    const std::string good = dir.file("good.xml", head + "><ranges glucoseLow='20' glucoseHigh='600'/></meter>");
+    ASSERT_EQ(vxsim_load_profile(good.c_str()), ME_SUCCESS) << vxsim_last_error();
     EXPECT_STREQ(vxsim_last_error(), "");
     EXPECT_EQ(meter().serial, "ABC1234567");
 }
@@ -162,10 +152,11 @@ TEST_F(Profiles, BadFilesNameTheFileTheLineAndTheProblemAndLeaveTheMeter) {
 // Files written before record types had words give them as numbers; those read as the words do.
 TEST_F(Profiles, RecordTypesReadByNumberAsByWord) {
     const MeterProfile p = defaultProfile(7);
-    TempFile file;
-    writeProfileFile(p, file.path);
+    TempDir dir;
+    const std::string file = dir.file("meter.xml");
+    writeProfileFile(p, file);
     std::stringstream text;
-    text << std::ifstream(file.path).rdbuf();
+    text << std::ifstream(file).rdbuf();
     std::string numbered = text.str();
     std::size_t at = 0;
     for (const RECORD_DATA& r : p.binaryDatalog) {
@@ -174,8 +165,8 @@ TEST_F(Profiles, RecordTypesReadByNumberAsByWord) {
         ASSERT_TRUE(std::isalpha(static_cast<unsigned char>(numbered[at]))) << numbered.substr(at, end - at);
         numbered.replace(at, end - at, std::to_string(r.recType));
     }
-    std::ofstream(file.path) << numbered;
-    EXPECT_EQ(readProfileFile(file.path), p);
+    std::ofstream(file) << numbered;
+    EXPECT_EQ(readProfileFile(file), p);
 }
 
 using Controls = SimTest;
@@ -200,11 +191,12 @@ TEST_F(Controls, CControlsSelectAttachRenameFailAndReload) {
     ASSERT_EQ(vxsim_clear_faults(), ME_SUCCESS);
     EXPECT_EQ(vb_Tickle_Meter(&rec), ME_SUCCESS);
 
-    TempFile saved;
-    ASSERT_EQ(vxsim_save_profile(saved.path.c_str()), ME_SUCCESS);
+    TempDir dir;
+    const std::string saved = dir.file("saved.xml");
+    ASSERT_EQ(vxsim_save_profile(saved.c_str()), ME_SUCCESS);
     ASSERT_EQ(vxsim_reset(), ME_SUCCESS);
     EXPECT_EQ(meter().type, eMorvex);
-    ASSERT_EQ(vxsim_load_profile(saved.path.c_str()), ME_SUCCESS);
+    ASSERT_EQ(vxsim_load_profile(saved.c_str()), ME_SUCCESS);
     EXPECT_EQ(meter().serial, "QLB40088300");
 }
 

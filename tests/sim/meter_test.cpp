@@ -122,16 +122,6 @@ TEST_F(MeterSettings, OptionsWrittenOneByOneOrAllOrNoneReadBack) {
     EXPECT_EQ(rec.Setting.nValue[eEvevtAveraging], 4);
 }
 
-TEST_F(MeterSettings, ClockIsSetAndRuns) {
-    connect(7);
-    const std::int32_t t = secondsOf(2010, 7, 4, 12, 0, 0);
-    ASSERT_EQ(vb_Set_Meter_Clock(&rec, t), ME_SUCCESS);
-    clock->advance(5400);
-    std::int32_t read = 0;
-    ASSERT_EQ(vb_Read_Meter_Clock(&rec, &read), ME_SUCCESS);
-    EXPECT_EQ(read, t + 5);
-}
-
 // The clock hook is the library's only time source: another clock handed over
 // continues the meter clock from the time last read, and half a hook is no clock at all.
 TEST_F(MeterSettings, TheMeterClockFollowsWhicheverClockTheCallerHandsOver) {

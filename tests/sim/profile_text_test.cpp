@@ -2,25 +2,17 @@
 // refused whole, naming the file, the line and the problem; the reader never
 // takes the first of two attributes or cuts a value at "&#0;", and the writer
 // never writes a file the reader would refuse.
-#include <cstdio>
 #include <fstream>
 
 #include "fixture.h"
+#include "support/temp_dir.h"
 #include "varnel/vxsim.h"
 
 using namespace varnel::sim;
 using simtest::SimTest;
+using varnel::test::TempDir;
 
 namespace {
-
-struct ProfileFile {
-    std::string path =
-        ::testing::TempDir() + "vxsim_text_" + ::testing::UnitTest::GetInstance()->current_test_info()->name() + ".xml";
-    explicit ProfileFile(const std::string& content = "") {
-        if (!content.empty()) std::ofstream(path, std::ios::binary) << content;
-    }
-    ~ProfileFile() { std::remove(path.c_str()); }
-};
 
 const std::string kHead = R"(<meter type="1" firmware="X1 01/02/03" clock="2005-01-01 00:00:00")";
 
@@ -47,12 +39,13 @@ TEST_F(ProfileText, HostileTextIsRefusedWithTheLineAndTheMeterIsKept) {
         {kHead + R"( serial="ABC1234567"><ranges glucoseLow='20' glucoseHigh='600' glucoseLow='1'/></meter>)",
          "duplicate attribute glucoseLow"},
     };
+    TempDir dir;
     for (const auto& [content, expected] : cases) {
         SCOPED_TRACE(content);
-        ProfileFile file(content);
-        EXPECT_EQ(vxsim_load_profile(file.path.c_str()), ME_FAIL);
+        const std::string file = dir.file("meter.xml", content);
+        EXPECT_EQ(vxsim_load_profile(file.c_str()), ME_FAIL);
         const std::string error = vxsim_last_error();
-        EXPECT_EQ(error.rfind(file.path + ":", 0), 0u) << error;
+        EXPECT_EQ(error.rfind(file + ":", 0), 0u) << error;
         EXPECT_NE(error.find(expected), std::string::npos) << error;
         EXPECT_EQ(meter().type, eMorvex);
     }
@@ -63,18 +56,19 @@ TEST_F(ProfileText, TheWriterRefusesTextTheReaderWouldRefuse) {
     p.serial =
         "AB\x01"
         "C";
-    ProfileFile file;
-    EXPECT_THROW(writeProfileFile(p, file.path), std::runtime_error);
+    TempDir dir;
+    const std::string file = dir.file("meter.xml");
+    EXPECT_THROW(writeProfileFile(p, file), std::runtime_error);
     p.serial = "ABC";
     p.name = "K\xF6ln";  // a single byte, not UTF-8
     try {
-        writeProfileFile(p, file.path);
+        writeProfileFile(p, file);
         ADD_FAILURE() << "written";
     } catch (const std::runtime_error& e) {
         EXPECT_NE(std::string(e.what()).find("name cannot be written as XML text: invalid UTF-8"), std::string::npos)
             << e.what();
     }
     p.name = "K\xC3\xB6ln";
-    writeProfileFile(p, file.path);
-    EXPECT_EQ(readProfileFile(file.path), p);
+    writeProfileFile(p, file);
+    EXPECT_EQ(readProfileFile(file), p);
 }
