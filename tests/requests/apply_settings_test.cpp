@@ -11,16 +11,9 @@ using namespace varnel::test;
 namespace {
 
 struct ApplySettings : WrapperTest {
-    static XMLWrapper configFor(const std::string& sn, const std::string& type, const std::string& settings,
-                                const std::string& root = "DeviceSettings") {
-        XMLWrapper doc;
-        EXPECT_TRUE(doc.LoadXML("<" + root + "><DeviceInfo><SN>" + sn + "</SN><TypeID>" + type +
-                                "</TypeID></DeviceInfo><Settings>" + settings + "</Settings></" + root + ">"));
-        return doc;
-    }
     // A configuration document for the discovered meter.
     static XMLWrapper config(const std::string& settings) {
-        return configFor(sim::meter().serial, std::to_string(sim::meter().type), settings);
+        return settingsDoc(sim::meter().serial, std::to_string(sim::meter().type), settings);
     }
     std::int32_t apply(XMLWrapper cfg, XMLWrapper info) {
         fresh();
@@ -106,17 +99,17 @@ TEST_F(ApplySettings, ChecksStopTheRequestBeforeAnyWrite) {
     Case cases[] = {
         {config(beep), deviceDoc(port, "", "7"), bad + "Device SN from Device Info XML is invalid"},
         {config(beep), deviceDoc(port, sn, "0"), bad + "Device Type from Device Info XML is invalid"},
-        {configFor(sn, "7", beep, "Other"), device, "-17/-33/Invalid XML ;"},
-        {configFor(sn, "7", "</Settings><DeviceInfo/><Settings>"), device,
+        {settingsDoc(sn, "7", beep, "Other"), device, "-17/-33/Invalid XML ;"},
+        {settingsDoc(sn, "7", "</Settings><DeviceInfo/><Settings>"), device,
          "-17/-33/Invalid XML ;DeviceInfo missing in Device settings"},
-        {configFor(sn, "9", beep), device, bad + "Device Type from Device Info XML is invalid"},
-        {configFor("", "7", beep), device, bad + "Device SN from Device settings XML is invalid"},
+        {settingsDoc(sn, "9", beep), device, bad + "Device Type from Device Info XML is invalid"},
+        {settingsDoc("", "7", beep), device, bad + "Device SN from Device settings XML is invalid"},
         {config(beep), deviceDoc("-1", sn, "7"),
          "-3/-19/Bad parameter passed to the function ; Port number from XML is invalid"},
         {config(beep), device, "-17/-2/Timeout error", "vb_Chk4Meter"},
-        {configFor("X1", "7", beep), device,
+        {settingsDoc("X1", "7", beep), device,
          diff + "Device SN from Device settings XML - X1 Device SN from device - " + sn + " do not match"},
-        {configFor(sn, "5", beep), device,
+        {settingsDoc(sn, "5", beep), device,
          diff + "Device Type from Device settings XML - 5 Device Type from device - 7 do not match"},
         {config(beep), deviceDoc(port, sn, "2"),
          diff + "Device Type from Device Info XML - 2 Device Type from device - 7 do not match"},
@@ -137,7 +130,7 @@ TEST_F(ApplySettings, ChecksStopTheRequestBeforeAnyWrite) {
     std::string lower = sn;
     for (char& ch : lower) ch = static_cast<char>(std::tolower(ch));
     sim::setSerial(lower);
-    EXPECT_EQ(apply(configFor(sn, "7.0", beep)), ME_SUCCESS);
+    EXPECT_EQ(apply(settingsDoc(sn, "7.0", beep)), ME_SUCCESS);
     EXPECT_EQ(report(), kReportOk);
 }
 
@@ -267,14 +260,7 @@ TEST_F(ApplySettings, AMissingElementEndsTheRequestAfterTheEarlierWrites) {
 
 TEST_F(ApplySettings, ARoundTripChangesExactlyWhatTheClientEdited) {
     discover(eMorvex);
-    const auto read = [&] {
-        XMLWrapper cfg = newDoc(doc_kind::device_settings);
-        bool checked = false;
-        fresh();
-        EXPECT_EQ(wrapper->getDeviceSettings(rec, device, cfg, true, status, checked), ME_SUCCESS);
-        return parsed(cfg);
-    };
-    auto edited = read();
+    auto edited = readSettings();
     pugi::xml_node settings = edited->document_element().child("Settings");
     pugi::xml_node beep = settings.child("Beep");
     ASSERT_STREQ(beep.text().get(), "1");
@@ -301,7 +287,7 @@ TEST_F(ApplySettings, ARoundTripChangesExactlyWhatTheClientEdited) {
 
     std::ostringstream expected, again;
     settings.print(expected);
-    read()->document_element().child("Settings").print(again);
+    readSettings()->document_element().child("Settings").print(again);
     EXPECT_EQ(again.str(), expected.str());
 }
 

@@ -26,21 +26,13 @@ struct Discovery : WrapperTest {
 TEST_F(Discovery, FoundMeterIsDescribedAndItsRecordFilled) {
     meterWith(eCVPellis, 3, "SW1234567 05/07/03");
     EXPECT_EQ(discoverOn("3"), ME_SUCCESS);
-    EXPECT_EQ(device.XML(), R"(<Device>
-  <DeviceInfo>
-    <SN>PLS2004417</SN>
-    <MasterSWVer D="07" MM="05" Y="2003">SW1234567</MasterSWVer>
-    <Name>Corvia(R) Pellis(R)</Name>
-    <TypeID>2</TypeID>
-    <Class Txt="Glucose Meter">0</Class>
-    <CommState Txt="On">1</CommState>
-  </DeviceInfo>
-  <PortInfo>
-    <PortID>3</PortID>
-    <PortType Txt="Serial">0</PortType>
-  </PortInfo>
-</Device>
-)");
+    const auto described = parsed(device);
+    const pugi::xml_node found = described->document_element().child("DeviceInfo");
+    EXPECT_EQ(childNames(described->document_element()), "DeviceInfo PortInfo ");
+    EXPECT_EQ(childNames(found), "SN MasterSWVer Name TypeID Class CommState ");
+    EXPECT_EQ(childTexts(found), (Names{"PLS2004417", "D=07 MM=05 Y=2003 SW1234567", "Corvia(R) Pellis(R)", "2",
+                                        "Txt=Glucose Meter 0", "Txt=On 1"}));
+    EXPECT_EQ(childTexts(described->document_element().child("PortInfo")), (Names{"3", "Txt=Serial 0"}));
     EXPECT_EQ(rec.M_Type, eCVPellis);
     EXPECT_TRUE(statusGroups(status).empty());
     EXPECT_EQ(completions, 0);

@@ -255,11 +255,9 @@ TEST_F(DeviceSettings, EveryExitReportsOnceAndCompletes) {
 // A name the meter does not give, at any position, is a failed read, never an empty name.
 TEST_F(DeviceSettings, AFailedNameReadAtAnyPositionFailsTheRequest) {
     const std::string failed = "-17/-2/" + ErrorDescription(-17) + ";;" + ErrorDescription(-2) + " ; ";
-    for (auto [function, position, text] : {std::tuple{"GetInsulinName", 1, "Insulins"},
-                                            {"GetInsulinName", 10, "Insulins"},
-                                            {"GetInsulinName", 21, "Insulins"},
-                                            {"GetOralMedicationName", 3, "OralMeds"},
-                                            {"GetOralMedicationName", 15, "OralMeds"}}) {
+    // Every position of each list fails alike in the fault sweep; here, each list's text.
+    for (auto [function, position, text] :
+         {std::tuple{"GetInsulinName", 21, "Insulins"}, {"GetOralMedicationName", 3, "OralMeds"}}) {
         SCOPED_TRACE(std::string(function) + " " + std::to_string(position));
         discover(eMorvex);
         sim::injectFault(function, position, ME_TIME_OUT, false);

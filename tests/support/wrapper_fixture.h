@@ -99,6 +99,15 @@ inline XMLWrapper deviceDoc(const std::string& port, const std::string& sn, cons
     return doc;
 }
 
+// A settings document as a client writes it: the meter it is for, then the items; empty when it does not load.
+inline XMLWrapper settingsDoc(const std::string& sn, const std::string& type, const std::string& settings,
+                              const std::string& root = "DeviceSettings") {
+    XMLWrapper doc;
+    doc.LoadXML("<" + root + "><DeviceInfo><SN>" + sn + "</SN><TypeID>" + type + "</TypeID></DeviceInfo><Settings>" +
+                settings + "</Settings></" + root + ">");
+    return doc;
+}
+
 // Runs a request (or a routine, with the trace started afresh) that must
 // fail unexpectedly; the error's number and trace.
 template <class F>
@@ -150,6 +159,14 @@ struct WrapperTest : ::testing::Test {
         XMLWrapper conn = connectionDoc(std::to_string(sim::meter().port));
         ASSERT_EQ(wrapper->discoverDevice(rec, device, conn, status), ME_SUCCESS);
         fresh();
+    }
+    // Every setting the discovered meter reports, parsed.
+    std::shared_ptr<pugi::xml_document> readSettings() {
+        XMLWrapper cfg = newDoc(doc_kind::device_settings);
+        bool checked = false;
+        fresh();
+        EXPECT_EQ(wrapper->getDeviceSettings(rec, device, cfg, true, status, checked), ME_SUCCESS);
+        return parsed(cfg);
     }
     // A new status document, and counting of events and closes from now on.
     void fresh() {
