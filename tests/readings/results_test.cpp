@@ -9,28 +9,12 @@ using namespace varnel::detail;
 namespace {
 
 template <class T>
-concept TypeSettable = requires(T t) {
-    t.setResultType(1);
-};
-template <class T>
-concept HasMealSlot = requires(T t) {
-    t.setMealSlot(1);
-};
-template <class T>
-concept HasValue = requires(T t) {
-    t.Value();
-};
-template <class T>
 concept TakesFraction = requires(T t) {
     t.setValue(2.5);
 };
 
-// The surface each class gets from its shape; whole-number values never take a fraction.
-static_assert(!TypeSettable<CheckStrip> && !TypeSettable<Alcohol> && !TypeSettable<OralMeds> && !TypeSettable<Error> &&
-              TypeSettable<Glucose> && TypeSettable<Exercise>);
-static_assert(HasMealSlot<Food> && HasMealSlot<CalCode> && !HasMealSlot<Glucose>);
+// Whole-number values never take a fraction: it would be cut silently.
 static_assert(!TakesFraction<Food> && !TakesFraction<microalbumin> && TakesFraction<BodyDimensions>);
-static_assert(!HasValue<Exercise> && HasValue<HealthNotes>);
 
 }  // namespace
 
