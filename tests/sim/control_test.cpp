@@ -108,47 +108,6 @@ TEST_F(Profiles, ShippedFilesAreTheDefaultMetersAndWrittenOnesReadBackEqual) {
     }
 }
 
-TEST_F(Profiles, BadFilesNameTheFileTheLineAndTheProblemAndLeaveTheMeter) {
-    const std::string head =
-        R"(<meter type="1" serial="ABC1234567" firmware="X1 01/02/03" clock="2005-01-01 00:00:00")";
-    const std::pair<std::string, std::string> cases[] = {
-        {head + R"( colour="red"/>)", ":1: unknown attribute colour"},
-        {head + R"( port="1x"/>)", ":1: port \"1x\" is not a whole number"},
-        {head + R"( port="300"/>)", ":1: port 300 is outside 1..255"},
-        {head + ">\n<ranges glucoseLow='20'/>\n</meter>", ":2: attribute glucoseHigh is missing"},
-        {head + ">\n<datalog>\n<entry dType='1' time='2005-02-30 00:00:00'/></datalog></meter>",
-         ":3: time \"2005-02-30 00:00:00\" is not a time"},
-        {head + "><options><option code='6' availability='2' value='3' min='0' max='9'/></options></meter>",
-         ": language 3 is not in the language map"},
-        {head + "><binaryDatalog/></meter>", ":1: only a type-7 meter keeps <binaryDatalog>"},
-        {head + "><unknown/></meter>", "unknown element <unknown>"},
-        {head + "><ranges", ": "},
-        {R"(<meter type="7" serial="MVX7001184" firmware="MX2210 05/07/03" clock="2008-03-07 14:05:09">)"
-         "\n<binaryDatalog>\n<record type='Glucoze' time='2008-01-01 00:00:00'/></binaryDatalog></meter>",
-         ":3: record type \"Glucoze\" is unknown"},
-        {R"(<meter type="7" serial="MVX7001184" firmware="MX2210 05/07/03" clock="2008-03-07 14:05:09">)"
-         "<binaryDatalog><record type='256' time='2008-01-01 00:00:00'/></binaryDatalog></meter>",
-         ":1: type 256 is outside 0..255"},
-    };
-    TempDir dir;
-    for (const auto& [content, expected] : cases) {
-        SCOPED_TRACE(content);
-        const std::string file = dir.file("meter.xml", content);
-        EXPECT_EQ(vxsim_load_profile(file.c_str()), ME_FAIL);
-        const std::string error = vxsim_last_error();
-        EXPECT_EQ(error.rfind(file, 0), 0u) << error;
-        EXPECT_NE(error.find(expected), std::string::npos) << error;
-        EXPECT_EQ(meter().type, eMorvex);
-    }
-    EXPECT_EQ(vxsim_load_profile("/nonexistent/meter.xml"), ME_FAIL);
-    EXPECT_NE(std::string(vxsim_last_error()).find("/nonexistent/meter.xml"), std::string::npos);
-
-    const std::string good = dir.file("good.xml", head + "><ranges glucoseLow='20' glucoseHigh='600'/></meter>");
-    ASSERT_EQ(vxsim_load_profile(good.c_str()), ME_SUCCESS) << vxsim_last_error();
-    EXPECT_STREQ(vxsim_last_error(), "");
-    EXPECT_EQ(meter().serial, "ABC1234567");
-}
-
 // Files written before record types had words give them as numbers; those read as the words do.
 TEST_F(Profiles, RecordTypesReadByNumberAsByWord) {
     const MeterProfile p = defaultProfile(7);

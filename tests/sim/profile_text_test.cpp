@@ -1,7 +1,7 @@
-// Profile files whose text is not a well-formed XML document in UTF-8 are
-// refused whole, naming the file, the line and the problem; the reader never
-// takes the first of two attributes or cuts a value at "&#0;", and the writer
-// never writes a file the reader would refuse.
+// Profile files that describe no meter, or whose text is not well-formed XML
+// in UTF-8, are refused whole, naming the file, the line and the problem; the
+// reader never takes the first of two attributes or cuts a value at "&#0;", and
+// the writer never writes a file the reader would refuse.
 #include <fstream>
 
 #include "fixture.h"
@@ -15,29 +15,39 @@ using varnel::test::TempDir;
 namespace {
 
 const std::string kHead = R"(<meter type="1" firmware="X1 01/02/03" clock="2005-01-01 00:00:00")";
+const std::string kMeter = kHead + R"( serial="ABC1234567")";
+const std::string kMorvex =
+    R"(<meter type="7" serial="MVX7001184" firmware="MX2210 05/07/03" clock="2008-03-07 14:05:09">)";
 
 }  // namespace
 
 using ProfileText = SimTest;
 
-TEST_F(ProfileText, HostileTextIsRefusedWithTheLineAndTheMeterIsKept) {
+// The text check is the documents' own (tests/contracts): here, that the reader applies it.
+TEST_F(ProfileText, BadFilesNameTheFileTheLineAndTheProblemAndLeaveTheMeter) {
     const std::pair<std::string, std::string> cases[] = {
-        {kHead + R"( serial="ABC1234567" serial="EVIL"/>)", ":1: duplicate attribute serial"},
+        {kMeter + R"( serial="EVIL"/>)", ":1: duplicate attribute serial"},
         {kHead + "\n  serial=\"ABC123&#0;4567\"/>", ":2: character reference to U+0000"},
-        {kHead + R"( serial="AB&#1;C"/>)", ":1: character reference to U+0001"},
-        {kHead + R"( serial="AB&#xFFFE;C"/>)", "U+FFFE"},
-        {kHead + R"( serial="AB&#xD800;C"/>)", "U+D800"},
-        {kHead + " serial=\"AB\x01"
-                 "C\"/>",
-         ":1: character U+0001, which XML does not allow"},
-        {kHead + " serial=\"AB\xE9"
-                 "C\"/>",
-         ":1: invalid UTF-8 (byte 0xE9)"},
+        {kHead + " serial=\"AB\001C\"/>", ":1: character U+0001, which XML does not allow"},
+        {kHead + " serial=\"AB\351C\"/>", ":1: invalid UTF-8 (byte 0xE9)"},
         {kHead + R"( serial="&bogus;"/>)", "undeclared entity bogus"},
-        {kHead + R"( serial="ABC1234567"/><meter/>)", "content after the document element"},
+        {kMeter + "/><meter/>", "content after the document element"},
         {kHead + R"( serial="A<B"/>)", "'<' in an attribute value"},
-        {kHead + R"( serial="ABC1234567"><ranges glucoseLow='20' glucoseHigh='600' glucoseLow='1'/></meter>)",
-         "duplicate attribute glucoseLow"},
+        {kMeter + R"( colour="red"/>)", ":1: unknown attribute colour"},
+        {kMeter + R"( port="1x"/>)", ":1: port \"1x\" is not a whole number"},
+        {kMeter + R"( port="300"/>)", ":1: port 300 is outside 1..255"},
+        {kMeter + ">\n<ranges glucoseLow='20'/>\n</meter>", ":2: attribute glucoseHigh is missing"},
+        {kMeter + ">\n<datalog>\n<entry dType='1' time='2005-02-30 00:00:00'/></datalog></meter>",
+         ":3: time \"2005-02-30 00:00:00\" is not a time"},
+        {kMeter + "><options><option code='6' availability='2' value='3' min='0' max='9'/></options></meter>",
+         ": language 3 is not in the language map"},
+        {kMeter + "><binaryDatalog/></meter>", ":1: only a type-7 meter keeps <binaryDatalog>"},
+        {kMeter + "><unknown/></meter>", "unknown element <unknown>"},
+        {kMeter + "><ranges", ": "},
+        {kMorvex + "\n<binaryDatalog>\n<record type='Glucoze' time='2008-01-01 00:00:00'/></binaryDatalog></meter>",
+         ":3: record type \"Glucoze\" is unknown"},
+        {kMorvex + "<binaryDatalog><record type='256' time='2008-01-01 00:00:00'/></binaryDatalog></meter>",
+         ":1: type 256 is outside 0..255"},
     };
     TempDir dir;
     for (const auto& [content, expected] : cases) {
@@ -49,6 +59,13 @@ TEST_F(ProfileText, HostileTextIsRefusedWithTheLineAndTheMeterIsKept) {
         EXPECT_NE(error.find(expected), std::string::npos) << error;
         EXPECT_EQ(meter().type, eMorvex);
     }
+    EXPECT_EQ(vxsim_load_profile("/nonexistent/meter.xml"), ME_FAIL);
+    EXPECT_NE(std::string(vxsim_last_error()).find("/nonexistent/meter.xml"), std::string::npos);
+
+    const std::string good = dir.file("good.xml", kMeter + "><ranges glucoseLow='20' glucoseHigh='600'/></meter>");
+    ASSERT_EQ(vxsim_load_profile(good.c_str()), ME_SUCCESS) << vxsim_last_error();
+    EXPECT_STREQ(vxsim_last_error(), "");
+    EXPECT_EQ(meter().serial, "ABC1234567");
 }
 
 TEST_F(ProfileText, TheWriterRefusesTextTheReaderWouldRefuse) {
