@@ -113,12 +113,12 @@ TEST(XMLHostileText, WritingRefusesTextsThatAreNotXmlCharacters) {
     x.AddElement("E", "e");
     x.AddChildElement("C", "", "c");
     const std::string before = x.XML();
+    // One of each kind; every kind the check refuses is in the loading table above.
     const std::pair<std::string, std::string> bad[] = {
-        {"\x01", "character U+0001"},      {"ok\x1F", "character U+001F, which XML does not allow at byte 2"},
-        {"caf\xE9", "invalid UTF-8"},      {"\xC0\xAF", "invalid UTF-8"},
-        {"\xED\xA0\x80", "invalid UTF-8"}, {"x\xEF\xBF\xBE", "character U+FFFE"},
-        {"\xE2\x82", "invalid UTF-8"},
-    };
+        {"ok\x1F", "character U+001F, which XML does not allow at byte 2"},
+        {"caf\xE9", "invalid UTF-8"},
+        {"\xED\xA0\x80", "invalid UTF-8"},
+        {"x\xEF\xBF\xBE", "character U+FFFE"}};
     for (const auto& [value, reason] : bad) {
         SCOPED_TRACE(value);
         expectError([&] { x.AddElement("N", value); }, errc::document_failure,
@@ -126,7 +126,6 @@ TEST(XMLHostileText, WritingRefusesTextsThatAreNotXmlCharacters) {
         expectError([&] { x.AddChildElement("N", "", value); }, errc::document_failure, "AddChildElement: the text");
         expectError([&] { x.SetAttribute("a", value); }, errc::document_failure, "SetAttribute: the value for 'a' has");
         expectError([&] { x.SetChildAttribute("a", value); }, errc::document_failure, reason);
-        expectError([&] { x.AddElement("N", value); }, errc::document_failure, reason);
     }
     EXPECT_EQ(x.XML(), before);
     x.SetChildAttribute("still", "C");  // the positions did not move
