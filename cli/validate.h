@@ -3,12 +3,7 @@
 
 #include <CLI/CLI.hpp>
 
-#include <string>
-
 namespace varnel::cli {
-
-// Where the schemas are: $VARNEL_SCHEMAS, else share/varnel/schemas beside the command's bin/.
-std::string schemaDirectory();
 
 void addValidateCommand(CLI::App& app, int& status);
 
