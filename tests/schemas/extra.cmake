@@ -2,7 +2,7 @@
 # documents the end-to-end programs kept: those run first, after the old ones are cleared.
 find_package(LibXml2 REQUIRED)
 target_sources(${target} PRIVATE ${PROJECT_SOURCE_DIR}/cli/document_check.cpp)
-target_include_directories(${target} PRIVATE ${PROJECT_SOURCE_DIR}/cli)
+target_include_directories(${target} PRIVATE ${PROJECT_SOURCE_DIR}/cli ${PROJECT_BINARY_DIR}/include)
 target_link_libraries(${target} PRIVATE LibXml2::LibXml2)
 target_compile_definitions(${target} PRIVATE
   VARNEL_SCHEMA_DIR="${PROJECT_BINARY_DIR}/share/varnel/schemas"
