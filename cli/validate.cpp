@@ -17,8 +17,8 @@ namespace {
 int validate(const std::string& file) {
     std::ifstream in(file, std::ios::binary);
     if (!in) {
-        say("cannot read " + file);
-        return exit_status::local_failure;
+        say(file + ": cannot be read");
+        return exit_status::usage;
     }
     const std::string xml{std::istreambuf_iterator<char>(in), {}};
     const std::string dir = schemaDirectory();
@@ -26,10 +26,10 @@ int validate(const std::string& file) {
     using Verdict = DocumentCheck::Verdict;
     switch (check.verdict) {
     case Verdict::not_xml:
-        say(file + " is not an XML document");
+        say(file + ": not an XML document");
         break;
     case Verdict::no_schema:
-        say("no schema in " + dir + " for the document element of " + file);
+        say(file + ": no schema in " + dir + " for its document element");
         return exit_status::usage;
     case Verdict::schema_unusable:
         say("the schema " + check.schema + " does not load");
@@ -49,7 +49,7 @@ int validate(const std::string& file) {
 void addValidateCommand(CLI::App& app, int& status) {
     auto* cmd = app.add_subcommand("validate", "Check a document against the schema its document element names");
     auto file = std::make_shared<std::string>();
-    cmd->add_option("FILE", *file, "The XML document")->required();
+    cmd->add_option("FILE", *file, "The XML document")->required()->check(CLI::ExistingFile);
     cmd->footer("Prints the schema used, then \"valid\" or each problem with its line.\n"
                 "Schemas are looked for in $VARNEL_SCHEMAS, else in share/varnel/schemas beside bin/.");
     cmd->callback([file, &status] { status = validate(*file); });
