@@ -9,6 +9,7 @@
 #include "session.h"
 #include "set_commands.h"
 #include "settings_commands.h"
+#include "validate.h"
 #include "varnel/version.h"
 
 namespace {
@@ -33,6 +34,7 @@ int main(int argc, char** argv) {
     addCapsCommand(app, status);
     addSetCommand(app, status);
     addSettingsCommands(app, status, syncMeterClock);
+    addValidateCommand(app, status);
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError& e) {

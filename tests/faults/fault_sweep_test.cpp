@@ -438,6 +438,8 @@ protected:
             o.output = withoutClockValue(printed(out));
             if (request().name == std::string("closeMeter")) o.output = sim::portOpen() ? "port open" : "port released";
             o.status = printed(status);
+            const bool answered = o.raised.empty() && (o.result == ME_SUCCESS || o.result == ME_PARTIALSUCCESS);
+            keepDocuments({&status, answered ? &out : nullptr});
             o.recovery = recover(wrapper);
         }
         return o;

@@ -28,7 +28,7 @@ readings() {
 case $part in
 layout)
     for f in lib/libvarnel.so.0 lib/libvarnel.so lib/varnel/libvantrix32.so.0 include/varnel/dll_wrapper.h \
-             include/varnel/vxsim.h include/varnel/version.h share/varnel/profiles/type7.xml bin/varnel \
+             include/varnel/vxsim.h include/varnel/version.h share/varnel/profiles/type7.xml share/varnel/schemas/Datalog.xsd bin/varnel \
              lib/cmake/varnel/varnelConfig.cmake lib/cmake/varnel/varnelConfigVersion.cmake \
              lib/pkgconfig/varnel.pc; do
         [ -e "$prefix/$f" ] || fail "missing $f"
@@ -40,6 +40,8 @@ layout)
     # The command finds libvarnel and the transport from the prefix alone.
     "$prefix/bin/varnel" discover --quiet >"$work/discover.xml" || fail "varnel discover failed from the prefix"
     grep -q '<TypeID>7</TypeID>' "$work/discover.xml" || fail "varnel discover described no meter"
+    # The command finds the installed schemas beside it, and its own document keeps to them.
+    "$prefix/bin/varnel" validate "$work/discover.xml" | grep -qx valid || fail "varnel validate did not pass discover's document"
     sh "$source/tests/exports/check_exports.sh" "$prefix/lib/libvarnel.so.0"
     ;;
 cpp)

@@ -14,6 +14,7 @@
 #include "errors/err_propagator.h"
 #include "platform/message_pump.h"
 #include "simulator.h"
+#include "support/kept_documents.h"
 #include "support/sim_transport.h"
 #include "util/helpers.h"
 #include "varnel/clock.h"
@@ -123,7 +124,7 @@ std::string unexpectedTrace(F&& request) {
 
 struct WrapperTest : ::testing::Test {
     std::shared_ptr<ManualClock> clock = std::make_shared<ManualClock>(1000);
-    std::unique_ptr<DllWrapper> wrapper;
+    std::unique_ptr<RecordingWrapper> wrapper;
     METER_REC rec{};
     XMLWrapper status = newDoc(doc_kind::status);
     XMLWrapper device;
@@ -135,7 +136,7 @@ struct WrapperTest : ::testing::Test {
         setThreadClock(clock);
         sim::reset();
         detail::SetContinueFlag(true);
-        wrapper.reset(new DllWrapper(detail::wrapperOver(simTransport())));
+        wrapper = std::make_unique<RecordingWrapper>(simTransport());
         wrapper->setOnProgress([this](std::int16_t& p) { progress.push_back(p); });
         wrapper->setOnComplete([this] { ++completions; });
     }
