@@ -6,6 +6,7 @@
 
 #include "caps_command.h"
 #include "commands.h"
+#include "report_command.h"
 #include "session.h"
 #include "set_commands.h"
 #include "settings_commands.h"
@@ -33,6 +34,7 @@ int main(int argc, char** argv) {
     addCapsCommand(app, status);
     addSetCommand(app, status);
     addSettingsCommands(app, status, syncMeterClock);
+    addReportCommands(app, status);
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError& e) {
