@@ -210,8 +210,13 @@ Plot startPlot(Html parent, const std::string& id, const std::string& title, dou
     Html xAxis = svg.add("g");
     xAxis.set("class", "axis x").set("data-min", xMinText).set("data-max", xMaxText);
     xAxis.add("line").set("x1", kLeft).set("x2", kWidth - kRight).set("y1", p.y(0)).set("y2", p.y(0));
-    xAxis.add("text", xMinText).set("x", kLeft).set("y", kHeight - 12);
-    xAxis.add("text", xMaxText).set("x", kWidth - kRight).set("y", kHeight - 12).set("text-anchor", "end");
+    // Labels read as a person writes a date-time; the data attributes keep ISO 8601.
+    auto label = [](std::string text) {
+        std::replace(text.begin(), text.end(), 'T', ' ');
+        return text;
+    };
+    xAxis.add("text", label(xMinText)).set("x", kLeft).set("y", kHeight - 12);
+    xAxis.add("text", label(xMaxText)).set("x", kWidth - kRight).set("y", kHeight - 12).set("text-anchor", "end");
     Html yAxis = svg.add("g");
     yAxis.set("class", "axis y").set("data-min", "0").set("data-max", fixed(yMax, unit == GlucoseUnit::mmol ? 1 : 0));
     yAxis.add("line").set("x1", kLeft).set("x2", kLeft).set("y1", p.y(0)).set("y2", p.y(yMax));
@@ -273,7 +278,7 @@ void bandChart(Html parent, const GlucoseSummary& s, GlucoseUnit unit) {
     parent.add("h2", "Time in ranges");
     Html svg = parent.add("svg");
     svg.set("xmlns", "http://www.w3.org/2000/svg").set("id", "bands").set("class", "chart").set("role", "img");
-    svg.set("viewBox", "0 0 " + fixed(kWidth, 0) + " 80");
+    svg.set("viewBox", "0 0 " + fixed(kWidth, 0) + " 96");
     svg.add("title", "Share of readings in each band");
     double x = kLeft;
     const double width = kWidth - kLeft - kRight;
@@ -290,7 +295,7 @@ void bandChart(Html parent, const GlucoseSummary& s, GlucoseUnit unit) {
             .set("fill", kBands[b].colour);
         svg.add("text", bandLabel(kBands[b], unit) + ": " + fixed(s.bandShares[b]) + " %")
             .set("x", kLeft + b * width / kBandCount)
-            .set("y", "62");
+            .set("y", b % 2 ? "76" : "60");  // staggered so long labels never overlap
         x += w;
     }
 }
