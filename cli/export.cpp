@@ -191,9 +191,7 @@ Datalog readDatalog(const std::string& datalogXml) {
     return log;
 }
 
-bool isGlucoseKind(const std::string& kind) {
-    return kind == "glucose" || kind == "control" || kind == "check_strip";
-}
+bool isGlucoseKind(const std::string& kind) { return kind == "glucose" || kind == "control" || kind == "check_strip"; }
 
 std::optional<double> numberIn(const std::string& text) {
     if (text.empty()) return std::nullopt;

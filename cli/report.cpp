@@ -23,8 +23,8 @@ struct Band {
 };
 
 constexpr Band kBands[kBandCount] = {
-    {"very-low", "below 54", "#b2182b", 54},     {"low", "54-69", "#ef8a62", 70},
-    {"target", "70-180", "#1a9850", 180.5},      {"high", "181-250", "#fdae61", 250.5},
+    {"very-low", "below 54", "#b2182b", 54},      {"low", "54-69", "#ef8a62", 70},
+    {"target", "70-180", "#1a9850", 180.5},       {"high", "181-250", "#fdae61", 250.5},
     {"very-high", "above 250", "#d73027", 1e300},
 };
 
@@ -37,6 +37,7 @@ struct Point {
     double mgdl;
     std::string time;
     std::string range;
+    std::string slot;
 };
 
 // Seconds since 1970 of an ISO 8601 local date-time, on the meter's own calendar (no zone).
@@ -54,7 +55,8 @@ std::vector<Point> glucosePoints(const std::vector<Reading>& readings) {
         const ReadingValue& v = r.values.front();
         const auto value = numberIn(v.value);
         if (!value) continue;
-        points.push_back({v.unit == "mmol/L" ? *value * kMgdlPerMmol : *value, r.time, v.range});
+        points.push_back(
+            {v.unit == "mmol/L" ? *value * kMgdlPerMmol : *value, r.time, v.range, r.slot.empty() ? kNoSlot : r.slot});
     }
     return points;
 }
@@ -78,7 +80,7 @@ std::string bandLabel(const Band& b, GlucoseUnit unit) {
     return mmol[&b - kBands] + std::string(" mmol/L");
 }
 
-const char* hiLoNote = "HI and LO readings count at the meter's limit, the value the meter stores for them.";
+constexpr const char* kHiLoNote = "HI and LO readings count at the meter's limit, the value the meter stores for them.";
 
 }  // namespace
 
@@ -110,18 +112,17 @@ GlucoseSummary summarize(const std::vector<Reading>& readings) {
     s.first = first->time;
     s.last = last->time;
     s.days = static_cast<int>(secondsOf(s.last.substr(0, 10) + "T00:00:00") / 86400 -
-                              secondsOf(s.first.substr(0, 10) + "T00:00:00") / 86400) + 1;
+                              secondsOf(s.first.substr(0, 10) + "T00:00:00") / 86400) +
+             1;
     s.perDay = static_cast<double>(s.count) / s.days;
 
-    auto slotOf = [&](const Reading& r) { return r.slot.empty() ? std::string(kNoSlot) : r.slot; };
     std::vector<std::string> order(std::begin(kSlotOrder), std::end(kSlotOrder));
     order.push_back(kNoSlot);
     for (const std::string& slot : order) {
         SlotMean m{slot};
-        for (const Reading& r : readings) {
-            const std::vector<Point> one = glucosePoints({r});
-            if (one.empty() || slotOf(r) != slot) continue;
-            m.meanMgdl += one.front().mgdl;
+        for (const Point& p : points) {
+            if (p.slot != slot) continue;
+            m.meanMgdl += p.mgdl;
             ++m.count;
         }
         if (m.count == 0) continue;
@@ -136,8 +137,9 @@ std::vector<SummaryRow> summaryRows(const GlucoseSummary& s, GlucoseUnit unit) {
     if (s.high + s.low > 0)
         readings += " (" + std::to_string(s.high) + " HI, " + std::to_string(s.low) + " LO at the meter's limit)";
     std::vector<SummaryRow> rows = {
-        {"period", "Period", s.first.substr(0, 10) + " to " + s.last.substr(0, 10) + " (" + std::to_string(s.days) +
-                                 (s.days == 1 ? " day)" : " days)")},
+        {"period", "Period",
+         s.first.substr(0, 10) + " to " + s.last.substr(0, 10) + " (" + std::to_string(s.days) +
+             (s.days == 1 ? " day)" : " days)")},
         {"readings", "Glucose readings", readings},
         {"mean", "Mean", glucoseText(s.meanMgdl, unit)},
         {"sd", "Standard deviation", glucoseText(s.sdMgdl, unit)},
@@ -160,7 +162,7 @@ std::string summaryText(const Datalog& log, GlucoseUnit unit) {
         label.resize(std::max<std::size_t>(label.size() + 2, 32), ' ');
         text += label + row.value + "\n";
     }
-    if (s.high + s.low > 0) text += std::string(hiLoNote) + "\n";
+    if (s.high + s.low > 0) text += std::string(kHiLoNote) + "\n";
     return text;
 }
 
@@ -254,8 +256,8 @@ void overTimeChart(Html parent, const std::vector<Point>& points, const GlucoseS
     double from = static_cast<double>(secondsOf(s.first)), to = static_cast<double>(secondsOf(s.last));
     if (to <= from) from -= 43200, to += 43200;  // a single moment still gets a day's width
     parent.add("h2", "Glucose over time");
-    const Plot p = startPlot(parent, "glucose-over-time", "Glucose over time", from, to, axisTop(points, unit),
-                             s.first, s.last, unit);
+    const Plot p = startPlot(parent, "glucose-over-time", "Glucose over time", from, to, axisTop(points, unit), s.first,
+                             s.last, unit);
     for (const Point& point : points) plotPoint(p, static_cast<double>(secondsOf(point.time)), point, unit);
 }
 
@@ -367,7 +369,7 @@ std::string reportHtml(const Datalog& log, GlucoseUnit unit) {
             tr.add("th", row.label);
             tr.add("td", row.value);
         }
-        if (s.high + s.low > 0) body.add("p", hiLoNote).set("class", "note");
+        if (s.high + s.low > 0) body.add("p", kHiLoNote).set("class", "note");
         overTimeChart(body.add("section"), points, s, unit);
         dayChart(body.add("section"), points, unit);
         bandChart(body.add("section"), s, unit);

@@ -20,14 +20,14 @@ struct SlotMean {
 
 // The figures of the summary, worked out from the glucose readings only (not control solution or check strip).
 struct GlucoseSummary {
-    int count = 0;       // glucose readings with a value
-    int high = 0;        // of them, shown HI (counted at the meter's upper limit)
-    int low = 0;         // shown LO (counted at the lower limit)
-    std::string first;   // date-times of the first and last reading
+    int count = 0;      // glucose readings with a value
+    int high = 0;       // of them, shown HI (counted at the meter's upper limit)
+    int low = 0;        // shown LO (counted at the lower limit)
+    std::string first;  // date-times of the first and last reading
     std::string last;
-    int days = 0;        // calendar days from the first reading's to the last one's, both counted
+    int days = 0;  // calendar days from the first reading's to the last one's, both counted
     double meanMgdl = 0;
-    double sdMgdl = 0;   // sample standard deviation (n - 1); 0 for one reading
+    double sdMgdl = 0;  // sample standard deviation (n - 1); 0 for one reading
     double cvPercent = 0;
     double gmiPercent = 0;  // 3.31 + 0.02392 x mean mg/dL
     double perDay = 0;

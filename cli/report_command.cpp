@@ -38,8 +38,7 @@ void addReportCommands(CLI::App& app, int& status) {
     addSummaryCommand(app, status, "report",
                       "Upload the readings and write a printable HTML report with the glucose summary and charts",
                       reportHtml);
-    addSummaryCommand(app, status, "summary", "Upload the readings and print the glucose summary as text",
-                      summaryText);
+    addSummaryCommand(app, status, "summary", "Upload the readings and print the glucose summary as text", summaryText);
 }
 
 }  // namespace varnel::cli

@@ -55,8 +55,8 @@ std::string valueText(const json& v) {
 std::string describe(const json& r) {
     std::string text = r["kind"].get<std::string>() + ":";
     for (const json& v : r["values"])
-        text += " " + v["quantity"].get<std::string>() + "=" + valueText(v["value"]) + " " + v.value("unit", "") +
-                " " + v.value("range", "") + ";";
+        text += " " + v["quantity"].get<std::string>() + "=" + valueText(v["value"]) + " " + v.value("unit", "") + " " +
+                v.value("range", "") + ";";
     return text;
 }
 std::string describe(const std::vector<std::vector<std::string>>& lines) {
@@ -86,8 +86,7 @@ TEST_F(VarnelCommand, CsvAndJsonHoldEveryEntryOfTheDatalogValueForValue) {
         {"2008-02-17T09:05:09", "ketones: ketones=Trace  ;"},
         {"2008-02-17T10:16:09", "microalbumin: microalbumin=>1000  ;"},
         {"2008-02-17T10:18:09", "microalbumin: microalbumin=28  ;"},
-        {"2008-02-17T11:05:09",
-         "cholesterol: LDL=520 mg/dL HI; HDL=52 mg/dL ; Total=196 mg/dL ; Trig=141 mg/dL ;"},
+        {"2008-02-17T11:05:09", "cholesterol: LDL=520 mg/dL HI; HDL=52 mg/dL ; Total=196 mg/dL ; Trig=141 mg/dL ;"},
         {"2008-02-17T12:35:09", "blood_pressure: systolic=134  ; diastolic=78  ;"},
         {"2008-02-17T13:07:09", "weight_height: Wt=182.4  ; Ht=69.5  ;"},
         {"2008-02-18T16:05:09", "calibration_change: from=4  ; to=11  ;"},
@@ -148,10 +147,12 @@ TEST_F(VarnelCommand, CsvAndJsonHoldEveryEntryOfTheDatalogValueForValue) {
         }
     }
     EXPECT_EQ(checked, expected.size());
-    EXPECT_EQ(kinds, (std::set<std::string>{"glucose", "control", "check_strip", "error", "insulin", "pump_bolus",
-                                            "pump_daily_total", "oral_medication", "food", "alcohol", "exercise",
-                                            "health_notes", "visit", "ketones", "hba1c", "microalbumin",
-                                            "cholesterol", "blood_pressure", "weight_height", "calibration_change"}));
+    EXPECT_EQ(kinds,
+              (std::set<std::string>{
+                  "glucose",      "control",          "check_strip",     "error",         "insulin",
+                  "pump_bolus",   "pump_daily_total", "oral_medication", "food",          "alcohol",
+                  "exercise",     "health_notes",     "visit",           "ketones",       "hba1c",
+                  "microalbumin", "cholesterol",      "blood_pressure",  "weight_height", "calibration_change"}));
 }
 
 TEST_F(VarnelCommand, CsvInMmolConvertsGlucoseOnlyAndSaysSoInTheHeader) {

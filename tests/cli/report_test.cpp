@@ -87,6 +87,11 @@ TEST_F(VarnelCommand, ReportAndSummaryShowTheFiguresOfTheGlucoseReadings) {
     EXPECT_EQ(std::string(x.attribute("data-min").value()) + " " + x.attribute("data-max").value(), first + " " + last);
     EXPECT_GE(overTime.find_child_by_attribute("g", "class", "axis y").attribute("data-max").as_double(), 600);
     EXPECT_EQ(page.select_nodes("//svg[@id='bands']/rect[@class='band']").size(), 5u);
+    std::string slots;
+    for (const pugi::xpath_node& r : page.select_nodes("//svg[@id='slots']/rect[@class='slot-mean']"))
+        slots += std::string(r.node().attribute("data-slot").value()) + "=" + r.node().attribute("data-mean").value() +
+                 "/" + r.node().attribute("data-count").value() + " ";
+    EXPECT_EQ(slots, "After Breakfast=108.0/1 No slot=" + fixed((159 + 600 + 20 + 70) / 4.0) + "/4 ");
 }
 
 TEST_F(VarnelCommand, ReportWithoutGlucoseReadingsSaysSo) {
