@@ -3,8 +3,8 @@
 #include <cstdio>
 #include <memory>
 
-#include "csv.h"
 #include "documents.h"
+#include "export.h"
 #include "output.h"
 #include "session.h"
 #include "varnel/records.h"
@@ -54,18 +54,21 @@ struct CommandLine {
     MeterOptions meter;
     std::string output;
     bool csv = false;
+    bool json = false;
+    std::string unit = "mgdl";
     bool clearAfter = false;
     bool yes = false;
 };
 
 void readings(MeterSession& s, const CommandLine& cl) {
-    XMLWrapper datalog = emptyDocument(doc_kind::datalog);
-    XMLWrapper filter = emptyDocument(doc_kind::filter);
-    bool checked = false;
-    s.request("readings", [&](XMLWrapper& status) {
-        return s.wrapper().getReadings(s.record(), s.deviceInfo(), datalog, filter, status, checked);
-    });
-    emit(cl.output, cl.csv ? datalogToCsv(datalog.XML()) : xmlText(datalog));
+    XMLWrapper datalog = uploadDatalog(s);
+    const GlucoseUnit unit = glucoseUnit(cl.unit);
+    if (cl.csv)
+        emit(cl.output, readingsCsv(readDatalog(datalog.XML()), unit));
+    else if (cl.json)
+        emit(cl.output, readingsJson(readDatalog(datalog.XML()), unit));
+    else
+        emit(cl.output, xmlText(datalog));
     // Only readings that are safely on disk may be erased from the meter.
     if (!cl.clearAfter) return;
     s.clearMeter();
@@ -76,10 +79,30 @@ void readings(MeterSession& s, const CommandLine& cl) {
 
 }  // namespace
 
+XMLWrapper uploadDatalog(MeterSession& s) {
+    XMLWrapper datalog = emptyDocument(doc_kind::datalog);
+    XMLWrapper filter = emptyDocument(doc_kind::filter);
+    bool checked = false;
+    s.request("readings", [&](XMLWrapper& status) {
+        return s.wrapper().getReadings(s.record(), s.deviceInfo(), datalog, filter, status, checked);
+    });
+    return datalog;
+}
+
+CLI::Option* addUnitOption(CLI::App* cmd, std::string& unit) {
+    return cmd->add_option("--unit", unit, "Glucose in mg/dL as the meter stores it, or converted to mmol/L")
+        ->check(CLI::IsMember({"mgdl", "mmol"}))
+        ->capture_default_str();
+}
+
+GlucoseUnit glucoseUnit(const std::string& option) { return option == "mmol" ? GlucoseUnit::mmol : GlucoseUnit::meter; }
+
 std::string examplesHelp() {
     return "Examples:\n"
            "  varnel discover --sim-type 4            describe the simulated type-4 meter\n"
            "  varnel readings --csv -o readings.csv   the readings, one CSV line each\n"
+           "  varnel readings --json --unit mmol      the readings as JSON, glucose in mmol/L\n"
+           "  varnel report -o report.html            a printable glucose report with charts\n"
            "  varnel caps --item Clock --record Gluc  the clock range and glucose limits\n"
            "  varnel settings --sim-type 3            the settings document of the simulated type-3 meter\n"
            "  varnel clock                            the meter clock beside the computer clock\n"
@@ -128,13 +151,20 @@ void addMeterCommands(CLI::App& app, int& status) {
     auto* read = app.add_subcommand("readings", "Upload the meter's readings and print the datalog");
     addMeterOptions(read, cl->meter);
     auto* output = addOutputOption(read, cl->output);
-    read->add_flag("--csv", cl->csv, "Write one CSV line per entry instead of the XML datalog");
+    auto* csv = read->add_flag("--csv", cl->csv, "Write CSV, one line per value of every entry, instead of the XML datalog");
+    read->add_flag("--json", cl->json, "Write the readings as a JSON document instead of the XML datalog")->excludes(csv);
+    addUnitOption(read, cl->unit);
     read->add_flag("--clear-after", cl->clearAfter,
                    "Erase the meter once the readings are safely written to the -o file")
         ->needs(output);
     read->callback([cl, &status] {
         if (cl->clearAfter && (isStandardOutput(cl->output) || !isReplaceableFile(cl->output))) {
             say("--clear-after needs -o naming a regular file, so the readings are on disk before the meter is erased");
+            status = exit_status::usage;
+            return;
+        }
+        if (cl->unit == "mmol" && !cl->csv && !cl->json) {
+            say("--unit mmol converts the --csv and --json exports; the XML datalog keeps the meter's unit");
             status = exit_status::usage;
             return;
         }

@@ -6,6 +6,7 @@
 
 #include <string>
 
+#include "export.h"
 #include "session.h"
 #include "varnel/xml_wrapper.h"
 
@@ -18,6 +19,12 @@ CLI::Option* addOutputOption(CLI::App* cmd, std::string& output);
 void emit(const std::string& path, const std::string& text);
 // A document as the text of an XML file.
 std::string xmlText(const XMLWrapper& doc);
+
+// The meter's readings as a datalog document; a failed upload ends the run.
+XMLWrapper uploadDatalog(MeterSession& s);
+// --unit: glucose in mg/dL ("mgdl") or mmol/L ("mmol").
+CLI::Option* addUnitOption(CLI::App* cmd, std::string& unit);
+GlucoseUnit glucoseUnit(const std::string& option);
 
 // What `varnel --help` shows as examples.
 std::string examplesHelp();

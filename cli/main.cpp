@@ -6,6 +6,7 @@
 
 #include "caps_command.h"
 #include "commands.h"
+#include "report_command.h"
 #include "session.h"
 #include "set_commands.h"
 #include "settings_commands.h"
@@ -35,6 +36,7 @@ int main(int argc, char** argv) {
     addSetCommand(app, status);
     addSettingsCommands(app, status, syncMeterClock);
     addValidateCommand(app, status);
+    addReportCommands(app, status);
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError& e) {
