@@ -56,10 +56,9 @@ FirmwareText splitFirmware(const std::string& firmware) {
     if (!year.empty()) {
         const double y = ToNumber(year);
         // Two-digit years: the oldest firmware dates from the 1990s, so 90-99 are those and the rest 2000s.
-        if (y >= 90 && y <= 99)
-            out.year = "19" + year;
-        else if (y >= 0 && y < 90)
-            out.year = "20" + year;
+        // The century is added to the number, not the text, so "3" is 2003 and a fraction is no year.
+        if (y >= 0 && y <= 99 && y == std::floor(y))
+            out.year = std::to_string((y >= 90 ? 1900 : 2000) + static_cast<int>(y));
     }
     if (!month.empty()) out.month = TwoDigits(std::llround(ToNumber(month)));
     return out;

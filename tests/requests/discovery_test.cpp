@@ -53,7 +53,9 @@ TEST(Firmware, VersionAndTwoDigitYears) {
     for (auto [text, parts] : {std::pair{"V1 1/2/99", "V1 2 01 1999"},
                                {"2.3 12/31/00", "2.3 31 12 2000"},
                                {"V1 12/31/89", "V1 31 12 2089"},
-                               {"V1 12/31/2003", "V1 31 12 "}}) {
+                               {"V1 12/31/2003", "V1 31 12 "},
+                               {"V1 1/2/3", "V1 2 01 2003"},
+                               {"V1 1/2/5.5", "V1 2 01 "}}) {
         const detail::FirmwareText f = detail::splitFirmware(text);
         EXPECT_EQ(f.version + " " + f.day + " " + f.month + " " + f.year, parts);
     }
