@@ -105,8 +105,9 @@ void MeterSession::request(const std::string& label, const std::function<std::in
     }
     noteRelease();
     if (code == 0) {
-        progress_.complete();
-        return stopIfInterrupted();
+        // An interrupted request's bar stops where it was, not at 100%.
+        stopIfInterrupted();
+        return progress_.complete();
     }
     progress_.finish();
     const auto texts = statusDescriptions(status);
