@@ -87,16 +87,16 @@ void readings(MeterSession& s, const CommandLine& cl) {
 
 std::string examplesHelp() {
     return "Examples:\n"
-           "  varnel info                             the meter in plain words, and whether its clock is right\n"
-           "  varnel discover --sim-type 4            describe the simulated type-4 meter\n"
-           "  varnel readings --csv -o readings.csv   the readings, one CSV line each\n"
-           "  varnel caps --item Clock --record Gluc  the clock range and glucose limits\n"
-           "  varnel settings --sim-type 3            the settings document of the simulated type-3 meter\n"
-           "  varnel clock                            the meter clock beside the computer clock\n"
-           "  varnel set cfg.xml                      write an edited settings document back to the meter\n"
-           "  varnel clock --sync --sim-type 5        set the meter clock to the computer clock\n"
-           "  varnel clock --set \"2024-05-01 08:30:00\" set the meter clock to that time\n"
-           "  varnel settings --writable -o cfg.xml && varnel set cfg.xml   the settings round trip\n\n";
+           "  varnel info                               the meter in plain words, and whether its clock is right\n"
+           "  varnel discover --sim-type 4              describe the simulated type-4 meter\n"
+           "  varnel readings --csv -o readings.csv     the readings, one CSV line each\n"
+           "  varnel caps --item Clock --record Gluc    the clock range and glucose limits\n"
+           "  varnel settings --sim-type 3              the settings document of the simulated type-3 meter\n"
+           "  varnel settings --writable -o cfg.xml     only the settings 'varnel set' can write back\n"
+           "  varnel set cfg.xml                        write an edited settings document back to the meter\n"
+           "  varnel clock                              the meter clock beside the computer clock\n"
+           "  varnel clock --sync --sim-type 5          set the meter clock to the computer clock\n"
+           "  varnel clock --set \"2024-05-01 08:30:00\"  set the meter clock to that local time\n\n";
 }
 
 std::string exitStatusHelp() {
