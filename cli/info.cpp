@@ -83,7 +83,8 @@ void describe(MeterSession& s) {
 void addInfoCommand(CLI::App& app, int& status) {
     auto options = std::make_shared<MeterOptions>();
     auto* info = app.add_subcommand(
-        "info", "Describe the meter in plain words: model, serial, firmware, records, units and its clock");
+        "info", "Describe the meter in plain words: model, serial, firmware, records (counted by an upload), "
+        "units and its clock");
     addMeterOptions(info, *options);
     info->callback([options, &status] { status = MeterSession(*options).run(describe); });
 }

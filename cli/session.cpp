@@ -86,6 +86,8 @@ int MeterSession::run(const std::function<void(MeterSession&)>& work) {
         status = exit_status::local_failure;
     }
     status = release(status);
+    // A signal during the release stopped nothing: the command's work was done and stands.
+    if (interruption() != 0 && !stopNoted_) say("interrupted while the meter was released; the command had finished");
     return saveSimulatedMeter(status);
 }
 
@@ -155,9 +157,12 @@ void MeterSession::attachSimulatedMeter() {
 void MeterSession::discover() {
     XMLWrapper connection = connectionDocument(options_.port);
     deviceInfo_ = emptyDocument(doc_kind::device_info);
-    request("discover",
-            [&](XMLWrapper& status) { return wrapper_->discoverDevice(record_, deviceInfo_, connection, status); });
-    found_ = true;
+    request("discover", [&](XMLWrapper& status) {
+        const std::int32_t code = wrapper_->discoverDevice(record_, deviceInfo_, connection, status);
+        // Held from here on, even when a signal ends the run before the next request.
+        found_ = code == 0;
+        return code;
+    });
 }
 
 int MeterSession::release(int status) {
