@@ -94,7 +94,9 @@ int MeterSession::run(const std::function<void(MeterSession&)>& work) {
 void MeterSession::request(const std::string& label, const std::function<std::int32_t(XMLWrapper& status)>& call) {
     XMLWrapper status = emptyDocument(doc_kind::status);
     progress_.start(label);
+    // Every request attaches the meter again, even one an earlier failure released.
     if (found_) record_.Error_code = kKeepMeterOpen;
+    released_ = false;
     std::int32_t code = 0;
     try {
         code = call(status);
