@@ -7,6 +7,7 @@
 #include "export.h"
 #include "output.h"
 #include "session.h"
+#include "settings_commands.h"
 #include "varnel/records.h"
 #include "varnel/return_codes.h"
 
@@ -29,6 +30,13 @@ void addMeterOptions(CLI::App* cmd, MeterOptions& o) {
 }
 
 CLI::Option* addOutputOption(CLI::App* cmd, std::string& output) {
+    // Checked once the command line is read, before the meter is touched.
+    cmd->parse_complete_callback([&output] {
+        const std::string why = unwritableReason(output);
+        if (why.empty()) return;
+        say("cannot write " + output + ": " + why);
+        throw RunEnd{exit_status::cannot_create};
+    });
     return cmd->add_option("-o,--output", output, "Write to FILE instead of standard output")->type_name("FILE");
 }
 
@@ -61,6 +69,7 @@ struct CommandLine {
 };
 
 void readings(MeterSession& s, const CommandLine& cl) {
+    warnAboutMeterClock(s);
     XMLWrapper datalog = uploadDatalog(s);
     const GlucoseUnit unit = glucoseUnit(cl.unit);
     if (cl.csv)
@@ -99,15 +108,19 @@ GlucoseUnit glucoseUnit(const std::string& option) { return option == "mmol" ? G
 
 std::string examplesHelp() {
     return "Examples:\n"
-           "  varnel discover --sim-type 4            describe the simulated type-4 meter\n"
-           "  varnel readings --csv -o readings.csv   the readings, one CSV line each\n"
-           "  varnel readings --json --unit mmol      the readings as JSON, glucose in mmol/L\n"
-           "  varnel report -o report.html            a printable glucose report with charts\n"
-           "  varnel caps --item Clock --record Gluc  the clock range and glucose limits\n"
-           "  varnel settings --sim-type 3            the settings document of the simulated type-3 meter\n"
-           "  varnel clock                            the meter clock beside the computer clock\n"
-           "  varnel set cfg.xml                      write an edited settings document back to the meter\n"
-           "  varnel clock --sync --sim-type 5        set the meter clock to the computer clock\n\n";
+           "  varnel info                               the meter in plain words, and whether its clock is right\n"
+           "  varnel discover --sim-type 4              describe the simulated type-4 meter\n"
+           "  varnel readings --csv -o readings.csv     the readings, one CSV line each\n"
+           "  varnel readings --json --unit mmol        the readings as JSON, glucose in mmol/L\n"
+           "  varnel report -o report.html              a printable glucose report with charts\n"
+           "  varnel validate cfg.xml                   check a document against its schema\n"
+           "  varnel caps --item Clock --record Gluc    the clock range and glucose limits\n"
+           "  varnel settings --sim-type 3              the settings document of the simulated type-3 meter\n"
+           "  varnel settings --writable -o cfg.xml     only the settings 'varnel set' can write back\n"
+           "  varnel set cfg.xml                        write an edited settings document back to the meter\n"
+           "  varnel clock                              the meter clock beside the computer clock\n"
+           "  varnel clock --sync --sim-type 5          set the meter clock to the computer clock\n"
+           "  varnel clock --set \"2024-05-01 08:30:00\"  set the meter clock to that local time\n\n";
 }
 
 std::string exitStatusHelp() {
@@ -116,13 +129,17 @@ std::string exitStatusHelp() {
            "  1-62    a request failed: its return code made positive (-13 exits with 13);\n"
            "          'varnel codes' lists the codes, and each status description is printed\n"
            "          on standard error as one line 'varnel: <text>'\n"
-           "  2       also a wrong command line, 'clear' without --yes, or 'set' with a FILE\n"
-           "          that is not an XML document\n"
            "  63      a request failed with a code outside -1..-62\n"
-           "  64      varnel itself failed: the simulated meter could not be set up, or the\n"
-           "          output could not be written (the meter is then not erased)\n"
+           "  64      a wrong command line, or 'clear' without --yes\n"
+           "  65      'set' was given a FILE that is not an XML document, or 'validate' a\n"
+           "          FILE that cannot be read, has no schema or does not keep to it\n"
            "  70      the component failed unexpectedly (ComponentError: its number and\n"
-           "          routine trace are printed)\n";
+           "          routine trace are printed)\n"
+           "  73      the -o file cannot be written (found before the meter is touched)\n"
+           "  74      varnel itself failed: the simulated meter could not be set up, or the\n"
+           "          output could not be written (the meter is then not erased)\n"
+           "  130     stopped by Ctrl-C (SIGINT), 143 by SIGTERM: the running step ends, the\n"
+           "          meter is released and no partial output file is left\n";
 }
 
 void addCodesCommand(CLI::App& app, int& status) {

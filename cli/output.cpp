@@ -105,6 +105,18 @@ bool isReplaceableFile(const std::string& path) {
     return S_ISREG(st.st_mode);
 }
 
+std::string unwritableReason(const std::string& path) {
+    if (isStandardOutput(path)) return {};
+    struct stat st {};
+    const bool exists = ::stat(path.c_str(), &st) == 0;
+    if (exists && S_ISDIR(st.st_mode)) return "it is a directory";
+    if (exists && !S_ISREG(st.st_mode)) return ::access(path.c_str(), W_OK) == 0 ? "" : std::strerror(errno);
+    if (exists && ::access(path.c_str(), W_OK) != 0) return std::strerror(errno);
+    const std::string dir = directoryOf(path);
+    if (::access(dir.c_str(), W_OK | X_OK) != 0) return "directory " + dir + ": " + std::strerror(errno);
+    return {};
+}
+
 void writeOutput(const std::string& path, const std::string& text) {
     if (isStandardOutput(path)) return writeStandardOutput(text);
     if (!isReplaceableFile(path)) return writeDirectly(path, text);

@@ -18,6 +18,10 @@ bool isStandardOutput(const std::string& path);
 // True when `path` can be replaced atomically: it does not exist yet or is a regular file.
 bool isReplaceableFile(const std::string& path);
 
+// Why `path` could not be written as writeOutput writes it (its directory must take the
+// temporary file too); "" when it can. Touches nothing.
+std::string unwritableReason(const std::string& path);
+
 // Writes `text` to standard output (path "" or "-") or to `path`. A regular
 // file is written to a temporary file in the same directory, flushed to disk
 // and renamed over `path`, so a failure leaves the old file as it was; any

@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "documents.h"
+#include "interrupt.h"
 #include "output.h"
 #include "varnel/component_error.h"
 #include "varnel/return_codes.h"
@@ -17,6 +18,10 @@ int statusForCode(std::int32_t code) {
 }
 
 namespace {
+
+// An Error_code that asks a request to leave the meter open on its failure paths:
+// the run releases it once, at its end.
+constexpr std::int16_t kKeepMeterOpen = -50;
 
 // What a ComponentError number means, for the one line a user reads.
 std::string unexpected(const ComponentError& e, const std::string& during = "") {
@@ -56,9 +61,19 @@ int MeterSession::run(const std::function<void(MeterSession&)>& work) {
     try {
         attachSimulatedMeter();
         wrapper_ = std::make_unique<DllWrapper>(transportPath_);
-        wrapper_->setOnProgress([this](std::int16_t& percent) { progress_.update(percent); });
+        wrapper_->setOnProgress([this](std::int16_t& percent) {
+            // The handler only noted the signal; here, on our own thread, it is safe to say so.
+            if (interruption() == 0) return progress_.update(percent);
+            if (stopNoted_) return;
+            stopNoted_ = true;
+            progress_.finish();
+            say("interrupted: stopping once the meter finishes its current step");
+        });
+        stopIfInterrupted();
         discover();
+        stopIfInterrupted();
         work(*this);
+        stopIfInterrupted();
     } catch (const RunEnd& end) {
         status = end.status;
     } catch (const ComponentError& e) {
@@ -71,22 +86,33 @@ int MeterSession::run(const std::function<void(MeterSession&)>& work) {
         status = exit_status::local_failure;
     }
     status = release(status);
+    // A signal during the release stopped nothing: the command's work was done and stands.
+    if (interruption() != 0 && !stopNoted_) say("interrupted while the meter was released; the command had finished");
     return saveSimulatedMeter(status);
 }
 
 void MeterSession::request(const std::string& label, const std::function<std::int32_t(XMLWrapper& status)>& call) {
     XMLWrapper status = emptyDocument(doc_kind::status);
     progress_.start(label);
+    // Every request attaches the meter again, even one an earlier failure released.
+    if (found_) record_.Error_code = kKeepMeterOpen;
+    released_ = false;
     std::int32_t code = 0;
     try {
         code = call(status);
     } catch (const ComponentError& e) {
+        noteRelease();
         progress_.finish();
         for (const std::string& text : statusDescriptions(status)) say(text);
         say(unexpected(e));
         throw RunEnd{exit_status::component_error};
     }
-    if (code == 0) return progress_.complete();
+    noteRelease();
+    if (code == 0) {
+        // An interrupted request's bar stops where it was, not at 100%.
+        stopIfInterrupted();
+        return progress_.complete();
+    }
     progress_.finish();
     const auto texts = statusDescriptions(status);
     for (const std::string& text : texts) say(text);
@@ -96,7 +122,31 @@ void MeterSession::request(const std::string& label, const std::function<std::in
 }
 
 void MeterSession::clearMeter() {
-    request("clear", [this](XMLWrapper& status) { return wrapper_->clearMeter(record_, deviceInfo_, status); });
+    stopIfInterrupted();
+    try {
+        request("clear", [this](XMLWrapper& status) { return wrapper_->clearMeter(record_, deviceInfo_, status); });
+    } catch (const RunEnd& end) {
+        // Once sent, the erase cannot be called back: a stop must not read as "not erased".
+        if (end.status == exit_status::interrupted || end.status == exit_status::terminated)
+            say("the erase had already been sent: meter " + sectionValue(deviceInfo_, "DeviceInfo", "SN") +
+                " is erased");
+        throw;
+    }
+}
+
+void MeterSession::stopIfInterrupted() {
+    const int signal = interruption();
+    if (signal == 0) return;
+    progress_.finish();
+    if (!stopNoted_) say("interrupted");
+    stopNoted_ = true;
+    throw RunEnd{interruptedStatus(signal)};
+}
+
+void MeterSession::noteRelease() {
+    // The component releases the meter on some failures whatever the client asked; its
+    // release leaves ME_QUIT in the record. Releasing again would cost the close's waits twice.
+    if (found_ && record_.Error_code == ME_QUIT) released_ = true;
 }
 
 void MeterSession::attachSimulatedMeter() {
@@ -109,18 +159,27 @@ void MeterSession::attachSimulatedMeter() {
 void MeterSession::discover() {
     XMLWrapper connection = connectionDocument(options_.port);
     deviceInfo_ = emptyDocument(doc_kind::device_info);
-    request("discover",
-            [&](XMLWrapper& status) { return wrapper_->discoverDevice(record_, deviceInfo_, connection, status); });
-    found_ = true;
+    request("discover", [&](XMLWrapper& status) {
+        const std::int32_t code = wrapper_->discoverDevice(record_, deviceInfo_, connection, status);
+        // Held from here on, even when a signal ends the run before the next request.
+        found_ = code == 0;
+        return code;
+    });
 }
 
 int MeterSession::release(int status) {
-    // Nothing was found, so nothing is held; a failed request may have released it already,
-    // and releasing twice is harmless.
+    // Nothing was found, so nothing is held; a failed request may have released it already.
     if (!found_) return status;
+    if (released_) {
+        if (stopNoted_) say("meter released");
+        return status;
+    }
     try {
         const std::int32_t code = wrapper_->closeMeter(record_);
-        if (code == 0) return status;
+        if (code == 0) {
+            if (stopNoted_) say("meter released");
+            return status;
+        }
         say("the meter could not be released: " + returnCodeText(code));
         return status == exit_status::success ? statusForCode(code) : status;
     } catch (const ComponentError& e) {

@@ -15,17 +15,25 @@
 
 namespace varnel::cli {
 
-// Exit statuses besides 0 and the request codes made positive; `varnel --help` lists them.
+// Exit statuses; no two kinds of failure share one. `varnel --help` lists them.
 namespace exit_status {
 inline constexpr int success = 0;
-// A wrong command line, or a command that refuses to act as given (clear without --yes).
-inline constexpr int usage = 2;
-// A request code that does not fit the range of request statuses.
+// 1-62: a request failed; its return code made positive (statusForCode).
+// A request code that does not fit that range.
 inline constexpr int other_code = 63;
-// varnel itself could not do what was asked: the simulated meter, the output file.
-inline constexpr int local_failure = 64;
+// A wrong command line, or a command that refuses to act as given (clear without --yes).
+inline constexpr int usage = 64;
+// The input file is not a document varnel can use.
+inline constexpr int bad_input = 65;
 // The component raised ComponentError (an unexpected failure).
 inline constexpr int component_error = 70;
+// The -o file cannot be written; found before the meter is touched.
+inline constexpr int cannot_create = 73;
+// varnel itself failed while running: the simulated meter, writing the output.
+inline constexpr int local_failure = 74;
+// Stopped by SIGINT (Ctrl-C) or SIGTERM.
+inline constexpr int interrupted = 130;
+inline constexpr int terminated = 143;
 }  // namespace exit_status
 
 // The exit status for a failed request's return code: the code made positive.
@@ -66,8 +74,12 @@ public:
     // number and trace and throws RunEnd with exit_status::component_error.
     void request(const std::string& label, const std::function<std::int32_t(XMLWrapper& status)>& call);
 
-    // Erases the meter found by discovery.
+    // Erases the meter found by discovery. Interrupted once the erase was sent, it says the
+    // meter is erased before the run ends.
     void clearMeter();
+
+    // Ends the run with 130 or 143 when a signal came; call it at each safe point.
+    void stopIfInterrupted();
 
     DllWrapper& wrapper() { return *wrapper_; }
     METER_REC& record() { return record_; }
@@ -79,6 +91,8 @@ private:
     void discover();
     // closeMeter at the end of a run; a failure to release turns a success into a failure.
     int release(int status);
+    // Notes whether the request just run released the meter itself.
+    void noteRelease();
     int saveSimulatedMeter(int status);
 
     MeterOptions options_;
@@ -89,6 +103,8 @@ private:
     METER_REC record_{};
     XMLWrapper deviceInfo_;
     bool found_ = false;
+    bool released_ = false;  // a failed request already released the meter
+    bool stopNoted_ = false;
 };
 
 }  // namespace varnel::cli

@@ -1,12 +1,13 @@
 #include "set_commands.h"
 
 #include <cstdio>
-#include <ctime>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "commands.h"
 #include "documents.h"
+#include "settings_commands.h"
 #include "varnel/component_error.h"
 #include "varnel/records.h"
 
@@ -42,7 +43,7 @@ void apply(MeterSession& s, XMLWrapper& cfg, const std::string& label) {
 }
 
 // A configuration document that holds only the clock, for the meter discovery found.
-XMLWrapper clockDocument(MeterSession& s, const std::tm& now) {
+XMLWrapper clockDocument(MeterSession& s, const LocalTime& time) {
     XMLWrapper doc = emptyDocument(doc_kind::device_settings);
     doc.SelectElement("DeviceInfo");
     doc.AddElement("SN", sectionValue(s.deviceInfo(), "DeviceInfo", "SN"));
@@ -50,8 +51,8 @@ XMLWrapper clockDocument(MeterSession& s, const std::tm& now) {
     doc.SelectElement("Settings");
     doc.AddElement("Clock");
     doc.AddChildElement("Val");
-    const std::pair<const char*, int> parts[] = {{"D", now.tm_mday}, {"MM", now.tm_mon + 1}, {"Y", now.tm_year + 1900},
-                                                 {"h", now.tm_hour}, {"m", now.tm_min},      {"s", now.tm_sec}};
+    const std::pair<const char*, int> parts[] = {{"D", time.day},   {"MM", time.month},  {"Y", time.year},
+                                                 {"h", time.hour}, {"m", time.minute}, {"s", time.second}};
     for (const auto& [name, value] : parts) doc.SetChildAttribute(name, std::to_string(value));
     doc.MoveToRoot();
     return doc;
@@ -59,12 +60,24 @@ XMLWrapper clockDocument(MeterSession& s, const std::tm& now) {
 
 }  // namespace
 
-void syncMeterClock(MeterSession& s) {
-    const std::time_t t = std::time(nullptr);
-    std::tm now{};
-    localtime_r(&t, &now);
-    XMLWrapper doc = clockDocument(s, now);
-    apply(s, doc, "clock");
+void setMeterClock(MeterSession& s, const LocalTime& time) {
+    const MeterClock range = readMeterClock(s);
+    XMLWrapper doc = clockDocument(s, time);
+    try {
+        apply(s, doc, "clock");
+    } catch (const RunEnd& end) {
+        if (end.status >= exit_status::interrupted) throw;
+        // The meter's own refusal names no range; the person needs it to pick a time.
+        const std::string accepts = "the meter clock accepts only " + range.first.dateText() + " to " +
+                                    range.last.dateText();
+        const bool today = time.dateText() == computerNow().dateText();
+        if (time.seconds() > range.last.seconds() + 86399 || time.seconds() < range.first.seconds())
+            say(today ? accepts + ", so it cannot be set to today's date (" + time.dateText() + ")"
+                      : accepts + ", so it cannot be set to " + time.text());
+        else
+            say(time.text() + " was refused; " + accepts);
+        throw;
+    }
 }
 
 void addSetCommand(CLI::App& app, int& status) {
@@ -83,13 +96,21 @@ void addSetCommand(CLI::App& app, int& status) {
             loaded = cfg.LoadFile(line->file);
         } catch (const ComponentError& e) {
             say(line->file + ": " + e.description());
-            status = exit_status::usage;
+            status = exit_status::bad_input;
             return;
         }
         if (!loaded) {
             say(line->file + ": not an XML document: " + cfg.LastLoadError());
-            status = exit_status::usage;
+            status = exit_status::bad_input;
             return;
+        }
+        // What the meter only reports (GlucRange...) comes back from 'varnel settings'; it is no change.
+        std::vector<std::string> skipped;
+        cfg.LoadXML(withoutReadOnlyItems(cfg.XML(), skipped));
+        if (!skipped.empty()) {
+            std::string names;
+            for (const std::string& name : skipped) names += (names.empty() ? "" : ", ") + name;
+            say("skipped the items the meter only reports: " + names);
         }
         status = MeterSession(line->meter).run([&](MeterSession& s) {
             apply(s, cfg, "set");

@@ -1,12 +1,10 @@
 #include "settings_commands.h"
 
-#include <chrono>
+#include <pugixml.hpp>
+
 #include <cstdio>
-#include <cstdlib>
-#include <ctime>
 #include <memory>
-#include <string>
-#include <vector>
+#include <sstream>
 
 #include "commands.h"
 #include "documents.h"
@@ -20,7 +18,9 @@ struct SettingsLine {
     MeterOptions meter;
     std::string output;
     std::vector<std::string> items;
+    bool writable = false;
     bool sync = false;
+    std::string setTo;
 };
 
 // The major code of the first report in a status document; "" when there is none.
@@ -33,9 +33,10 @@ std::string firstMajor(XMLWrapper& status) {
     return major;
 }
 
-// Reads the listed items (all when none are listed) into a settings document.
-// Items the meter does not offer go to notes; a request of which none is offered fails.
-XMLWrapper readSettings(MeterSession& s, const std::vector<std::string>& items, std::vector<std::string>& notes) {
+}  // namespace
+
+XMLWrapper readSettings(MeterSession& s, const std::vector<std::string>& items, std::vector<std::string>& notes,
+                        const std::string& label) {
     XMLWrapper cfg = emptyDocument(doc_kind::device_settings);
     if (!items.empty()) {
         cfg.SelectElement("Settings");
@@ -43,7 +44,7 @@ XMLWrapper readSettings(MeterSession& s, const std::vector<std::string>& items, 
         cfg.MoveToRoot();
     }
     bool checked = false;
-    s.request("settings", [&](XMLWrapper& status) {
+    s.request(label, [&](XMLWrapper& status) {
         const std::int32_t code =
             s.wrapper().getDeviceSettings(s.record(), s.deviceInfo(), cfg, items.empty(), status, checked);
         if (code != ME_SUCCESS) return code;
@@ -56,60 +57,33 @@ XMLWrapper readSettings(MeterSession& s, const std::vector<std::string>& items, 
     return cfg;
 }
 
-// A calendar time without a time zone, as both clocks show it.
-struct LocalTime {
-    int year = 0, month = 0, day = 0, hour = 0, minute = 0, second = 0;
-
-    std::int64_t seconds() const {
-        using namespace std::chrono;
-        const sys_days date{std::chrono::year{year} / month / day};
-        return date.time_since_epoch().count() * 86400LL + hour * 3600LL + minute * 60LL + second;
+std::string withoutReadOnlyItems(const std::string& xml, std::vector<std::string>& dropped) {
+    pugi::xml_document doc;
+    if (!doc.load_string(xml.c_str(), pugi::parse_default | pugi::parse_declaration)) return xml;
+    pugi::xml_node settings = doc.document_element().child("Settings");
+    for (pugi::xml_node item = settings.first_child(); item;) {
+        const pugi::xml_node next = item.next_sibling();
+        if (std::string(item.attribute("Mode").value()) == "0") {
+            dropped.push_back(item.name());
+            settings.remove_child(item);
+        }
+        item = next;
     }
-    std::string text() const {
-        char buf[80];
-        std::snprintf(buf, sizeof buf, "%04d-%02d-%02d %02d:%02d:%02d", year, month, day, hour, minute, second);
-        return buf;
-    }
-};
-
-LocalTime computerClock() {
-    const std::time_t now = std::time(nullptr);
-    std::tm parts{};
-    localtime_r(&now, &parts);
-    return {parts.tm_year + 1900, parts.tm_mon + 1, parts.tm_mday, parts.tm_hour, parts.tm_min, parts.tm_sec};
+    std::ostringstream out;
+    doc.save(out, "  ", pugi::format_default, pugi::encoding_utf8);
+    return out.str();
 }
-
-// Date parts (and time parts, when present) of the Clock child `child`.
-LocalTime clockChild(XMLWrapper& cfg, const char* child) {
-    auto part = [&](const char* name) { return std::atoi(cfg.GetChildAttribute(child, name).c_str()); };
-    return {part("Y"), part("MM"), part("D"), part("h"), part("m"), part("s")};
-}
-
-std::string differenceText(std::int64_t meterAhead) {
-    if (meterAhead == 0) return "none, the clocks agree";
-    const std::int64_t span = meterAhead < 0 ? -meterAhead : meterAhead;
-    char buf[64];
-    const long long days = span / 86400;
-    const int rest = static_cast<int>(span % 86400);
-    std::snprintf(buf, sizeof buf, "%s%02d:%02d:%02d", days ? (std::to_string(days) + " days ").c_str() : "",
-                  rest / 3600, rest / 60 % 60, rest % 60);
-    return std::string("meter is ") + buf + (meterAhead < 0 ? " behind" : " ahead");
-}
-
-}  // namespace
 
 void showClock(MeterSession& s) {
-    std::vector<std::string> notes;
-    XMLWrapper cfg = readSettings(s, {"Clock"}, notes);
-    cfg.SelectElement("Clock");
-    const LocalTime meter = clockChild(cfg, "Val");
-    const LocalTime first = clockChild(cfg, "Min");
-    const LocalTime last = clockChild(cfg, "Max");
-    const LocalTime computer = computerClock();
-    std::printf("Meter clock:    %s\n", meter.text().c_str());
+    const MeterClock meter = readMeterClock(s);
+    const LocalTime computer = computerNow();
+    std::printf("Meter clock:    %s\n", meter.now.text().c_str());
     std::printf("Computer clock: %s\n", computer.text().c_str());
-    std::printf("Difference:     %s\n", differenceText(meter.seconds() - computer.seconds()).c_str());
-    std::printf("Meter accepts:  %s to %s\n", first.text().substr(0, 10).c_str(), last.text().substr(0, 10).c_str());
+    std::printf("Difference:     %s\n", differenceText(meter.now.seconds() - computer.seconds()).c_str());
+    std::printf("Meter accepts:  %s to %s\n", meter.first.dateText().c_str(), meter.last.dateText().c_str());
+    std::fflush(stdout);
+    const std::string warning = clockWarning(meter, computer);
+    if (!warning.empty()) say(warning);
 }
 
 void addSettingsCommands(CLI::App& app, int& status, ClockSetter setClock) {
@@ -123,20 +97,34 @@ void addSettingsCommands(CLI::App& app, int& status, ClockSetter setClock) {
         ->add_option("--item", line->items,
                      "Read only this item (Clock, Beep, GlucUnit, Language, Insulins, Targets...); repeatable")
         ->type_name("NAME");
+    settings->add_flag("--writable", line->writable,
+                       "Leave out the items the meter only reports (GlucRange, GlucCalib...): "
+                       "the document 'varnel set' writes back as it is");
     settings->callback([line, &status] {
         status = MeterSession(line->meter).run([&](MeterSession& s) {
-            std::vector<std::string> notes;
-            emit(line->output, xmlText(readSettings(s, line->items, notes)));
+            std::vector<std::string> notes, dropped;
+            std::string text = xmlText(readSettings(s, line->items, notes));
+            if (line->writable) text = withoutReadOnlyItems(text, dropped);
+            emit(line->output, text);
             for (const std::string& note : notes) say(note);
         });
     });
 
     auto* clock = app.add_subcommand("clock", "Show the meter clock beside the computer clock, with the difference");
     addMeterOptions(clock, line->meter);
-    if (setClock) clock->add_flag("--sync", line->sync, "First set the meter clock to the computer clock");
+    if (setClock) {
+        auto* sync = clock->add_flag("--sync", line->sync, "First set the meter clock to the computer clock");
+        clock->add_option("--set", line->setTo, "First set the meter clock to this local time")
+            ->type_name("\"YYYY-MM-DD hh:mm:ss\"")
+            ->check([](const std::string& text) {
+                return parseLocalTime(text) ? std::string() : "expected \"YYYY-MM-DD hh:mm:ss\", got \"" + text + "\"";
+            })
+            ->excludes(sync);
+    }
     clock->callback([line, &status, setClock] {
         status = MeterSession(line->meter).run([&](MeterSession& s) {
-            if (line->sync) setClock(s);
+            if (line->sync) setClock(s, computerNow());
+            if (!line->setTo.empty()) setClock(s, *parseLocalTime(line->setTo));
             showClock(s);
         });
     });

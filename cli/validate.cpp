@@ -18,7 +18,7 @@ int validate(const std::string& file) {
     std::ifstream in(file, std::ios::binary);
     if (!in) {
         say(file + ": cannot be read");
-        return exit_status::usage;
+        return exit_status::bad_input;
     }
     const std::string xml{std::istreambuf_iterator<char>(in), {}};
     const std::string dir = schemaDirectory();
@@ -30,7 +30,7 @@ int validate(const std::string& file) {
         break;
     case Verdict::no_schema:
         say(file + ": no schema in " + dir + " for its document element");
-        return exit_status::usage;
+        return exit_status::bad_input;
     case Verdict::schema_unusable:
         say("the schema " + check.schema + " does not load");
         return exit_status::local_failure;
@@ -41,7 +41,7 @@ int validate(const std::string& file) {
         break;
     }
     for (const std::string& line : check.problems) std::printf("%s\n", line.c_str());
-    return check.verdict == Verdict::valid ? exit_status::success : exit_status::usage;
+    return check.verdict == Verdict::valid ? exit_status::success : exit_status::bad_input;
 }
 
 }  // namespace

@@ -32,7 +32,7 @@ TEST_F(VarnelCommand, CapsDescribesEverythingOrTheNamesAsked) {
     EXPECT_EQ(r.err, "varnel: Operation failed; Invalid XML;HbA1c is not supported;\n");
 
     r = varnel({"caps", "-q", "--item", "not a name"});
-    EXPECT_EQ(r.status, 2);
+    EXPECT_EQ(r.status, 64);
     EXPECT_NE(r.err.find("--item and --record"), std::string::npos) << r.err;
 }
 

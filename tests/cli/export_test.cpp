@@ -179,7 +179,7 @@ TEST_F(VarnelCommand, CsvInMmolConvertsGlucoseOnlyAndSaysSoInTheHeader) {
     EXPECT_EQ(mmol[4][3] + " " + mmol[4][7], "33.3 HI");
 
     // The XML datalog keeps the meter's unit: asking to convert it is refused before the meter is touched.
-    EXPECT_EQ(varnel({"readings", "-q", "--unit", "mmol", "--sim-profile", kRecordLog}).status, 2);
+    EXPECT_EQ(varnel({"readings", "-q", "--unit", "mmol", "--sim-profile", kRecordLog}).status, 64);
 }
 
 TEST(CsvField, QuotesWhatASpreadsheetWouldSplitAndDisarmsFormulas) {

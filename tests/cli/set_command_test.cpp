@@ -41,9 +41,9 @@ TEST_F(SetCommand, WritesTheDocumentAndExitsWithItsOutcome) {
     std::ofstream(dir / "broken.xml") << "<DeviceSettings><Settings>";
     const std::string before = slurp(meter);
     r = set("", dir / "broken.xml");
-    EXPECT_EQ(r.status, 2);
+    EXPECT_EQ(r.status, 65);
     EXPECT_EQ(r.err.rfind("varnel: " + (dir / "broken.xml").string() + ": not an XML document", 0), 0u) << r.err;
-    EXPECT_EQ(set("", dir / "missing.xml").status, 2);
+    EXPECT_EQ(set("", dir / "missing.xml").status, 64);
     EXPECT_EQ(slurp(meter), before);
 }
 

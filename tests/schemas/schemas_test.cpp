@@ -178,11 +178,11 @@ TEST(ValidateCommand, NamesTheSchemaAndEachProblemWithItsLine) {
     const Case cases[] = {
         {"<Status>\n  <ErrCode><Major>0</Major><Minor>0</Minor></ErrCode>\n  <ErrDesc>ok</ErrDesc>\n</Status>\n",
          "schema Status.xsd\nvalid\n", 0},
-        {"<Status>\n  <ErrCod/>\n</Status>\n", "schema Status.xsd\nline 2: Element 'ErrCod'", 2},
+        {"<Status>\n  <ErrCod/>\n</Status>\n", "schema Status.xsd\nline 2: Element 'ErrCod'", 65},
         {"<ConnectionInfo><Ports><COM><PortsToSearch>256</PortsToSearch></COM></Ports></ConnectionInfo>",
-         "schema ConnectionInfo.xsd\nline 1: ", 2},
-        {"<Unknown/>", "", 2},
-        {"<Status>", "line 1: ", 2},
+         "schema ConnectionInfo.xsd\nline 1: ", 65},
+        {"<Unknown/>", "", 65},
+        {"<Status>", "line 1: ", 65},
     };
     const fs::path file = fs::temp_directory_path() / ("varnel-validate-" + std::to_string(::getpid()) + ".xml");
     for (const Case& c : cases) {

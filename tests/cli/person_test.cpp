@@ -1,0 +1,203 @@
+// The command as a person meets it: info and the clock warning, the settings round trip,
+// exit statuses, and Ctrl-C in the middle of a run.
+#include <gtest/gtest.h>
+#include <signal.h>
+
+#include <cstdlib>
+
+#include "support/varnel_command.h"
+
+namespace {
+
+using namespace varnel::test;
+
+// A run started in the background: standard error comes through a pipe, line by line.
+struct Running {
+    pid_t pid = 0;
+    FILE* err = nullptr;
+    std::string seen;
+
+    Running(std::vector<std::string> args, const fs::path& out) {
+        args.insert(args.begin(), VARNEL_CLI_PATH);
+        std::vector<char*> argv;
+        for (std::string& a : args) argv.push_back(a.data());
+        argv.push_back(nullptr);
+        int fds[2];
+        EXPECT_EQ(::pipe(fds), 0);
+        posix_spawn_file_actions_t actions;
+        posix_spawn_file_actions_init(&actions);
+        posix_spawn_file_actions_addopen(&actions, 1, out.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+        posix_spawn_file_actions_adddup2(&actions, fds[1], 2);
+        posix_spawn_file_actions_addclose(&actions, fds[0]);
+        EXPECT_EQ(posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ), 0);
+        posix_spawn_file_actions_destroy(&actions);
+        ::close(fds[1]);
+        err = ::fdopen(fds[0], "r");
+    }
+    // Reads standard error up to the first line that starts with `prefix`; false at its end.
+    bool waitFor(const std::string& prefix) {
+        char line[512];
+        while (std::fgets(line, sizeof line, err)) {
+            seen += line;
+            if (std::string(line).rfind(prefix, 0) == 0) return true;
+        }
+        return false;
+    }
+    // The exit status once the run ends; the rest of standard error is in `seen`.
+    int finish() {
+        for (int c; (c = std::fgetc(err)) != EOF;) seen += static_cast<char>(c);
+        std::fclose(err);
+        int wstatus = 0;
+        ::waitpid(pid, &wstatus, 0);
+        return WIFEXITED(wstatus) ? WEXITSTATUS(wstatus) : 128 + WTERMSIG(wstatus);
+    }
+};
+
+// The computer clock as the command sees it, for the runs of one test.
+struct Now {
+    explicit Now(const char* time) { ::setenv("VARNEL_NOW", time, 1); }
+    ~Now() { ::unsetenv("VARNEL_NOW"); }
+};
+
+TEST_F(VarnelCommand, InfoTellsTheMeterInPlainWordsAndWarnsOfAClockThatIsOff) {
+    // The test meter's clock stands at 2008-03-07 14:05:09 and holds 2000-2020.
+    const struct {
+        const char* now;
+        const char* warning;  // "" for none
+    } cases[] = {
+        {"2008-03-07 14:06:09", ""},
+        {"2008-03-07 14:15:09", "varnel: warning: the meter clock is off (meter is 00:10:00 behind); "
+                                "'varnel clock --sync' sets it to the computer clock\n"},
+        {"2031-01-01 10:00:00", "varnel: warning: the meter clock cannot hold today's date (2031-01-01): it accepts "
+                                "only 2000-01-01 to 2020-12-31, so its readings carry the meter's own dates\n"},
+    };
+    for (const auto& c : cases) {
+        Now now(c.now);
+        const Outcome r = varnel({"info", "-q", "--sim-profile", meter.string()});
+        ASSERT_EQ(r.status, 0) << r.err;
+        EXPECT_EQ(r.err, c.warning) << c.now;
+        const auto shown = lines(r.out);
+        ASSERT_EQ(shown.size(), 11u) << r.out;
+        EXPECT_EQ(shown[0], "Model:          Corvia(R) Morvex(TM)");
+        EXPECT_EQ(shown[3], "Firmware:       MX2210 of 2003-05-07");
+        EXPECT_EQ(shown[5], "Records:        12 of 1000");
+        EXPECT_EQ(shown[6], "Glucose unit:   mg/dL");
+        EXPECT_EQ(shown[8], std::string("Computer clock: ") + c.now);
+    }
+    // The same warning comes before an upload, and the upload goes on.
+    Now now("2008-03-07 14:25:09");
+    const Outcome r = varnel({"readings", "-q", "--sim-profile", meter.string(), "-o", (dir / "log.xml").string()});
+    EXPECT_EQ(r.status, 0);
+    EXPECT_EQ(r.err, "varnel: warning: the meter clock is off (meter is 00:20:00 behind); "
+                     "'varnel clock --sync' sets it to the computer clock\n");
+}
+
+TEST_F(VarnelCommand, ARefusedClockTimeNamesTheMeterRange) {
+    const struct {
+        std::vector<std::string> how;
+        const char* said;
+    } cases[] = {
+        {{"--set", "2030-01-01 00:00:00"}, "it cannot be set to 2030-01-01 00:00:00"},
+        {{"--sync"}, "it cannot be set to today's date (2031-01-01)"},
+    };
+    Now now("2031-01-01 10:00:00");
+    for (const auto& c : cases) {
+        std::vector<std::string> args{"clock", "-q", "--sim-type", "5"};
+        args.insert(args.end(), c.how.begin(), c.how.end());
+        const Outcome r = varnel(args);
+        EXPECT_EQ(r.status, 17);
+        EXPECT_NE(r.err.find(std::string("varnel: the meter clock accepts only 1996-01-01 to 2026-12-31, so ") + c.said),
+                  std::string::npos)
+            << r.err;
+    }
+    EXPECT_EQ(varnel({"clock", "-q", "--set", "2012-02-30 08:30:00"}).status, 64);
+}
+
+TEST_F(VarnelCommand, SettingsWrittenBackUnchangedOnEveryMeterType) {
+    // Eight meters at once: each run is its own process with its own simulated meter.
+    auto inParallel = [&](const char* step, auto argsFor) {
+        std::vector<std::unique_ptr<Running>> runs;
+        for (int type = 1; type <= 8; ++type)
+            runs.push_back(std::make_unique<Running>(argsFor(type), dir / (step + std::to_string(type))));
+        std::vector<std::pair<int, std::string>> ends;
+        for (auto& run : runs) ends.emplace_back(run->finish(), run->seen);
+        return ends;
+    };
+    auto file = [&](const char* name, int type) { return (dir / (name + std::to_string(type) + ".xml")).string(); };
+    inParallel("get", [&](int t) {
+        return std::vector<std::string>{"settings", "-q", "--sim-type", std::to_string(t), "-o", file("cfg", t)};
+    });
+    inParallel("writable", [&](int t) {
+        return std::vector<std::string>{"settings", "-q", "--writable", "--sim-type", std::to_string(t),
+                                        "-o", file("writable", t)};
+    });
+    for (const char* name : {"cfg", "writable"}) {
+        const auto ends = inParallel("set", [&](int t) {
+            return std::vector<std::string>{"set", "-q", file(name, t), "--sim-type", std::to_string(t)};
+        });
+        for (int t = 1; t <= 8; ++t) {
+            const auto& [status, err] = ends[static_cast<std::size_t>(t - 1)];
+            EXPECT_EQ(status, 0) << name << " type " << t << ": " << err;
+            // The full document brings read-only items, which are skipped and said; the writable one brings none.
+            EXPECT_EQ(err.find("varnel: skipped the items the meter only reports: "), name[0] == 'c' ? 0 : std::string::npos)
+                << name << " type " << t << ": " << err;
+        }
+    }
+}
+
+TEST_F(VarnelCommand, ExitStatusesTellUsageFilesAndRequestsApart) {
+    Outcome r = varnel({"--version"});
+    EXPECT_EQ(r.status, 0);
+    EXPECT_EQ(r.out.rfind("varnel ", 0), 0u) << r.out;
+    r = varnel({"readngs"});
+    EXPECT_EQ(r.status, 64);
+    EXPECT_EQ(r.err, "varnel: unknown command 'readngs'; did you mean 'readings'? ('varnel --help' lists the commands)\n");
+    // An output that cannot be written is found before the meter is touched.
+    const std::string before = slurp(meter);
+    r = varnel({"settings", "-q", "--sim-profile", meter.string(), "--sim-save", meter.string(), "-o", dir.string()});
+    EXPECT_EQ(r.status, 73);
+    EXPECT_EQ(r.err, "varnel: cannot write " + dir.string() + ": it is a directory\n");
+    EXPECT_EQ(slurp(meter), before);
+}
+
+TEST_F(VarnelCommand, ASignalStopsTheRunReleasesTheMeterAndLeavesNoPartialFile) {
+    // The full type-7 meter: its upload and erase last long enough to be interrupted.
+    const fs::path full = dir / "full.xml";
+    auto held = [&] {
+        pugi::xml_document doc;
+        EXPECT_TRUE(doc.load_file(full.c_str()));
+        const pugi::xml_node log = doc.child("meter").child("binaryDatalog");
+        return static_cast<std::size_t>(std::distance(log.begin(), log.end()));
+    };
+    const struct {
+        std::vector<std::string> args;
+        const char* step;  // the progress label after whose first line the signal is sent
+        int signal;
+        int status;
+        const char* said;
+        bool erased;
+    } cases[] = {
+        {{"readings", "-o", (dir / "log.xml").string()}, "readings ", SIGINT, 130,
+         "varnel: interrupted: stopping once the meter finishes its current step\nvarnel: meter released\n", false},
+        // An erase under way cannot be called back, and is said to have happened.
+        {{"clear", "--yes"}, "clear ", SIGTERM, 143,
+         "varnel: the erase had already been sent: meter MVX7001184 is erased\nvarnel: meter released\n", true},
+    };
+    for (const auto& c : cases) {
+        fs::copy_file(VARNEL_SOURCE_DIR "/sim/profiles/type7.xml", full, fs::copy_options::overwrite_existing);
+        const std::size_t before = held();
+        std::vector<std::string> args = c.args;
+        args.insert(args.end(), {"--sim-profile", full.string(), "--sim-save", full.string()});
+        Running run(args, dir / "stdout");
+        ASSERT_TRUE(run.waitFor(c.step)) << run.seen;
+        ::kill(run.pid, c.signal);
+        EXPECT_EQ(run.finish(), c.status) << run.seen;
+        EXPECT_TRUE(run.seen.ends_with(c.said)) << run.seen;
+        EXPECT_EQ(run.seen.find(std::string(c.step) + "100%"), std::string::npos) << run.seen;
+        // No output, not even a temporary file; the meter was saved after its release.
+        EXPECT_EQ(std::distance(fs::directory_iterator(dir), fs::directory_iterator()), 3) << run.seen;
+        EXPECT_EQ(held(), c.erased ? 0u : before);
+    }
+}
+
+}  // namespace
