@@ -120,7 +120,7 @@ std::string examplesHelp() {
            "  varnel set cfg.xml                        write an edited settings document back to the meter\n"
            "  varnel clock                              the meter clock beside the computer clock\n"
            "  varnel clock --sync --sim-type 5          set the meter clock to the computer clock\n"
-           "  varnel clock --set \"2024-05-01 08:30:00\"  set the meter clock to that local time\n\n";
+           "  varnel clock --set \"2010-05-01 08:30:00\"  set the meter clock to that local time\n\n";
 }
 
 std::string exitStatusHelp() {
