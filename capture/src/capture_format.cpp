@@ -52,9 +52,15 @@ void nameFields(const std::uint8_t* p, Json& j) {
     j["index"] = n.index;
     j["nameStr"] = text(n.nameStr);
 }
-void insulinsFields(const std::uint8_t* p, Json& j) { j["InsulinType"] = list(as<PREDEFINED_INSULINS_TYPE>(p).InsulinType); }
-void oralMedsFields(const std::uint8_t* p, Json& j) { j["oralMedType"] = list(as<PREDEFINED_ORAL_MEDS_TYPE>(p).oralMedType); }
-void segmentsFields(const std::uint8_t* p, Json& j) { j["mealSegments"] = list(as<MEAL_SEGMENTS_TYPE>(p).mealSegments); }
+void insulinsFields(const std::uint8_t* p, Json& j) {
+    j["InsulinType"] = list(as<PREDEFINED_INSULINS_TYPE>(p).InsulinType);
+}
+void oralMedsFields(const std::uint8_t* p, Json& j) {
+    j["oralMedType"] = list(as<PREDEFINED_ORAL_MEDS_TYPE>(p).oralMedType);
+}
+void segmentsFields(const std::uint8_t* p, Json& j) {
+    j["mealSegments"] = list(as<MEAL_SEGMENTS_TYPE>(p).mealSegments);
+}
 void datalogFields(const std::uint8_t* p, Json& j) {
     const auto& d = as<METER_DATALOG>(p);
     j["recordCount"] = d.recordCount;
@@ -81,13 +87,13 @@ const struct {
     const char* name;
 } kMeterRecFields[] = {
     VARNEL_CAP_FIELD(M_Type) VARNEL_CAP_FIELD(Error_code) VARNEL_CAP_FIELD(Serial_number)
-    VARNEL_CAP_FIELD(Firmware_number) VARNEL_CAP_FIELD(port) VARNEL_CAP_FIELD(Setting)
-    VARNEL_CAP_FIELD(Meter_upload_time) VARNEL_CAP_FIELD(Computer_upload_time)
-    VARNEL_CAP_FIELD(Checkstrip_range_lower_limit) VARNEL_CAP_FIELD(Percent_done) VARNEL_CAP_FIELD(Stage)
-    VARNEL_CAP_FIELD(Upper_glucose_report_level) VARNEL_CAP_FIELD(langMap) VARNEL_CAP_FIELD(eventMap)
-    VARNEL_CAP_FIELD(insulinMap) VARNEL_CAP_FIELD(Meter_name) VARNEL_CAP_FIELD(Plasma_cal_flag)
-    VARNEL_CAP_FIELD(Time_min) VARNEL_CAP_FIELD(Time_max) VARNEL_CAP_FIELD(FuncPtr_User_func)
-    VARNEL_CAP_FIELD(Raw_buff)};
+        VARNEL_CAP_FIELD(Firmware_number) VARNEL_CAP_FIELD(port) VARNEL_CAP_FIELD(Setting)
+            VARNEL_CAP_FIELD(Meter_upload_time) VARNEL_CAP_FIELD(Computer_upload_time)
+                VARNEL_CAP_FIELD(Checkstrip_range_lower_limit) VARNEL_CAP_FIELD(Percent_done) VARNEL_CAP_FIELD(Stage)
+                    VARNEL_CAP_FIELD(Upper_glucose_report_level) VARNEL_CAP_FIELD(langMap) VARNEL_CAP_FIELD(eventMap)
+                        VARNEL_CAP_FIELD(insulinMap) VARNEL_CAP_FIELD(Meter_name) VARNEL_CAP_FIELD(Plasma_cal_flag)
+                            VARNEL_CAP_FIELD(Time_min) VARNEL_CAP_FIELD(Time_max) VARNEL_CAP_FIELD(FuncPtr_User_func)
+                                VARNEL_CAP_FIELD(Raw_buff)};
 #undef VARNEL_CAP_FIELD
 
 const char kHex[] = "0123456789abcdef";
@@ -224,7 +230,7 @@ Json encodeIn(const ArgRef& a, int call, const OutMemory& memory) {
     const Bytes b = bytesOf(a);
     if (a.type->number) return numbers(a, b);
     Json out = readableObject(a, b);
-    if (a.bytes() >= kReferenceSize && a.kind != Kind::REC) {
+    if (a.bytes() >= kReferenceSize) {
         if (auto from = memory.find(a, b); from && *from < call) {
             out["fromCall"] = *from;
             return out;
@@ -239,20 +245,25 @@ Json encodeOut(const ArgRef& a, const Bytes& in) {
     const Bytes b = bytesOf(a);
     if (a.type->number) return numbers(a, b);
     Json out = readableObject(a, b);
-    if (a.kind != Kind::REC) {
+    if (a.kind == Kind::REC)
+        out["changes"] = changesBetween(in, b);
+    else
         out["bytes"] = toHex(b.data(), b.size());
-        return out;
-    }
+    return out;
+}
+
+Json changesBetween(const Bytes& before, const Bytes& after) {
     // Runs of changed bytes as [offset, hex]; runs closer than a few bytes are joined.
     Json changes = Json::array();
-    for (std::size_t i = 0; i < b.size();) {
-        if (b[i] == in[i]) {
+    const std::size_t n = std::min(before.size(), after.size());
+    for (std::size_t i = 0; i < n;) {
+        if (after[i] == before[i]) {
             ++i;
             continue;
         }
         std::size_t end = i + 1, same = 0;
-        for (std::size_t j = end; j < b.size() && same < 4; ++j) {
-            if (b[j] != in[j]) {
+        for (std::size_t j = end; j < n && same < 4; ++j) {
+            if (after[j] != before[j]) {
                 end = j + 1;
                 same = 0;
             } else {
@@ -260,12 +271,20 @@ Json encodeOut(const ArgRef& a, const Bytes& in) {
             }
         }
         std::string hex;
-        for (std::size_t k = i; k < end; ++k) hex += {kHex[b[k] >> 4], kHex[b[k] & 15]};
+        for (std::size_t k = i; k < end; ++k) hex += {kHex[after[k] >> 4], kHex[after[k] & 15]};
         changes.push_back(Json::array({i, hex}));
         i = end;
     }
-    out["changes"] = std::move(changes);
-    return out;
+    return changes;
+}
+
+bool applyChanges(const Json& changes, Bytes& target) {
+    if (!changes.is_array()) return false;
+    for (const Json& c : changes)
+        if (!c.is_array() || c.size() != 2 || !c[0].is_number_unsigned() ||
+            !fromHex(c[1], target, c[0].get<std::size_t>()))
+            return false;
+    return true;
 }
 
 std::optional<Bytes> decodeIn(const ArgRef& a, const Json& value, const OutMemory& memory, std::string& why) {
@@ -286,11 +305,8 @@ std::optional<Bytes> decodeIn(const ArgRef& a, const Json& value, const OutMemor
 std::optional<Bytes> decodeOut(const ArgRef& a, const Json& value, const Bytes& in, std::string& why) {
     if (a.kind != Kind::REC || value.is_null()) return decodeIn(a, value, OutMemory{}, why);
     Bytes out = in;
-    bool ok = value.is_object() && value.contains("changes") && value["changes"].is_array() && in.size() == a.bytes();
-    for (std::size_t i = 0; ok && i < value["changes"].size(); ++i) {
-        const Json& c = value["changes"][i];
-        ok = c.is_array() && c.size() == 2 && c[0].is_number_unsigned() && fromHex(c[1], out, c[0].get<std::size_t>());
-    }
+    const bool ok = value.is_object() && value.contains("changes") && in.size() == a.bytes() &&
+                    applyChanges(value["changes"], out);
     if (ok) return out;
     why = "argument " + std::string(a.name) + " holds no readable changes";
     return std::nullopt;

@@ -68,8 +68,9 @@ ArgRef arg(Kind kind, const char* name, T* data, std::size_t count) {
 }
 
 // An argument list from the function list's tuples: ARGS(tuples...) gives std::array<ArgRef, N>.
-#define VARNEL_CAP_ARG(kind, type, name) \
-    , ::varnel::capture::arg<type>(::varnel::capture::Kind::kind, #name, VARNEL_CAP_ADDR_##kind(name), VARNEL_CAP_COUNT_##kind)
+#define VARNEL_CAP_ARG(kind, type, name)                                                               \
+    , ::varnel::capture::arg<type>(::varnel::capture::Kind::kind, #name, VARNEL_CAP_ADDR_##kind(name), \
+                                   VARNEL_CAP_COUNT_##kind)
 #define VARNEL_CAP_ADDR_REC(name) name
 #define VARNEL_CAP_ADDR_VALUE(name) &name
 #define VARNEL_CAP_ADDR_IN(name) name
@@ -84,7 +85,8 @@ ArgRef arg(Kind kind, const char* name, T* data, std::size_t count) {
 #define VARNEL_CAP_COUNT_INOUT 1
 #define VARNEL_CAP_COUNT_IN_LIST VX_LIST_LENGTH
 #define VARNEL_CAP_COUNT_OUT_LIST VX_LIST_LENGTH
-#define VARNEL_CAP_ARGS(...) std::array{VX_COMMA_LIST(VX_EACH(VARNEL_CAP_ARG, __VA_ARGS__))}
+#define VARNEL_CAP_ARGS(...) \
+    std::array { VX_COMMA_LIST(VX_EACH(VARNEL_CAP_ARG, __VA_ARGS__)) }
 
 // The bytes of an argument as they are now.
 Bytes bytesOf(const ArgRef& a);
@@ -104,10 +106,15 @@ private:
 };
 
 // An argument going in: its value; records also with readable fields, and
-// objects handed back unchanged as {"fromCall": n}.
+// large ones handed back as an earlier call left them as {"fromCall": n}.
 Json encodeIn(const ArgRef& a, int call, const OutMemory& memory);
 // An argument coming out; the meter record as its changes against `in`.
 Json encodeOut(const ArgRef& a, const Bytes& in);
+
+// What changed from one image of an object to the next, as [offset, hex] runs.
+Json changesBetween(const Bytes& before, const Bytes& after);
+// Applies such runs; false when they are malformed or run past the end.
+bool applyChanges(const Json& changes, Bytes& target);
 
 // The bytes a capture holds for an argument; nullopt with `why` set when it cannot be read.
 std::optional<Bytes> decodeIn(const ArgRef& a, const Json& value, const OutMemory& memory, std::string& why);

@@ -7,7 +7,9 @@
 #include <fstream>
 #include <functional>
 #include <mutex>
+#include <span>
 #include <string>
+#include <vector>
 
 #include "caller_hooks.h"
 #include "capture_format.h"
@@ -42,20 +44,29 @@ Recorder& recorder() {
     return r;
 }
 
-// What the library hands to the recorded one as its yield hook: notes the
-// progress of the call under way, then lets the caller's pump run.
+// A call under way: what its arguments held when the recorded library last
+// yielded, so each yield notes what the library had written by then.
 struct CallUnderWay {
-    METER_REC* rec = nullptr;
+    std::span<const ArgRef> args;
+    std::vector<Bytes> seen;
     std::uint32_t start = 0;
     Json yields = Json::array();
 };
 thread_local CallUnderWay* t_call = nullptr;
 thread_local unsigned t_handedGeneration = 0;
 
+// The recorded library's yield hook: notes the call's progress, then lets the caller's pump run.
 void yieldFromInner(void*) {
     if (CallUnderWay* c = t_call) {
-        Json y = Json::array({callerTicks() - c->start});
-        if (c->rec) y.push_back(c->rec->Percent_done), y.push_back(c->rec->Stage);
+        Json y{{"at", callerTicks() - c->start}};
+        for (std::size_t i = 0; i < c->args.size(); ++i) {
+            const ArgRef& a = c->args[i];
+            if (!a.comesOut() || !a.data) continue;
+            Bytes now = bytesOf(a);
+            if (now == c->seen[i]) continue;
+            y[a.name] = changesBetween(c->seen[i], now);
+            c->seen[i] = std::move(now);
+        }
         c->yields.push_back(std::move(y));
     }
     callerYield();
@@ -96,9 +107,9 @@ int start(Recorder& r, const std::string& transport, const std::string& capture)
 #define VARNEL_CAP_RESOLVE(ret, name, ...) inner.name = reinterpret_cast<decltype(inner.name)>(dlsym(library, #name));
     VX_TRANSPORT_FUNCTIONS(VARNEL_CAP_RESOLVE)
 #undef VARNEL_CAP_RESOLVE
-#define VARNEL_CAP_REQUIRE(ret, name, ...)                                                          \
-    if (!inner.name) {                                                                              \
-        dlclose(library);                                                                           \
+#define VARNEL_CAP_REQUIRE(ret, name, ...)                                                       \
+    if (!inner.name) {                                                                           \
+        dlclose(library);                                                                        \
         return fail(r, "the transport library " + transport + " has no function \"" #name "\""); \
     }
     VX_METER_FUNCTIONS(VARNEL_CAP_REQUIRE)
@@ -158,7 +169,7 @@ std::int32_t recordCall(const char* function, const std::array<ArgRef, N>& args,
         if (args[i].goesIn()) line["in"][args[i].name] = encodeIn(args[i], call, r.memory);
     }
     handHooks(r.inner);
-    CallUnderWay under{rec, callerTicks()};
+    CallUnderWay under{args, std::vector<Bytes>(in.begin(), in.end()), callerTicks()};
     t_call = &under;
     const std::int32_t result = forward(r.inner);
     t_call = nullptr;
@@ -181,11 +192,11 @@ std::int32_t recordCall(const char* function, const std::array<ArgRef, N>& args,
 }  // namespace
 
 #define VARNEL_CAP_PASS(kind, type, name) , name
-#define VARNEL_CAP_RECORD(ret, name, ...)                                                                   \
-    extern "C" VX_API ret name(VX_C_PARAMS(__VA_ARGS__)) {                                                  \
-        return static_cast<ret>(recordCall(#name, VARNEL_CAP_ARGS(__VA_ARGS__), [&](const Inner& inner) { \
+#define VARNEL_CAP_RECORD(ret, name, ...)                                                                       \
+    extern "C" VX_API ret name(VX_C_PARAMS(__VA_ARGS__)) {                                                      \
+        return static_cast<ret>(recordCall(#name, VARNEL_CAP_ARGS(__VA_ARGS__), [&](const Inner& inner) {       \
             return static_cast<std::int32_t>(inner.name(VX_COMMA_LIST(VX_EACH(VARNEL_CAP_PASS, __VA_ARGS__)))); \
-        }));                                                                                                \
+        }));                                                                                                    \
     }
 VX_METER_FUNCTIONS(VARNEL_CAP_RECORD)
 #undef VARNEL_CAP_RECORD

@@ -126,8 +126,8 @@ std::int32_t replayCall(const char* function, const std::array<ArgRef, N>& args)
             const auto expected = decodeIn(a, c["in"].value(a.name, Json()), r.memory, why);
             if (!expected) return refuse(at + " " + function + ": " + why);
             if (*expected != came)
-                return refuse(at + " " + function + ": expected " + a.name + " " + describe(a, *expected) +
-                              ", came " + describe(a, came) + " differing at " + firstDifference(a, *expected, came));
+                return refuse(at + " " + function + ": expected " + a.name + " " + describe(a, *expected) + ", came " +
+                              describe(a, came) + " differing at " + firstDifference(a, *expected, came));
             in[i] = *expected;
         }
         if (a.comesOut()) {
@@ -137,18 +137,29 @@ std::int32_t replayCall(const char* function, const std::array<ArgRef, N>& args)
             out[i] = *answer;
         }
     }
+    // Yields are checked before any of them is played, so a bad one cannot stop a call halfway.
+    const Json yields = c.value("yields", Json::array());
+    for (const Json& y : yields) {
+        bool ok = y.is_object() && y.contains("at") && y["at"].is_number_unsigned();
+        for (std::size_t i = 0; ok && i < N; ++i) {
+            Bytes scratch(args[i].bytes());
+            ok = !y.contains(args[i].name) || (args[i].comesOut() && applyChanges(y[args[i].name], scratch));
+        }
+        if (!ok) return refuse(at + " " + function + ": a yield of the capture is unreadable");
+    }
     r.next++;
 
-    // The call's time on the caller's clock, with its progress where the recorded library yielded.
+    // The call's time on the caller's clock, with what the recorded library had written at each yield.
     std::uint32_t elapsed = 0;
-    for (const Json& y : c.value("yields", Json::array())) {
-        if (!y.is_array() || y.empty() || !y[0].is_number_unsigned()) continue;
-        const auto at = y[0].get<std::uint32_t>();
+    for (const Json& y : yields) {
+        const auto at = y["at"].get<std::uint32_t>();
         callerSleep(at > elapsed ? at - elapsed : 0);
         elapsed = std::max(elapsed, at);
-        if (rec && y.size() == 3 && y[1].is_number_integer() && y[2].is_number_integer()) {
-            rec->Percent_done = y[1].get<std::int16_t>();
-            rec->Stage = y[2].get<std::int16_t>();
+        for (std::size_t i = 0; i < N; ++i) {
+            if (!y.contains(args[i].name) || !args[i].data) continue;
+            Bytes now = bytesOf(args[i]);
+            applyChanges(y[args[i].name], now);
+            std::copy(now.begin(), now.end(), static_cast<std::uint8_t*>(args[i].data));
         }
         callerYield();
     }
@@ -165,8 +176,8 @@ std::int32_t replayCall(const char* function, const std::array<ArgRef, N>& args)
 
 }  // namespace
 
-#define VARNEL_CAP_REPLAY(ret, name, ...) \
-    extern "C" VX_API ret name(VX_C_PARAMS(__VA_ARGS__)) { \
+#define VARNEL_CAP_REPLAY(ret, name, ...)                                         \
+    extern "C" VX_API ret name(VX_C_PARAMS(__VA_ARGS__)) {                        \
         return static_cast<ret>(replayCall(#name, VARNEL_CAP_ARGS(__VA_ARGS__))); \
     }
 VX_METER_FUNCTIONS(VARNEL_CAP_REPLAY)
