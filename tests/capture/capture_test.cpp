@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "support/varnel_command.h"
 #include "varnel/clock.h"
 #include "varnel/component_error.h"
 #include "varnel/dll_wrapper.h"
@@ -258,6 +259,20 @@ TEST(Capture, KeptSessionsReplayWithoutDivergence) {
             }
         }
     }
+}
+
+// The command records around its transport and replays in its place; a replay that parts says where.
+using CaptureCommand = varnel::test::VarnelCommand;
+TEST_F(CaptureCommand, RecordedReadingsReplayThroughTheCommand) {
+    const std::string capture = (dir / "session.jsonl").string();
+    const auto live = varnel({"readings", "-q", "--sim-profile", meter.string(), "--record", capture});
+    ASSERT_EQ(live.status, 0) << live.err;
+    const auto again = varnel({"readings", "-q", "--replay", capture});
+    EXPECT_EQ(again.status, 0) << again.err;
+    EXPECT_EQ(again.out, live.out);
+    const auto other = varnel({"settings", "-q", "--replay", capture});
+    EXPECT_NE(other.status, 0);
+    EXPECT_NE(other.err.find("varnel: replay of " + capture + ": call "), std::string::npos) << other.err;
 }
 
 // Writes the kept sessions anew: run with --gtest_also_run_disabled_tests --gtest_filter='*WriteKeptSessions'.
