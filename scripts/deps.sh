@@ -2,7 +2,7 @@
 # Installs the Debian packages Varnel builds and tests with, when any is missing:
 # the compilers, the libraries, and clang's sanitizer and libFuzzer runtimes.
 set -euo pipefail
-packages=(cmake g++ make libpugixml-dev libgtest-dev libgmock-dev libbenchmark-dev libcli11-dev
+packages=(cmake g++ make libpugixml-dev libgtest-dev libgmock-dev libbenchmark-dev libcli11-dev nlohmann-json3-dev
           clang libclang-rt-14-dev libxml2-dev python3 python3-pytest)
 missing=()
 # pkg-config: the C example is built through it against the installed package.
