@@ -203,6 +203,12 @@ const TypeInfo& typeInfo(const std::int32_t*) {
     return info;
 }
 
+std::int32_t failCall(std::span<const ArgRef> args) {
+    for (const ArgRef& a : args)
+        if (a.kind == Kind::REC && a.data) static_cast<METER_REC*>(a.data)->Error_code = ME_FAIL;
+    return ME_FAIL;
+}
+
 Bytes bytesOf(const ArgRef& a) {
     if (!a.data) return {};
     const auto* p = static_cast<const std::uint8_t*>(a.data);
@@ -305,8 +311,8 @@ std::optional<Bytes> decodeIn(const ArgRef& a, const Json& value, const OutMemor
 std::optional<Bytes> decodeOut(const ArgRef& a, const Json& value, const Bytes& in, std::string& why) {
     if (a.kind != Kind::REC || value.is_null()) return decodeIn(a, value, OutMemory{}, why);
     Bytes out = in;
-    const bool ok = value.is_object() && value.contains("changes") && in.size() == a.bytes() &&
-                    applyChanges(value["changes"], out);
+    const bool ok =
+        value.is_object() && value.contains("changes") && in.size() == a.bytes() && applyChanges(value["changes"], out);
     if (ok) return out;
     why = "argument " + std::string(a.name) + " holds no readable changes";
     return std::nullopt;

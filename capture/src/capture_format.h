@@ -88,6 +88,9 @@ ArgRef arg(Kind kind, const char* name, T* data, std::size_t count) {
 #define VARNEL_CAP_ARGS(...) \
     std::array { VX_COMMA_LIST(VX_EACH(VARNEL_CAP_ARG, __VA_ARGS__)) }
 
+// Fails a call for a reason of the capture: -17, left in the record's Error_code as a transport does.
+std::int32_t failCall(std::span<const ArgRef> args);
+
 // The bytes of an argument as they are now.
 Bytes bytesOf(const ArgRef& a);
 

@@ -34,6 +34,7 @@ struct Recorder {
     std::string capturePath;
     std::ofstream file;
     int calls = 0;
+    unsigned starts = 0;
     OutMemory memory;
     // Why recording stopped; every later call fails with it.
     std::string error;
@@ -53,7 +54,9 @@ struct CallUnderWay {
     Json yields = Json::array();
 };
 thread_local CallUnderWay* t_call = nullptr;
+// Which hooks this thread last handed on, and to which start's library.
 thread_local unsigned t_handedGeneration = 0;
+thread_local unsigned t_handedStart = 0;
 
 // The recorded library's yield hook: notes the call's progress, then lets the caller's pump run.
 void yieldFromInner(void*) {
@@ -97,7 +100,7 @@ int start(Recorder& r, const std::string& transport, const std::string& capture)
     r.inner = {};
     r.calls = 0;
     r.memory.clear();
-    t_handedGeneration = 0;
+    ++r.starts;
     void* library = dlopen(transport.c_str(), RTLD_NOW | RTLD_LOCAL);
     if (!library) {
         const char* why = dlerror();
@@ -140,12 +143,14 @@ void configure(Recorder& r) {
 
 // Hands this thread's hooks to the recorded library: the caller's clock as it
 // is, and the recorder's yield hook in front of the caller's pump.
-void handHooks(const Inner& inner) {
+void handHooks(const Recorder& r) {
+    const Inner& inner = r.inner;
     const CallerHooks& h = callerHooks();
-    if (t_handedGeneration == h.generation) return;
+    if (t_handedGeneration == h.generation && t_handedStart == r.starts) return;
     if (inner.vx_set_yield_hook) inner.vx_set_yield_hook(&yieldFromInner, nullptr);
     if (inner.vx_set_clock_hook) inner.vx_set_clock_hook(h.tick, h.sleep, h.clockContext);
     t_handedGeneration = h.generation;
+    t_handedStart = r.starts;
 }
 
 template <std::size_t N>
@@ -154,13 +159,7 @@ std::int32_t recordCall(const char* function, const std::array<ArgRef, N>& args,
     Recorder& r = recorder();
     std::lock_guard lock(r.mutex);
     configure(r);
-    METER_REC* rec = nullptr;
-    for (const ArgRef& a : args)
-        if (a.kind == Kind::REC) rec = static_cast<METER_REC*>(a.data);
-    if (!r.error.empty()) {
-        if (rec) rec->Error_code = ME_FAIL;
-        return ME_FAIL;
-    }
+    if (!r.error.empty()) return failCall(args);
     const int call = ++r.calls;
     Json line{{"call", call}, {"fn", function}, {"in", Json::object()}};
     std::array<Bytes, N> in;
@@ -168,7 +167,7 @@ std::int32_t recordCall(const char* function, const std::array<ArgRef, N>& args,
         in[i] = bytesOf(args[i]);
         if (args[i].goesIn()) line["in"][args[i].name] = encodeIn(args[i], call, r.memory);
     }
-    handHooks(r.inner);
+    handHooks(r);
     CallUnderWay under{args, std::vector<Bytes>(in.begin(), in.end()), callerTicks()};
     t_call = &under;
     const std::int32_t result = forward(r.inner);

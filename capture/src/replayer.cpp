@@ -99,13 +99,9 @@ std::int32_t replayCall(const char* function, const std::array<ArgRef, N>& args)
     Replayer& r = replayer();
     std::lock_guard lock(r.mutex);
     configure(r);
-    METER_REC* rec = nullptr;
-    for (const ArgRef& a : args)
-        if (a.kind == Kind::REC) rec = static_cast<METER_REC*>(a.data);
     auto refuse = [&](const std::string& why) {
         if (r.error.empty()) fail(r, why);
-        if (rec) rec->Error_code = ME_FAIL;
-        return ME_FAIL;
+        return failCall(args);
     };
     if (!r.error.empty()) return refuse(r.error);
     if (r.next >= r.calls.size())

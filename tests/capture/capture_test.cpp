@@ -213,6 +213,9 @@ TEST(Capture, DivergenceIsReportedNotAnswered) {
     Lines cut(lines.begin(), lines.end() - 6);
     Lines corrupt = lines;
     corrupt[5] = corrupt[5].substr(0, corrupt[5].size() / 2);
+    Lines otherPort = lines;
+    for (std::string& l : otherPort)
+        if (auto at = l.find("\"ports\":[1,"); at != std::string::npos) l.replace(at, 11, "\"ports\":[2,");
     Lines newer = lines;
     newer[0].replace(newer[0].find("\"version\":1"), 11, "\"version\":2");
     const struct {
@@ -226,6 +229,8 @@ TEST(Capture, DivergenceIsReportedNotAnswered) {
          {Step::Discover, Step::Settings, Step::Close},
          ": expected vb_Upload_Meter_Datalog, came vb_"},
         {"capture cut short", cut, readings, "expected the end of the capture"},
+        {"argument going in differs", otherPort, readings,
+         "find_meter: expected ports [2,0,0,0,0,0,0,0,0,0,0], came [1,"},
         {"corrupted line", corrupt, readings, "line 6 is not valid JSON"},
         {"newer format version", newer, readings, "format version 2, newer than this replayer reads (1)"},
     };
