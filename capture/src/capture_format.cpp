@@ -348,6 +348,8 @@ Json headerLine(const std::string& transportPath) {
     return Json{{"format", kFormatName}, {"version", kFormatVersion}, {"transport", transportPath}, {"recorded", when}};
 }
 
+std::string lineText(const Json& line) { return line.dump(-1, ' ', false, Json::error_handler_t::replace); }
+
 std::string checkHeader(const Json& header) {
     if (!header.is_object() || !header.contains("format") || header["format"] != kFormatName)
         return std::string("the first line is no ") + kFormatName + " header";

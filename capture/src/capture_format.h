@@ -129,6 +129,8 @@ std::string firstDifference(const ArgRef& a, const Bytes& expected, const Bytes&
 std::string describe(const ArgRef& a, const Bytes& bytes);
 
 Json headerLine(const std::string& transportPath);
+// A line as written: text that is not UTF-8 (a path) is replaced, never refused.
+std::string lineText(const Json& line);
 // Empty when the header is one this code reads; else why not.
 std::string checkHeader(const Json& header);
 

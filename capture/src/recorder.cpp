@@ -60,18 +60,19 @@ thread_local unsigned t_handedStart = 0;
 
 // The recorded library's yield hook: notes the call's progress, then lets the caller's pump run.
 void yieldFromInner(void*) {
-    if (CallUnderWay* c = t_call) {
-        Json y{{"at", callerTicks() - c->start}};
-        for (std::size_t i = 0; i < c->args.size(); ++i) {
-            const ArgRef& a = c->args[i];
-            if (!a.comesOut() || !a.data) continue;
-            Bytes now = bytesOf(a);
-            if (now == c->seen[i]) continue;
-            y[a.name] = changesBetween(c->seen[i], now);
-            c->seen[i] = std::move(now);
-        }
-        c->yields.push_back(std::move(y));
-    }
+    // Nothing may escape into the recorded library; a yield that cannot be noted is left out.
+    if (CallUnderWay* c = t_call) try {
+            Json y{{"at", callerTicks() - c->start}};
+            for (std::size_t i = 0; i < c->args.size(); ++i) {
+                const ArgRef& a = c->args[i];
+                if (!a.comesOut() || !a.data) continue;
+                Bytes now = bytesOf(a);
+                if (now == c->seen[i]) continue;
+                y[a.name] = changesBetween(c->seen[i], now);
+                c->seen[i] = std::move(now);
+            }
+            c->yields.push_back(std::move(y));
+        } catch (const std::exception&) {}
     callerYield();
 }
 
@@ -118,7 +119,7 @@ int start(Recorder& r, const std::string& transport, const std::string& capture)
     VX_METER_FUNCTIONS(VARNEL_CAP_REQUIRE)
 #undef VARNEL_CAP_REQUIRE
     r.file.open(capture, std::ios::out | std::ios::trunc);
-    if (!(r.file << headerLine(transport).dump() << '\n' << std::flush)) {
+    if (!(r.file << lineText(headerLine(transport)) << '\n' << std::flush)) {
         dlclose(library);
         return fail(r, "cannot write the capture file " + capture);
     }
@@ -160,31 +161,42 @@ std::int32_t recordCall(const char* function, const std::array<ArgRef, N>& args,
     std::lock_guard lock(r.mutex);
     configure(r);
     if (!r.error.empty()) return failCall(args);
-    const int call = ++r.calls;
-    Json line{{"call", call}, {"fn", function}, {"in", Json::object()}};
+    const int call = r.calls + 1;
+    Json line;
     std::array<Bytes, N> in;
-    for (std::size_t i = 0; i < N; ++i) {
-        in[i] = bytesOf(args[i]);
-        if (args[i].goesIn()) line["in"][args[i].name] = encodeIn(args[i], call, r.memory);
+    try {
+        line = Json{{"call", call}, {"fn", function}, {"in", Json::object()}};
+        for (std::size_t i = 0; i < N; ++i) {
+            in[i] = bytesOf(args[i]);
+            if (args[i].goesIn()) line["in"][args[i].name] = encodeIn(args[i], call, r.memory);
+        }
+    } catch (const std::exception& e) {
+        fail(r, std::string("cannot record call ") + std::to_string(call) + ": " + e.what());
+        return failCall(args);
     }
+    r.calls = call;
     handHooks(r);
     CallUnderWay under{args, std::vector<Bytes>(in.begin(), in.end()), callerTicks()};
     t_call = &under;
     const std::int32_t result = forward(r.inner);
     t_call = nullptr;
-    const std::uint32_t ms = callerTicks() - under.start;
-    line["out"] = Json::object();
-    for (std::size_t i = 0; i < N; ++i) {
-        if (!args[i].comesOut()) continue;
-        line["out"][args[i].name] = encodeOut(args[i], in[i]);
-        if (args[i].data && !args[i].type->number) r.memory.remember(call, args[i], bytesOf(args[i]));
-    }
-    line["result"] = result;
-    line["ms"] = ms;
-    if (!under.yields.empty()) line["yields"] = std::move(under.yields);
     // The call happened: its answer stands, but a session that cannot be recorded stops here.
-    if (!(r.file << line.dump() << '\n' << std::flush))
-        fail(r, "cannot write the capture file " + r.capturePath + " after call " + std::to_string(call));
+    try {
+        const std::uint32_t ms = callerTicks() - under.start;
+        line["out"] = Json::object();
+        for (std::size_t i = 0; i < N; ++i) {
+            if (!args[i].comesOut()) continue;
+            line["out"][args[i].name] = encodeOut(args[i], in[i]);
+            if (args[i].data && !args[i].type->number) r.memory.remember(call, args[i], bytesOf(args[i]));
+        }
+        line["result"] = result;
+        line["ms"] = ms;
+        if (!under.yields.empty()) line["yields"] = std::move(under.yields);
+        if (!(r.file << lineText(line) << '\n' << std::flush))
+            fail(r, "cannot write the capture file " + r.capturePath + " after call " + std::to_string(call));
+    } catch (const std::exception& e) {
+        fail(r, "cannot record call " + std::to_string(call) + ": " + e.what());
+    }
     return result;
 }
 

@@ -49,7 +49,7 @@ std::string checkCall(const Json& c) {
     return {};
 }
 
-int start(Replayer& r, const std::string& path) {
+int read(Replayer& r, const std::string& path) {
     r.configured = true;
     r.path = path;
     r.calls.clear();
@@ -78,6 +78,16 @@ int start(Replayer& r, const std::string& path) {
     return ME_SUCCESS;
 }
 
+// Reads a capture; nothing escapes to the caller (a file too large for memory is refused).
+int start(Replayer& r, const std::string& path) {
+    try {
+        return read(r, path);
+    } catch (const std::exception& e) {
+        r.calls.clear();
+        return fail(r, std::string("cannot read the capture file: ") + e.what());
+    }
+}
+
 void configure(Replayer& r) {
     if (r.configured) return;
     const char* file = std::getenv("VARNEL_REPLAY_FILE");
@@ -95,10 +105,7 @@ std::string where(const Replayer& r, std::size_t index) {
 
 // Checks the call against the capture's next one and answers it; a failure code when they differ.
 template <std::size_t N>
-std::int32_t replayCall(const char* function, const std::array<ArgRef, N>& args) {
-    Replayer& r = replayer();
-    std::lock_guard lock(r.mutex);
-    configure(r);
+std::int32_t answer(Replayer& r, const char* function, const std::array<ArgRef, N>& args) {
     auto refuse = [&](const std::string& why) {
         if (r.error.empty()) fail(r, why);
         return failCall(args);
@@ -168,6 +175,19 @@ std::int32_t replayCall(const char* function, const std::array<ArgRef, N>& args)
         if (!args[i].type->number) r.memory.remember(int(index) + 1, args[i], std::move(out[i]));
     }
     return c["result"].get<std::int32_t>();
+}
+
+template <std::size_t N>
+std::int32_t replayCall(const char* function, const std::array<ArgRef, N>& args) {
+    Replayer& r = replayer();
+    std::lock_guard lock(r.mutex);
+    configure(r);
+    try {
+        return answer(r, function, args);
+    } catch (const std::exception& e) {
+        if (r.error.empty()) fail(r, std::string("cannot answer ") + function + ": " + e.what());
+        return failCall(args);
+    }
 }
 
 }  // namespace
