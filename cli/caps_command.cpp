@@ -55,7 +55,7 @@ void addCapsCommand(CLI::App& app, int& status) {
     auto line = std::make_shared<CapsLine>();
     auto* caps = app.add_subcommand(
         "caps", "Print what the meter can do: its settings with their limits, and the record kinds it keeps");
-    addMeterOptions(caps, line->meter);
+    addMeterOptions(caps, line->meter, "--record-session");
     addOutputOption(caps, line->output);
     caps->add_option("--item", line->items,
                      "Describe only this setting (Clock, Beep, Language, Targets...); repeatable")

@@ -13,7 +13,7 @@
 
 namespace varnel::cli {
 
-void addMeterOptions(CLI::App* cmd, MeterOptions& o) {
+void addMeterOptions(CLI::App* cmd, MeterOptions& o, const std::string& recordNames) {
     cmd->add_option("--port", o.port, "Serial port to search for the meter")->capture_default_str();
     cmd->add_option("--transport", o.transport, "Transport library to load instead of the simulated one")
         ->type_name("PATH");
@@ -22,10 +22,21 @@ void addMeterOptions(CLI::App* cmd, MeterOptions& o) {
     cmd->add_option("--sim-profile", o.simProfile, "Attach the simulated meter described by a profile file")
         ->type_name("FILE")
         ->excludes(type);
-    cmd->add_option("--sim-save", o.simSave,
-                    "Afterwards, write the simulated meter as it is then to a profile file "
-                    "(attach it again with --sim-profile)")
-        ->type_name("FILE");
+    auto* profile = cmd->get_option("--sim-profile");
+    auto* save = cmd->add_option("--sim-save", o.simSave,
+                                 "Afterwards, write the simulated meter as it is then to a profile file "
+                                 "(attach it again with --sim-profile)")
+                     ->type_name("FILE");
+    auto* record = cmd->add_option(recordNames, o.record,
+                                   "Write every call to the transport library to a capture file (docs/capture.md)")
+                       ->type_name("FILE");
+    cmd->add_option("--replay", o.replay, "Answer from a capture file instead of a meter")
+        ->type_name("FILE")
+        ->excludes(record)
+        ->excludes(type)
+        ->excludes(profile)
+        ->excludes(save)
+        ->excludes(cmd->get_option("--transport"));
     cmd->add_flag("-q,--quiet", o.quiet, "Show no progress");
 }
 

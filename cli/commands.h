@@ -12,8 +12,9 @@
 
 namespace varnel::cli {
 
-// The options every meter command takes.
-void addMeterOptions(CLI::App* cmd, MeterOptions& o);
+// The options every meter command takes. A command whose own --record means
+// something else names the capture option --record-session alone.
+void addMeterOptions(CLI::App* cmd, MeterOptions& o, const std::string& recordNames = "--record,--record-session");
 CLI::Option* addOutputOption(CLI::App* cmd, std::string& output);
 // Writes a command's result; a failure ends the run without touching the meter again.
 void emit(const std::string& path, const std::string& text);

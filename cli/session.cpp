@@ -60,7 +60,7 @@ int MeterSession::run(const std::function<void(MeterSession&)>& work) {
     int status = exit_status::success;
     try {
         attachSimulatedMeter();
-        wrapper_ = std::make_unique<DllWrapper>(transportPath_);
+        wrapper_ = std::make_unique<DllWrapper>(startCapture());
         wrapper_->setOnProgress([this](std::int16_t& percent) {
             // The handler only noted the signal; here, on our own thread, it is safe to say so.
             if (interruption() == 0) return progress_.update(percent);
@@ -88,7 +88,7 @@ int MeterSession::run(const std::function<void(MeterSession&)>& work) {
     status = release(status);
     // A signal during the release stopped nothing: the command's work was done and stands.
     if (interruption() != 0 && !stopNoted_) say("interrupted while the meter was released; the command had finished");
-    return saveSimulatedMeter(status);
+    return finishCapture(saveSimulatedMeter(status));
 }
 
 void MeterSession::request(const std::string& label, const std::function<std::int32_t(XMLWrapper& status)>& call) {
@@ -154,6 +154,21 @@ void MeterSession::attachSimulatedMeter() {
     simulator_ = std::make_unique<SimulatorControls>(transportPath_);
     if (options_.simType != 0) simulator_->selectType(options_.simType);
     if (!options_.simProfile.empty()) simulator_->loadProfile(options_.simProfile);
+}
+
+std::string MeterSession::startCapture() {
+    if (!options_.record.empty()) capture_ = CaptureControls::record(transportPath_, options_.record);
+    if (!options_.replay.empty()) capture_ = CaptureControls::replay(options_.replay);
+    return capture_ ? capture_->path() : transportPath_;
+}
+
+int MeterSession::finishCapture(int status) {
+    if (!capture_) return status;
+    // Where a replay parted from its capture, or why recording stopped, comes last.
+    const std::string why = capture_->finish();
+    if (why.empty()) return status;
+    say(why);
+    return status == exit_status::success ? exit_status::local_failure : status;
 }
 
 void MeterSession::discover() {

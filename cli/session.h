@@ -7,6 +7,7 @@
 #include <memory>
 #include <string>
 
+#include "capture_control.h"
 #include "progress.h"
 #include "sim_control.h"
 #include "varnel/dll_wrapper.h"
@@ -46,6 +47,8 @@ struct MeterOptions {
     int simType = 0;        // 0: leave the simulated meter as the library starts it
     std::string simProfile;
     std::string simSave;
+    std::string record;  // a capture file to write, around the transport
+    std::string replay;  // a capture file to answer from, in place of a transport
     bool quiet = false;
 };
 
@@ -88,6 +91,10 @@ public:
 
 private:
     void attachSimulatedMeter();
+    // The transport library to load: the one asked for, or a capture library around or instead of it.
+    std::string startCapture();
+    // A capture that went wrong turns a success into a failure.
+    int finishCapture(int status);
     void discover();
     // closeMeter at the end of a run; a failure to release turns a success into a failure.
     int release(int status);
@@ -99,6 +106,7 @@ private:
     std::string transportPath_;
     Progress progress_;
     std::unique_ptr<SimulatorControls> simulator_;  // declared before wrapper_: outlives it
+    std::unique_ptr<CaptureControls> capture_;      // likewise
     std::unique_ptr<DllWrapper> wrapper_;
     METER_REC record_{};
     XMLWrapper deviceInfo_;

@@ -28,6 +28,7 @@ readings() {
 case $part in
 layout)
     for f in lib/libvarnel.so.0 lib/libvarnel.so lib/varnel/libvantrix32.so.0 include/varnel/dll_wrapper.h \
+             lib/varnel/libvarnel_record.so.0 lib/varnel/libvarnel_replay.so.0 include/varnel/vxcapture.h \
              include/varnel/vxsim.h include/varnel/version.h share/varnel/profiles/type7.xml share/varnel/schemas/Datalog.xsd bin/varnel \
              lib/cmake/varnel/varnelConfig.cmake lib/cmake/varnel/varnelConfigVersion.cmake \
              lib/pkgconfig/varnel.pc; do
