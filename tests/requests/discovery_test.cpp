@@ -70,7 +70,6 @@ TEST_F(Discovery, PortsToSearchAndMissingPorts) {
     };
     for (const Case& c : {Case{"3,4,5", "COM", ME_NO_DEVICE, none + "3"},
                           Case{"256", "COM", ME_INVALID_XMLWRAPPOBJ, "-17/-33/256 is not a valid port"},
-                          Case{"-1", "COM", ME_INVALID_XMLWRAPPOBJ, "-17/-33/-1 is not a valid port"},
                           Case{"4", "usb", ME_UNSUPPORTED_PORTS, "-11/-25/usb is Unsupported"},
                           Case{"abc", "COM", ME_NO_DEVICE, none + "abc"}, Case{"4,3", "com", ME_SUCCESS, ""}}) {
         SCOPED_TRACE(c.ports);
