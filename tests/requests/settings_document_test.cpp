@@ -211,6 +211,7 @@ TEST_F(DeviceSettings, EveryExitReportsOnceAndCompletes) {
          true},
         {fault("GetInitializedFlag"), {}, -2, failed + "DevInit setting failed", true},
         {fault("vb_Get_Meter_Firmware"), {}, -2, failed + "Firmware read failed", true},
+        {fault("convert_from_seconds"), {}, -2, failed + "Clock setting failed", true},  // never a made-up date
         {fault("vb_Chk4Meter"), {}, -2, "-17/-2/" + ErrorDescription(-2), false},
         {[](DeviceSettings&) { sim::setIdentitySerial("mvx7009999"); }, Names{"Beep", "CC"}, -17,
          other + "SN from Device Info XML - MVX7001184 Device SN from device - mvx7009999 do not match", false},
