@@ -2,16 +2,11 @@
 
 #include <algorithm>
 #include <set>
-#include <typeinfo>
 
 #include "errors/err_propagator.h"
 #include "readings/meter_models.h"
-#include "settings/clock_group.h"
 #include "settings/general_group.h"
 #include "settings/medication_groups.h"
-#include "settings/schedule_group.h"
-#include "settings/targets_group.h"
-#include "support/fake_transport.h"
 #include "support/sim_session.h"
 
 using namespace varnel;
@@ -36,26 +31,6 @@ struct Models : test::SimSession {
 };
 
 }  // namespace
-
-TEST(MeterModelFactory, ClassTextAndGroupsFollowTheMeterType) {
-    const char* names[] = {"clsCVMorvex", "clsCVTarnConsumer", "clsCVPellis", "clsDunmark", "clsQuilla&Bremo",
-                           "clsCVTolvo",  "clsCVZenta",        "clsCVMorvex", "clsParvix",  "clsCVMorvex"};
-    const std::vector<std::pair<int, std::string>> standard = {{0, typeid(Group_Clock).name()},
-                                                               {1, typeid(Group_General).name()}};
-    auto morvex = standard;
-    for (const std::type_info* t :
-         {&typeid(Group_Insulins), &typeid(Group_OralMeds), &typeid(Group_Schedule), &typeid(Group_targets)})
-        morvex.emplace_back(int(morvex.size()), t->name());
-    auto fns = std::make_shared<clsMeterFns>(std::make_shared<test::FakeTransport>());
-    for (int type = 0; type <= 9; ++type) {
-        auto model = createMeterModel(type);
-        EXPECT_STREQ(model->className(), names[type]) << type;
-        EXPECT_FALSE(model->initialise(fns));
-        std::vector<std::pair<int, std::string>> groups;
-        for (const auto& [number, group] : model->Settings()) groups.emplace_back(number, typeid(*group).name());
-        EXPECT_EQ(groups, std::string(names[type]) == "clsCVMorvex" ? morvex : standard) << type;
-    }
-}
 
 TEST(MeterModelFactory, ErrorsCarryTheModelsClassTextAndRoutine) {
     errPropagator().reset();
