@@ -2,7 +2,6 @@
 
 #include <sstream>
 
-#include "requests/option_writers.h"
 #include "support/wrapper_fixture.h"
 
 using namespace varnel;
@@ -66,23 +65,6 @@ TEST_F(ApplySettings, EachElementIsWrittenOrRefusedAndEveryRefusalIsGatheredInOr
               "Foo is not supported; GlucoseUnit value is read only ");
     EXPECT_EQ(sim::meter().clock, sim::secondsOf(2010, 5, 6, 7, 8, 0));
     EXPECT_EQ(progress, (std::vector<int>{50, 100}));
-}
-
-TEST_F(ApplySettings, AWriterThatFailsUnexpectedlyLeavesItsNameAndTheTrace) {
-    // A configuration without any document fails the writer's first document operation.
-    detail::MeterDll session(simTransport());
-    detail::WriteOutcome outcome;
-    XMLWrapper empty;
-    const auto fails = [&](MeterOptions_Enum o) {
-        return unexpectedTrace([&] { detail::writeOption(session, o, empty, status, outcome); });
-    };
-    EXPECT_EQ(fails(eInsulinPrompt).rfind("91 SetInsPrompt --> ", 0), 0u);
-    EXPECT_STREQ(parsed(status)->document_element().child_value("ProcedureError"), "SetInsPrompt Line: 0");
-
-    status = newDoc(doc_kind::status);
-    EXPECT_EQ(fails(eBeepStatus).rfind("91 SetBeeper --> ", 0), 0u);
-    EXPECT_FALSE(parsed(status)->document_element().child("ProcedureError"));
-    EXPECT_FALSE(outcome.bFailure || outcome.bSuccess);
 }
 
 TEST_F(ApplySettings, ChecksStopTheRequestBeforeAnyWrite) {
