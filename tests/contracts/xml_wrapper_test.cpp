@@ -205,27 +205,11 @@ TEST(XMLWrapperTest, NavigationAndReading) {
     EXPECT_EQ(x.CountElements("C"), 1);
 }
 
-TEST(XMLWrapperTest, TextsAndAttributesRoundTripThroughXmlText) {
-    const std::vector<std::string> texts = {"a < b && c > \"d' ]]>", "line1\nline2\t", "  padded  ", "   ",
-                                            "&amp; \xE2\x82\xAC \xF0\x9F\x98\x80"};
-    XMLWrapper x = newDoc(doc_kind::datalog);
-    x.SelectElement("Records");
-    for (const std::string& t : texts) {
-        x.AddElement("E", t);  // text next to a child element
-        x.SetAttribute("a", t);
-        x.AddChildElement("C", "", t);
-        x.SetChildAttribute("b", t);
-    }
-    XMLWrapper y = loaded(x.XML());
-    EXPECT_EQ(y.XML(), x.XML());
-    y.SelectElement("Records");
-    for (std::int32_t i = 0; i < std::ssize(texts); ++i) {
-        EXPECT_EQ(y.GetChildValueAt(i), texts[i]) << i;
-        EXPECT_EQ(y.GetChildAttributeAt(i, "a"), texts[i]) << i;
-    }
-
+// Escaping is the library's (every written text reads back: xml_hostile_test); blanks, zero bytes and line ends are ours.
+TEST(XMLWrapperTest, BlanksZeroBytesAndLineEndsInTexts) {
     XMLWrapper z;
     z.AddElement("R");
+    z.AddElement("W", "   ");
     z.AddElement("T", "a\r\nb\rc");
     z.SetAttribute("a", "a\r\nb");
     z.AddElement("Z", std::string("ab\0cd", 5));
@@ -233,6 +217,7 @@ TEST(XMLWrapperTest, TextsAndAttributesRoundTripThroughXmlText) {
     z = loaded(z.XML());
     EXPECT_EQ(z.GetChildValue("T"), "a\nb\nc");          // line-end normalisation
     EXPECT_EQ(z.GetChildAttribute("T", "a"), "a\r\nb");  // attributes keep it
+    EXPECT_EQ(z.GetChildValue("W"), "   ");
 }
 
 TEST(XMLWrapperTest, LoadXmlReplacesTheDocumentOrRefusesAndChangesNothing) {
@@ -273,12 +258,6 @@ TEST(XMLWrapperTest, EntitiesAndDtdsAreNeverExpanded) {
     TempDir dir;
     const std::string secret = dir.file("secret.txt", "TOPSECRET");
     const std::string dtd = dir.file("ext.dtd", "<!ENTITY ext 'FROMDTD'>");
-    std::string laughs = "<!DOCTYPE R [<!ENTITY lol0 \"lol\">";  // lol9: 10^9 times "lol"
-    for (int i = 1; i <= 9; ++i) {
-        laughs += "<!ENTITY lol" + std::to_string(i) + " \"";
-        for (int k = 0; k < 10; ++k) laughs += "&lol" + std::to_string(i - 1) + ";";
-        laughs += "\">";
-    }
     // An external subset is named, never read: its entities stay as written.
     const std::string external[] = {
         "<!DOCTYPE R SYSTEM \"file://" + dtd + "\"><R><A>&ext;</A><B attr='&ext;'/></R>",
@@ -295,7 +274,6 @@ TEST(XMLWrapperTest, EntitiesAndDtdsAreNeverExpanded) {
     const std::string internal[] = {
         "<!DOCTYPE R [<!ENTITY xxe SYSTEM \"file://" + secret + "\">]><R><A>&xxe;</A></R>",
         "<!DOCTYPE R [<!ENTITY % p SYSTEM \"file://" + dtd + "\"> %p;]><R><A>&ext;</A></R>",
-        laughs + "]><R><A>&lol9;</A><B attr='&lol9;'/></R>",
     };
     XMLWrapper x = loaded("<Kept/>");
     for (const std::string& text : internal) {
@@ -319,8 +297,6 @@ TEST(XMLWrapperTest, SaveFileAndLoadFile) {
     XMLWrapper y;
     ASSERT_TRUE(y.LoadFile(path)) << y.LastLoadError();
     EXPECT_EQ(y.XML(), x.XML());
-    EXPECT_TRUE(y.LoadFile(dir.file("bom.xml", "\xEF\xBB\xBF<R><A>1</A></R>")));
-    EXPECT_EQ(y.GetChildValue("A"), "1");
 
     const std::string before = x.XML();
     expectError([&] { x.LoadFile((dir.path / "missing.xml").string()); }, errc::document_failure, "missing.xml");
