@@ -116,10 +116,6 @@ TEST_F(Readings, BinaryDatalogWithOrdinalsAndEveryUnit) {
     std::vector<std::string> counts = summary();
     counts.resize(3);
     EXPECT_EQ(counts, (std::vector<std::string>{n, std::to_string(meter.binaryDatalog.size() - 3), "3"}));
-
-    discover(eCVPellis);
-    ASSERT_EQ(read(), ME_SUCCESS);
-    EXPECT_EQ(summary().back(), "InsUnit=Units");
 }
 
 TEST_F(Readings, EveryExit) {
