@@ -56,22 +56,9 @@ TEST_F(Session, FindChecksAndRebuildsTheMeterKeepingTheLastOneOnFailure) {
     EXPECT_EQ(session.initMeter(rec), ME_TIME_OUT);
 }
 
-TEST_F(Session, HandleAndFlagsComeFromTheStoredRecordAndCloseActsOnTheCallersRecord) {
+TEST_F(Session, CloseActsOnTheCallersRecord) {
     TextToBytes(rec.Serial_number, "A1");
     session.initMeter(rec);
-    for (auto [id, handle] : {std::pair{-1, 0}, {0x4003, 0x4003}}) {
-        std::int32_t h = 99;
-        session.meterFns().MeterRec.port.Id = id;
-        session.GetHandle(h);
-        EXPECT_EQ(h, handle) << id;
-    }
-    fake->does("GetInitializedFlag", [](FakeArgs& a) { a.ref<std::int16_t>() = a.rec->Error_code = 1; });
-    EXPECT_EQ(session.DevInitialised(), 1);
-    EXPECT_EQ(session.storedRecord().Error_code, 0);
-    // The same meter is the one with exactly the same serial number.
-    fake->does("vb_Chk4Meter", [](FakeArgs& a) { TextToBytes(a.rec->Serial_number, "a1"); });
-    EXPECT_FALSE(session.isSameMeterConnected());
-
     const std::uint32_t start = clock->tickCount();
     EXPECT_TRUE(session.MeterClose(rec));
     EXPECT_EQ(rec.Error_code, ME_QUIT);
