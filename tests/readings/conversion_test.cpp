@@ -87,6 +87,28 @@ TEST_F(Conversion, MealsAndCholesterolOfOneDateShareAGroup) {
     EXPECT_EQ(fns.unmatchedCount(), 1);
 }
 
+// A negative damaged count from the transport is none; a record the meter marks invalid is not
+// dated at all, so it is never counted twice (losing one record alone: the readings request's test).
+TEST_F(Conversion, DamagedCountsAreNeverNegativeNorDoubled) {
+    add(VX_REC_GLUCOSE, 1, [](auto& r) { r.reading = 100; });
+    sim::encodeBinaryDatalog(records, fns.binaryDatalog());
+    fns.binaryDatalog().corruptedCount = -3;
+    EXPECT_TRUE(fns.Fastmeterupload(results, oralMeds, insulins));
+    EXPECT_EQ(fns.corruptedCount(), 0);
+
+    METER_DATALOG& log = fns.recordDatalog();
+    for (int i = 0; i < 3; ++i) log.DataLog[i] = entry(1, 0), log.DataLog[i].D_Time = sim::secondsOf(2005, 6, i + 1);
+    log.DataLog[0].Valid = 1;
+    log.recordCount = 3;
+    log.ValidRecordCount = 2;
+    results = {};
+    sim::injectFault("convert_from_seconds", 1, ME_COM_ERROR, true);
+    EXPECT_FALSE(fns.NonFastmeterUpload(results));
+    sim::clearFaults();
+    EXPECT_EQ(std::tuple(fns.corruptedCount(), fns.unreadableCount(), fns.unreadableCode()),
+              std::tuple(1, 2, std::int16_t{ME_COM_ERROR}));
+}
+
 TEST_F(Conversion, MedicationOutsideTheNamesRaisesWithEarlierResultsKept) {
     add(VX_REC_GLUCOSE, 1, [](auto& r) { r.reading = 100; });
     add(VX_REC_ORAL_MEDICATION, 1, [](auto& r) { r.oralMedType = 3; });
