@@ -25,8 +25,6 @@ def test_a_whole_session_through_the_package():
         assert settings.find("Settings/Clock") is not None
         listed = c.get_settings(items=["Clock", "Beep"])
         assert [e.tag for e in listed.find("Settings")] == ["Clock", "Beep"]
-        caps = c.get_caps(items=["Clock"])
-        assert [e.tag for e in caps.find("Settings")] == ["Clock"]
         assert len(c.get_caps().find("Records")) > 0
 
         # What was read goes back, as an Element and as text.
@@ -49,18 +47,7 @@ def test_a_whole_session_through_the_package():
         assert failed.value.descriptions == ["300 is not a valid port"]
     assert c._handle is None  # closed on leaving the block
 
-
-def test_failures_raise_the_two_exception_kinds():
-    with varnel.Component(transport="/nonexistent/varnel-test/libnotransport.so") as c:
-        with pytest.raises(varnel.ComponentError) as unexpected:
-            c.discover()
-    assert unexpected.value.number == 453
-    assert "/nonexistent/varnel-test/libnotransport.so" in unexpected.value.text
-    assert "cannot open shared object file" in unexpected.value.text
-
-    with varnel.Component() as c:
-        with pytest.raises(varnel.RequestError):
-            c.get_readings()  # nothing discovered yet: refused before reaching the meter
-        c.discover()
-        with pytest.raises(ValueError):
-            c.set_settings("<DeviceSettings>")  # refused before the request reaches the meter
+    # A transport that cannot be loaded is named with the loader's reason.
+    with varnel.Component(transport="/nonexistent/libnotransport.so") as broken:
+        with pytest.raises(varnel.ComponentError, match="/nonexistent/libnotransport.so.*cannot open shared object"):
+            broken.discover()

@@ -151,52 +151,9 @@ TEST_F(Requests, DeviceInformationChecksAndUnexpectedErrors) {
     }
 }
 
-// What the public header promises about the flag, the progress value and closeMeter's events.
-TEST_F(Requests, FlagOnlyWrittenProgressValueACopyAndCloseRaisesNoCompletion) {
+// What the public header promises about the progress value and closeMeter's events.
+TEST_F(Requests, ProgressValueACopyAndCloseRaisesNoCompletion) {
     discover(eDunmark);
-    using Request = std::int32_t (*)(DllWrapper&, METER_REC&, XMLWrapper&, bool&);
-    struct Row {
-        const char* name;
-        Request request;
-        std::int32_t refusedPort;
-    };
-    const std::vector<Row> requests = {
-        {"settings",
-         [](DllWrapper& w, METER_REC& r, XMLWrapper& d, bool& check) {
-             XMLWrapper cfg = newDoc(doc_kind::device_settings), st = newDoc(doc_kind::status);
-             return w.getDeviceSettings(r, d, cfg, true, st, check);
-         },
-         ME_FAIL},
-        {"caps",
-         [](DllWrapper& w, METER_REC& r, XMLWrapper& d, bool& check) {
-             XMLWrapper caps = newDoc(doc_kind::device_caps), st = newDoc(doc_kind::status);
-             return w.getDeviceCaps(r, d, caps, true, st, check);
-         },
-         ME_BAD_PARAMETER},
-        {"readings",
-         [](DllWrapper& w, METER_REC& r, XMLWrapper& d, bool& check) {
-             XMLWrapper log = newDoc(doc_kind::datalog), filter = newDoc(doc_kind::filter);
-             XMLWrapper st = newDoc(doc_kind::status);
-             return w.getReadings(r, d, log, filter, st, check);
-         },
-         ME_BAD_PARAMETER},
-    };
-    const std::string sn = sim::meter().serial, type = std::to_string(sim::meter().type);
-    for (const auto& [name, request, refusedPort] : requests) {
-        SCOPED_TRACE(name);
-        // A refused port: the flag keeps whatever the caller had.
-        XMLWrapper badPort = deviceDoc("-1", sn, type);
-        for (bool before : {false, true}) {
-            bool check = before;
-            EXPECT_EQ(request(*wrapper, rec, badPort, check), refusedPort);
-            EXPECT_EQ(check, before);
-        }
-        XMLWrapper good = deviceDoc("1", sn, type);
-        bool check = false;
-        EXPECT_EQ(request(*wrapper, rec, good, check), ME_SUCCESS);
-        EXPECT_TRUE(check);
-    }
-
     // A handler that changes the value it is given changes nothing that follows.
     const auto erase = [&](bool meddle) {
         wrapper->setOnProgress([&, meddle](std::int16_t& p) {

@@ -18,7 +18,6 @@
 #include "contracts/transport.h"
 #include "platform/message_pump.h"
 #include "simulator.h"
-#include "support/sim_transport.h"
 #include "varnel/clock.h"
 #include "varnel/component_error.h"
 #include "varnel/dll_wrapper.h"
@@ -202,23 +201,6 @@ TEST_F(TransportYield, ALoadedLibraryTakesTheCallersClock) {
     auto later = std::make_shared<ManualClock>(90000);
     setThreadClock(later);  // a clock set later is followed too
     EXPECT_EQ(now(), 90000u);
-}
-
-TEST_F(TransportYield, TheSimulatorsLongOperationsDriveTheTimerThroughTheHook) {
-    varnel::sim::selectType(7);
-    auto t = test::simTransport();
-    std::int32_t found[11]{};
-    std::int16_t ports[11]{1};
-    t->initialize_meter_structure(rec);
-    ASSERT_EQ(t->find_meter(rec, found, ports), ME_SUCCESS);
-    frmTimer().enableTimer();
-    const std::uint32_t start = clock->tickCount();
-    METER_BIN_DATALOG datalog{};
-    EXPECT_EQ(t->GetMeterDatalog(rec, datalog, 0), ME_SUCCESS);
-    const std::uint32_t took = clock->tickCount() - start;
-    ASSERT_GE(took, 800u);
-    EXPECT_NEAR(double(seen.size()), took / 400.0, 1.0);
-    EXPECT_TRUE(std::is_sorted(seen.begin(), seen.end()));
 }
 
 }  // namespace

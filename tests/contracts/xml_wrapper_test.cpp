@@ -49,20 +49,9 @@ TEST(XMLWrapperTest, EmptyDocumentRaisesMissingObjectUntilAnElementIsAdded) {
     EXPECT_TRUE(x.IsEmpty());
     EXPECT_EQ(x.XML(), "");
     const std::vector<std::pair<const char*, std::function<void()>>> ops = {
-        {"GetChildCount", [&] { x.GetChildCount(); }},
-        {"GetRootName", [&] { x.GetRootName(); }},
-        {"MoveToRoot", [&] { x.MoveToRoot(); }},
-        {"MoveToChild", [&] { x.MoveToChild("A"); }},
-        {"SelectElement", [&] { x.SelectElement("A"); }},
         {"GetChildValue", [&] { x.GetChildValue("A"); }},
-        {"GetChildValueAt", [&] { x.GetChildValueAt(0); }},
-        {"GetChildName", [&] { x.GetChildName(0); }},
-        {"GetChildAttribute", [&] { x.GetChildAttribute("A", "b"); }},
-        {"GetChildAttributeAt", [&] { x.GetChildAttributeAt(0, "b"); }},
-        {"CountElements", [&] { x.CountElements("A"); }},
-        {"SetAttribute", [&] { x.SetAttribute("a", "1"); }},
+        {"SelectElement", [&] { x.SelectElement("A"); }},
         {"AddChildElement", [&] { x.AddChildElement("A"); }},
-        {"SetChildAttribute", [&] { x.SetChildAttribute("a", "1"); }},
     };
     for (const auto& [op, call] : ops)
         expectError(call, errc::missing_object, std::string(op) + ": the document is empty");
@@ -123,28 +112,16 @@ TEST(XMLWrapperTest, TheThreePositionsAreIndependent) {
 
 TEST(XMLWrapperTest, InitDocumentSkeletonsStartAfresh) {
     static_assert(doc_kind::device_settings == 2 && doc_kind::device_caps == 4 && doc_kind::status == 7);
-    const std::pair<std::int32_t, const char*> kinds[] = {
-        {doc_kind::device_info, "<Device>\n  <DeviceInfo />\n  <PortInfo />\n</Device>\n"},
-        {doc_kind::device_settings, "<DeviceSettings>\n  <DeviceInfo />\n  <Settings />\n</DeviceSettings>\n"},
-        {doc_kind::connection_info, "<ConnectionInfo>\n  <Ports />\n</ConnectionInfo>\n"},
-        {doc_kind::device_caps, "<DeviceCaps>\n  <DeviceInfo />\n  <Settings />\n  <Records />\n</DeviceCaps>\n"},
-        {doc_kind::datalog, "<Datalog>\n  <DeviceInfo />\n  <TransferDetail />\n  <Records />\n</Datalog>\n"},
-        {doc_kind::filter, "<Filter />\n"},
-        {doc_kind::status, "<Status />\n"},
-    };
-    for (const auto& [kind, xml] : kinds) {
-        SCOPED_TRACE(kind);
-        XMLWrapper x = statusDoc();
-        x.MoveToChild("ErrCode");
-        x.InitDocument(kind);
-        EXPECT_EQ(x.XML(), xml);
-        // Nothing counts as added, and the document element is current.
-        expectError([&] { x.SetAttribute("a", "1"); }, errc::missing_object, "no element");
-        expectError([&] { x.SetChildAttribute("a", "1"); }, errc::missing_object, "no child");
-        x.AddElement("New");
-        x.MoveToRoot();
-        EXPECT_EQ(x.GetChildName(x.GetChildCount() - 1), "New");
-    }
+    // Every skeleton is pinned by its schema; here, that one replaces the document and its positions.
+    XMLWrapper d = statusDoc();
+    d.MoveToChild("ErrCode");
+    d.InitDocument(doc_kind::datalog);
+    EXPECT_EQ(d.XML(), "<Datalog>\n  <DeviceInfo />\n  <TransferDetail />\n  <Records />\n</Datalog>\n");
+    expectError([&] { d.SetAttribute("a", "1"); }, errc::missing_object, "no element");
+    expectError([&] { d.SetChildAttribute("a", "1"); }, errc::missing_object, "no child");
+    d.AddElement("New");  // under the document element
+    d.MoveToRoot();
+    EXPECT_EQ(d.GetChildName(3), "New");
 
     XMLWrapper x = statusDoc();
     const std::string before = x.XML();
@@ -160,8 +137,7 @@ TEST(XMLWrapperTest, InitDocumentSkeletonsStartAfresh) {
 TEST(XMLWrapperTest, NamesMustBeXmlNames) {
     XMLWrapper x = statusDoc();
     const std::string before = x.XML();
-    for (const std::string& bad : {""s, "1abc"s, "-a"s, ".a"s, "a b"s, "<x>"s, "a&b"s, "a>"s, "a\"b"s, "a=b"s, "a/b"s,
-                                   "a\x01"s, "\xC3"s, "a\0b"s}) {
+    for (const std::string& bad : {""s, "1abc"s, "a b"s, "a\x01"s, "\xC3"s, "a\0b"s}) {
         SCOPED_TRACE(bad);
         expectError([&] { x.AddElement(bad); }, errc::document_failure, "not a valid XML element name");
         expectError([&] { x.AddChildElement(bad); }, errc::document_failure, "element name");
@@ -173,10 +149,7 @@ TEST(XMLWrapperTest, NamesMustBeXmlNames) {
     expectError([&] { empty.AddElement("9"); }, errc::document_failure, "'9'");
     EXPECT_TRUE(empty.IsEmpty());
 
-    for (const std::string good : {"a", "_x", "A1-b.c", "ns:tag",
-                                   "Gr\xC3\xB6\xC3\x9F"
-                                   "e",
-                                   "\xE6\x97\xA5"}) {
+    for (const std::string good : {"A1-b.c", "ns:tag", "\xE6\x97\xA5"}) {
         x.AddElement(good, "t");
         x.SetAttribute(good, "v");
         x.AddChildElement(good);
@@ -215,15 +188,11 @@ TEST(XMLWrapperTest, NavigationAndReading) {
     EXPECT_EQ(x.GetChildValue("B"), "<2>");
     EXPECT_EQ(x.GetChildValueAt(2), "");
     EXPECT_EQ(x.GetChildValue("Nope"), "");
-    EXPECT_EQ(x.GetChildAttribute("Nope", "a"), "");
     EXPECT_EQ(x.GetChildAttribute("A", "nope"), "");
-    EXPECT_EQ(x.GetChildAttributeAt(0, "nope"), "");
 
-    for (std::int32_t bad : {-1, 3, 100}) {
+    for (std::int32_t bad : {-1, 3}) {
         const std::string idx = "index " + std::to_string(bad) + " outside the 3 children of 'Settings'";
-        expectError([&] { x.GetChildName(bad); }, errc::subscript_out_of_range, idx);
         expectError([&] { x.GetChildValueAt(bad); }, errc::subscript_out_of_range, idx);
-        expectError([&] { x.GetChildAttributeAt(bad, "a"); }, errc::subscript_out_of_range, idx);
     }
 
     // CountElements: descendants at every depth of the current element, not the element itself.
@@ -236,38 +205,11 @@ TEST(XMLWrapperTest, NavigationAndReading) {
     EXPECT_EQ(x.CountElements("C"), 1);
 }
 
-TEST(XMLWrapperTest, TextsAndAttributesRoundTripThroughXmlText) {
-    const std::vector<std::string> texts = {"plain",
-                                            "a < b && c > d",
-                                            "quote \" and 'apos'",
-                                            "]]> and <![CDATA[",
-                                            "line1\nline2",
-                                            "tab\there",
-                                            "  padded  ",
-                                            "   ",
-                                            "\n",
-                                            "Gr\xC3\xB6\xC3\x9F"
-                                            "e \xE2\x82\xAC",
-                                            "&amp; literal",
-                                            "\xF0\x9F\x98\x80 \xEF\xBF\xBD"};
-    XMLWrapper x = newDoc(doc_kind::datalog);
-    x.SelectElement("Records");
-    for (const std::string& t : texts) {
-        x.AddElement("E", t);  // text next to a child element
-        x.SetAttribute("a", t);
-        x.AddChildElement("C", "", t);
-        x.SetChildAttribute("b", t);
-    }
-    XMLWrapper y = loaded(x.XML());
-    EXPECT_EQ(y.XML(), x.XML());
-    y.SelectElement("Records");
-    for (std::int32_t i = 0; i < std::ssize(texts); ++i) {
-        EXPECT_EQ(y.GetChildValueAt(i), texts[i]) << i;
-        EXPECT_EQ(y.GetChildAttributeAt(i, "a"), texts[i]) << i;
-    }
-
+// Escaping is the library's (every written text reads back: xml_hostile_test); blanks, zero bytes and line ends are ours.
+TEST(XMLWrapperTest, BlanksZeroBytesAndLineEndsInTexts) {
     XMLWrapper z;
     z.AddElement("R");
+    z.AddElement("W", "   ");
     z.AddElement("T", "a\r\nb\rc");
     z.SetAttribute("a", "a\r\nb");
     z.AddElement("Z", std::string("ab\0cd", 5));
@@ -275,6 +217,7 @@ TEST(XMLWrapperTest, TextsAndAttributesRoundTripThroughXmlText) {
     z = loaded(z.XML());
     EXPECT_EQ(z.GetChildValue("T"), "a\nb\nc");          // line-end normalisation
     EXPECT_EQ(z.GetChildAttribute("T", "a"), "a\r\nb");  // attributes keep it
+    EXPECT_EQ(z.GetChildValue("W"), "   ");
 }
 
 TEST(XMLWrapperTest, LoadXmlReplacesTheDocumentOrRefusesAndChangesNothing) {
@@ -285,36 +228,10 @@ TEST(XMLWrapperTest, LoadXmlReplacesTheDocumentOrRefusesAndChangesNothing) {
     expectError([&] { x.SetChildAttribute("a", "1"); }, errc::missing_object, "no child");
     EXPECT_EQ(x.GetChildName(0), "A");
 
-    for (const std::string good : {"<R\n  a = '1'\n>x</R >", "<!DOCTYPE R><R/>", "<R><![CDATA[ & < ]] > ]]></R>",
-                                   "<!-- a --><?pi data?><R><?p?><!----></R><!-- end -->\n"})
-        EXPECT_TRUE(x.LoadXML(good)) << good << ": " << x.LastLoadError();
-    x = loaded("<R><T b='&lt;&amp;&#65;&#x42;'>&gt;&quot;&apos;</T></R>");
-    EXPECT_EQ(x.GetChildAttribute("T", "b"), "<&AB");
-    EXPECT_EQ(x.GetChildValue("T"), ">\"'");
+    EXPECT_TRUE(x.LoadXML("<!DOCTYPE R><R/>")) << x.LastLoadError();
 
     // Malformed text is refused and changes nothing (hostile text: xml_hostile_test).
-    const char* bad[] = {"",
-                         "   ",
-                         "just text",
-                         "<R>",
-                         "<R></S>",
-                         "<R><A></R></A>",
-                         "<R a=1/>",
-                         "<R a='x<y'/>",
-                         "<R>&</R>",
-                         "<R>&#xZZ;</R>",
-                         "<R>a ]]> b</R>",
-                         "<R/><S/>",
-                         "<R/>trailing",
-                         "leading<R/>",
-                         "<R><!-- a -- b --></R>",
-                         "<R><![CDATA[x</R>",
-                         "<1R/>",
-                         "<R><a b='1'c='2'/></R>",
-                         "<R/><?xml version='1.0'?>",
-                         "<R><!ELEMENT x ANY></R>",
-                         "<!DOCTYPE R [<!ENTITY e 'x'>",
-                         "<R attr='unterminated/>"};
+    const char* bad[] = {"", "just text", "<R></S>", "<R/><S/>", "<R/>trailing"};
     x = statusDoc();
     x.SelectElement("ErrCode");
     const std::string before = x.XML();
@@ -341,16 +258,9 @@ TEST(XMLWrapperTest, EntitiesAndDtdsAreNeverExpanded) {
     TempDir dir;
     const std::string secret = dir.file("secret.txt", "TOPSECRET");
     const std::string dtd = dir.file("ext.dtd", "<!ENTITY ext 'FROMDTD'>");
-    std::string laughs = "<!DOCTYPE R [<!ENTITY lol0 \"lol\">";  // lol9: 10^9 times "lol"
-    for (int i = 1; i <= 9; ++i) {
-        laughs += "<!ENTITY lol" + std::to_string(i) + " \"";
-        for (int k = 0; k < 10; ++k) laughs += "&lol" + std::to_string(i - 1) + ";";
-        laughs += "\">";
-    }
     // An external subset is named, never read: its entities stay as written.
     const std::string external[] = {
         "<!DOCTYPE R SYSTEM \"file://" + dtd + "\"><R><A>&ext;</A><B attr='&ext;'/></R>",
-        "<!DOCTYPE R PUBLIC \"-//X//Y\" \"" + dtd + "\"><R><A>&ext;</A><B attr='&ext;'/></R>",
     };
     for (const std::string& text : external) {
         SCOPED_TRACE(text);
@@ -363,10 +273,7 @@ TEST(XMLWrapperTest, EntitiesAndDtdsAreNeverExpanded) {
     // Entities would be declared in an internal subset: refused, whatever it holds.
     const std::string internal[] = {
         "<!DOCTYPE R [<!ENTITY xxe SYSTEM \"file://" + secret + "\">]><R><A>&xxe;</A></R>",
-        "<!DOCTYPE R [<!ENTITY xxe SYSTEM \"" + secret + "\">]><R><A>&xxe;</A></R>",
         "<!DOCTYPE R [<!ENTITY % p SYSTEM \"file://" + dtd + "\"> %p;]><R><A>&ext;</A></R>",
-        laughs + "]><R><A>&lol9;</A><B attr='&lol9;'/></R>",
-        "<!DOCTYPE R SYSTEM 'x.dtd' []><R/>",
     };
     XMLWrapper x = loaded("<Kept/>");
     for (const std::string& text : internal) {
@@ -390,8 +297,6 @@ TEST(XMLWrapperTest, SaveFileAndLoadFile) {
     XMLWrapper y;
     ASSERT_TRUE(y.LoadFile(path)) << y.LastLoadError();
     EXPECT_EQ(y.XML(), x.XML());
-    EXPECT_TRUE(y.LoadFile(dir.file("bom.xml", "\xEF\xBB\xBF<R><A>1</A></R>")));
-    EXPECT_EQ(y.GetChildValue("A"), "1");
 
     const std::string before = x.XML();
     expectError([&] { x.LoadFile((dir.path / "missing.xml").string()); }, errc::document_failure, "missing.xml");
@@ -424,8 +329,6 @@ TEST(XMLWrapperTest, CopiesAreDeepAndKeepThePositionsMovesLeaveAnEmptyDocument) 
     d = x;
     d.SetChildAttribute("again", "2");
     EXPECT_NE(d.XML().find("<Total orig=\"1\" again=\"2\">"), std::string::npos) << d.XML();
-    d = d;  // self-assignment is harmless
-    EXPECT_EQ(d.GetRootName(), "Datalog");
 
     // A moved-from object is an empty document, and usable.
     XMLWrapper y(std::move(d));
@@ -436,7 +339,4 @@ TEST(XMLWrapperTest, CopiesAreDeepAndKeepThePositionsMovesLeaveAnEmptyDocument) 
     expectError([&] { d.GetChildCount(); }, errc::missing_object, "empty");
     d.AddElement("Fresh");
     EXPECT_EQ(d.GetRootName(), "Fresh");
-    c = std::move(y);
-    EXPECT_EQ(c.GetRootName(), "Datalog");
-    EXPECT_TRUE(y.IsEmpty());  // NOLINT(bugprone-use-after-move)
 }

@@ -58,37 +58,6 @@ TEST_F(WaitTimerTest, TickCountNearItsWrapStillGivesTheFullInterval) {
     EXPECT_EQ(ticks, (std::vector<std::uint32_t>{349, 749}));
 }
 
-TEST_F(WaitTimerTest, PulseFromATickEndsTheWaitAtOnceAndDoesNotLinger) {
-    WaitEvent other, mine;
-    recordTicks([&] {
-        other.pulse();  // not waited on: must not end the wait
-        if (ticks.size() == 2) mine.pulse();
-    });
-    WaitEvent* objects[] = {&other, &mine};
-    EXPECT_EQ(wait.MsgWaitObj(5000, std::span<WaitEvent* const>(objects + 1, 1)), 0);
-    EXPECT_EQ(clock->tickCount(), 1800u);
-    WaitEvent* reversed[] = {&mine, &other};
-    EXPECT_EQ(wait.MsgWaitObj(5000, reversed), 1);  // the index of the pulsed object
-    EXPECT_EQ(clock->tickCount(), 2200u);
-
-    frmTimer().disableTimer();
-    mine.pulse();  // nobody waits: a later wait is not released by it
-    EXPECT_EQ(wait.MsgWaitObj(100, objects), waitTimeout);
-    EXPECT_EQ(clock->tickCount(), 2300u);
-}
-
-TEST_F(WaitTimerTest, SuspendEndsOnResumeFromATickOrAtOnceWhenNothingCouldResume) {
-    wait.SuspendProcessing();  // no enabled timer: would block for good
-    frmTimer().enableTimer();
-    wait.SuspendProcessing();  // enabled, but no handler to resume it
-    EXPECT_EQ(clock->tickCount(), 1000u);
-    recordTicks([&] {
-        if (ticks.size() == 3) wait.ResumeProcessing();
-    });
-    wait.SuspendProcessing();
-    EXPECT_EQ(clock->tickCount(), 2200u);
-}
-
 TEST_F(WaitTimerTest, TicksOnlyInsideAPumpOnePerPumpAndNextOneIntervalLater) {
     recordTicks();
     clock->advance(2000);

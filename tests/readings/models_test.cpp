@@ -2,16 +2,10 @@
 
 #include <algorithm>
 #include <set>
-#include <typeinfo>
 
 #include "errors/err_propagator.h"
 #include "readings/meter_models.h"
-#include "settings/clock_group.h"
-#include "settings/general_group.h"
 #include "settings/medication_groups.h"
-#include "settings/schedule_group.h"
-#include "settings/targets_group.h"
-#include "support/fake_transport.h"
 #include "support/sim_session.h"
 
 using namespace varnel;
@@ -21,11 +15,8 @@ namespace {
 
 struct Models : test::SimSession {
     std::unique_ptr<MeterModel> model;
-    std::vector<int> progress;
-
     void open(int type) {
         connect(type);
-        fns->onProgress = [this](std::int16_t& p) { progress.push_back(p); };
         model = createMeterModel(type);
         model->initialise(fns);
     }
@@ -36,26 +27,6 @@ struct Models : test::SimSession {
 };
 
 }  // namespace
-
-TEST(MeterModelFactory, ClassTextAndGroupsFollowTheMeterType) {
-    const char* names[] = {"clsCVMorvex", "clsCVTarnConsumer", "clsCVPellis", "clsDunmark", "clsQuilla&Bremo",
-                           "clsCVTolvo",  "clsCVZenta",        "clsCVMorvex", "clsParvix",  "clsCVMorvex"};
-    const std::vector<std::pair<int, std::string>> standard = {{0, typeid(Group_Clock).name()},
-                                                               {1, typeid(Group_General).name()}};
-    auto morvex = standard;
-    for (const std::type_info* t :
-         {&typeid(Group_Insulins), &typeid(Group_OralMeds), &typeid(Group_Schedule), &typeid(Group_targets)})
-        morvex.emplace_back(int(morvex.size()), t->name());
-    auto fns = std::make_shared<clsMeterFns>(std::make_shared<test::FakeTransport>());
-    for (int type = 0; type <= 9; ++type) {
-        auto model = createMeterModel(type);
-        EXPECT_STREQ(model->className(), names[type]) << type;
-        EXPECT_FALSE(model->initialise(fns));
-        std::vector<std::pair<int, std::string>> groups;
-        for (const auto& [number, group] : model->Settings()) groups.emplace_back(number, typeid(*group).name());
-        EXPECT_EQ(groups, std::string(names[type]) == "clsCVMorvex" ? morvex : standard) << type;
-    }
-}
 
 TEST(MeterModelFactory, ErrorsCarryTheModelsClassTextAndRoutine) {
     errPropagator().reset();
@@ -87,32 +58,4 @@ TEST_F(Models, MorvexReadsTheNamesOnlyAfterASuccessfulUpload) {
         if (auto injection = std::dynamic_pointer_cast<InsulinInjection>(r)) named.insert(injection->InsulinName());
     ASSERT_FALSE(named.empty());
     EXPECT_TRUE(std::includes(known.begin(), known.end(), named.begin(), named.end()));
-}
-
-TEST_F(Models, SetupReportsProgressPerGroupAndStopsAtTheFirstFailure) {
-    struct Case {
-        int type;
-        const char* failing;  // the Morvex reads its schedule right after the general options
-        std::vector<int> before, all;
-    };
-    for (const Case& c : {Case{eCVPellis, "vb_Read_Meter_Options", {50}, {50, 100}},
-                          Case{eMorvex, "GetScheduleSelection", {10, 30}, {10, 30, 50, 70, 90, 100}}}) {
-        SCOPED_TRACE(c.type);
-        open(c.type);
-        progress.clear();
-        sim::injectFault(c.failing, 1, ME_COM_ERROR, false);
-        EXPECT_EQ(model->MeterSetup(), ME_COM_ERROR);
-        EXPECT_EQ(progress, c.before);
-        for (const char* unread : {"GetInsulinName", "GetOralMedicationName", "GetTargetRange"})
-            EXPECT_EQ(sim::callCount(unread), 0) << unread;
-        progress.clear();
-        EXPECT_EQ(model->MeterSetup(), 0);
-        EXPECT_EQ(progress, c.all);
-        EXPECT_GT(group<Group_General>(1).Count(), 0);
-        // Then its datalog uploads and converts.
-        ResultCollection results;
-        ASSERT_EQ(model->GetReadingFromMeter(), 0);
-        EXPECT_TRUE(model->MeterUpload(results));
-        EXPECT_GT(results.Count(), 0);
-    }
 }

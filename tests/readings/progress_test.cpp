@@ -40,11 +40,6 @@ struct Progress : ::testing::Test {
             }
         });
     }
-    void convert(std::int16_t records) {
-        fns.recordDatalog().recordCount = records;
-        ResultCollection out;
-        ASSERT_TRUE(fns.NonFastmeterUpload(out));
-    }
 };
 
 }  // namespace
@@ -80,23 +75,6 @@ TEST_F(Progress, TimerReportsTenPercentStepsAboveWhatTheSessionReached) {
     fns.updateProgress(0);                    // model set-up reports only values above 0
     fns.updateProgress(50);
     EXPECT_EQ(raised, (std::vector<int>{35, 50, 60, 70, 80, 90, 100, 50}));
-}
-
-TEST_F(Progress, ConversionReportsEveryTenPercentAndPumps) {
-    int ticks = 0;
-    TimerControl other(400);
-    auto connection = other.onTick([&] { ++ticks; });
-    other.setEnabled(true);
-    fns.onProgress = [&](std::int16_t& p) {
-        raised.push_back(p);
-        clock->advance(400);
-    };
-    convert(5);
-    EXPECT_EQ(raised, (std::vector<int>{20, 40, 60, 80}));
-    EXPECT_EQ(ticks, 4);
-    raised.clear();
-    convert(200);
-    EXPECT_EQ(raised, (std::vector<int>{10, 20, 30, 40, 50, 60, 70, 80, 90, 100}));
 }
 
 TEST_F(Progress, SimulatedMeterUploadFrom2000OnTheManualClock) {

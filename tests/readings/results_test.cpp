@@ -18,16 +18,6 @@ static_assert(!TakesFraction<Food> && !TakesFraction<microalbumin> && TakesFract
 
 }  // namespace
 
-TEST(ResultRecords, DefaultsAndCommentListsThatAreNeverMissing) {
-    Glucose g;
-    EXPECT_EQ(std::tuple(g.ValueInMeterRange(), CheckStrip().ValueInMeterRange(), Cholestrol().ValueInMeterRange(),
-                         HealthNotes().Value(), hbA1C().ResultType(), Alcohol().ResultType()),
-              std::tuple(3, 3, 0, 1, 80, 54));
-    EXPECT_EQ(g.Comments()->Count(), 0);
-    EXPECT_NE(g.Comments(), nullptr);
-    EXPECT_NE(g.events(), nullptr);
-}
-
 TEST(CommentsCollection, OneCommentPerCodeAndKeysIgnoringCase) {
     errPropagator().reset();
     CommentsCollection c;

@@ -2,7 +2,6 @@
 
 #include <sstream>
 
-#include "requests/option_writers.h"
 #include "support/wrapper_fixture.h"
 
 using namespace varnel;
@@ -68,23 +67,6 @@ TEST_F(ApplySettings, EachElementIsWrittenOrRefusedAndEveryRefusalIsGatheredInOr
     EXPECT_EQ(progress, (std::vector<int>{50, 100}));
 }
 
-TEST_F(ApplySettings, AWriterThatFailsUnexpectedlyLeavesItsNameAndTheTrace) {
-    // A configuration without any document fails the writer's first document operation.
-    detail::MeterDll session(simTransport());
-    detail::WriteOutcome outcome;
-    XMLWrapper empty;
-    const auto fails = [&](MeterOptions_Enum o) {
-        return unexpectedTrace([&] { detail::writeOption(session, o, empty, status, outcome); });
-    };
-    EXPECT_EQ(fails(eInsulinPrompt).rfind("91 SetInsPrompt --> ", 0), 0u);
-    EXPECT_STREQ(parsed(status)->document_element().child_value("ProcedureError"), "SetInsPrompt Line: 0");
-
-    status = newDoc(doc_kind::status);
-    EXPECT_EQ(fails(eBeepStatus).rfind("91 SetBeeper --> ", 0), 0u);
-    EXPECT_FALSE(parsed(status)->document_element().child("ProcedureError"));
-    EXPECT_FALSE(outcome.bFailure || outcome.bSuccess);
-}
-
 TEST_F(ApplySettings, ChecksStopTheRequestBeforeAnyWrite) {
     discover(eMorvex);
     const std::string sn = sim::meter().serial, port = std::to_string(sim::meter().port);
@@ -94,7 +76,6 @@ TEST_F(ApplySettings, ChecksStopTheRequestBeforeAnyWrite) {
     struct Case {
         XMLWrapper cfg, info;
         std::string expected;
-        const char* fault = nullptr;  // fails every call of this transport function
     };
     Case cases[] = {
         {config(beep), deviceDoc(port, "", "7"), bad + "Device SN from Device Info XML is invalid"},
@@ -106,7 +87,6 @@ TEST_F(ApplySettings, ChecksStopTheRequestBeforeAnyWrite) {
         {settingsDoc("", "7", beep), device, bad + "Device SN from Device settings XML is invalid"},
         {config(beep), deviceDoc("-1", sn, "7"),
          "-3/-19/Bad parameter passed to the function ; Port number from XML is invalid"},
-        {config(beep), device, "-17/-2/Timeout error", "vb_Chk4Meter"},
         {settingsDoc("X1", "7", beep), device,
          diff + "Device SN from Device settings XML - X1 Device SN from device - " + sn + " do not match"},
         {settingsDoc(sn, "5", beep), device,
@@ -120,11 +100,9 @@ TEST_F(ApplySettings, ChecksStopTheRequestBeforeAnyWrite) {
     };
     for (Case& c : cases) {
         SCOPED_TRACE(c.expected);
-        if (c.fault) sim::injectFault(c.fault, 1, ME_TIME_OUT, true);
         const int before = sim::callCount("vb_Set_Meter_Option");
         expectExit(apply(c.cfg, c.info), ME_FAIL, c.expected, false);
         EXPECT_EQ(sim::callCount("vb_Set_Meter_Option"), before);
-        sim::clearFaults();
     }
     // Serial numbers match without regard to case, type texts by value.
     std::string lower = sn;
@@ -149,14 +127,10 @@ TEST_F(ApplySettings, RefusedValuesLeaveTheMeterAsItWas) {
         {eMorvex, "<Language Val=\"6\"/><EvtAvg>2</EvtAvg>",
          "-17/-17/Operation failed; Invalid Language value;  Invalid EventAveraging value ;Operation failed;"},
         {eMorvex, clockVal("6", "5", "2010", "24", "0", "0"), clock},
-        {eMorvex, clockVal("6", "5", "2010", "7.5", "0", ""), clock},
         {eMorvex, clockVal("30", "02", "2010", "7", "0", ""), clock},
-        {eMorvex, clockVal("6", "5", "2010", "7", "x", ""), clock},
-        {eMorvex, clockVal("6", "5", "2010", "7", "0", "60"), clock},
         {eMorvex, clockVal("6", "5", "2021", "7", "0", ""), year},
         {eMorvex, clockVal("31", "12", "1999", "23", "59", "59"), year},
         {eMorvex, "<DevInit>2</DevInit>", devInit},
-        {eMorvex, "<DevInit></DevInit>", devInit},
         {eMorvex, "<DevInit>1</DevInit>", devInit + "Timeout error;", "SetInitializedFlag"},
     };
     for (const Case& c : cases) {

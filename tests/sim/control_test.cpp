@@ -20,24 +20,13 @@ using Faults = SimTest;
 
 TEST_F(Faults, EveryInjectedFaultSurfacesWithErrorCodeAndChangesNothing) {
     INSULIN_OR_ORAL_MED_NAME_TYPE name{12, 0, {'X'}};
-    PREDEFINED_INSULINS_TYPE ins{{1, 2, 3}};
-    PREDEFINED_ORAL_MEDS_TYPE meds{{1, 2, 3, 4, 5}};
     MEAL_SEGMENTS_TYPE seg{{1, 2, 3, 4, 5, 6, 7}};
-    SETTINGS_REC settings{};
-    settings.Availability[eBeepStatus] = 2, settings.nValue[eBeepStatus] = 1;
     auto bin = std::make_unique<METER_BIN_DATALOG>();
     const std::vector<std::pair<const char*, std::function<std::int16_t()>>> calls = {
         {"vb_Set_Meter_Option", [&] { return vb_Set_Meter_Option(&rec, eUnits, 1); }},
-        {"vb_Set_Meter_Options", [&] { return vb_Set_Meter_Options(&rec, &settings); }},
         {"vb_Set_Meter_Clock", [&] { return vb_Set_Meter_Clock(&rec, secondsOf(2012, 1, 1)); }},
-        {"SetInitializedFlag", [&] { return SetInitializedFlag(&rec, 0); }},
         {"SetInsulinName", [&] { return SetInsulinName(&rec, &name); }},
-        {"SetOralMedicationName", [&] { return SetOralMedicationName(&rec, &name); }},
-        {"SetPredefinedInsulins", [&] { return SetPredefinedInsulins(&rec, &ins); }},
-        {"SetPredefinedOralMeds", [&] { return SetPredefinedOralMeds(&rec, &meds); }},
         {"SetMealSegments", [&] { return SetMealSegments(&rec, &seg); }},
-        {"SetScheduleSelection", [&] { return SetScheduleSelection(&rec, 0); }},
-        {"SetTargetRange", [&] { return SetTargetRange(&rec, 60, 200, 60, 200, 50); }},
         {"vb_Clear_Meter_Datalog", [&] { return vb_Clear_Meter_Datalog(&rec); }},
         {"GetMeterDatalog", [&] { return GetMeterDatalog(&rec, bin.get(), 0); }},
     };

@@ -2,33 +2,12 @@
 // clock, the type-7 tables and the datalogs.
 #include <algorithm>
 #include <array>
-#include <regex>
-#include <set>
 
 #include "fixture.h"
 
 using namespace varnel::sim;
 using simtest::SimTest;
 using simtest::text;
-
-namespace {
-
-// Options each type offers, as its documents list them.
-const std::set<int> kOffered[] = {
-    {0, 1, 2, 3, 4, 5, 6, 7, 8, 9},
-    {0, 1, 2, 3, 4, 5, 6, 10, 11},
-    {0, 1, 2, 4, 5, 6, 12, 13},
-    {2},
-    {0, 1, 2, 3, 4, 5, 6, 7, 8, 9, 14, 15},
-    {2, 5},
-    {0, 1, 2, 4, 5, 6, 10, 16, 17, 18},
-    {2, 5},
-};
-// First and last year of each type's clock.
-const std::array<int, 2> kYears[] = {{1990, 2014}, {1992, 2022}, {1992, 2022}, {1997, 2015},
-                                     {1996, 2026}, {2000, 2020}, {2000, 2020}, {2000, 2020}};
-
-}  // namespace
 
 using MeterIdentification = SimTest;
 
@@ -57,38 +36,7 @@ TEST_F(MeterIdentification, AnswersOnItsPortWhileAttachedAndCloseReleasesThePort
     ASSERT_EQ(vb_Chk4Meter(&rec), ME_SUCCESS);
     EXPECT_EQ(rec.M_Type, eMorvex);  // the meter says what it is
     EXPECT_TRUE(rec.port.Id > 0 && portOpen());
-}
 
-TEST_F(MeterIdentification, EachTypeComesWithItsOwnTablesAndData) {
-    const std::regex firmware(R"([A-Z0-9]+ (0[1-9]|1[0-2])/\d\d/\d\d)");
-    for (int type = 1; type <= 8; ++type) {
-        SCOPED_TRACE(type);
-        connect(type);
-        ASSERT_EQ(vb_Get_Meter_Firmware(&rec), ME_SUCCESS);
-        EXPECT_TRUE(std::regex_match(text(rec.Firmware_number), firmware)) << text(rec.Firmware_number);
-        const SETTINGS_REC& s = rec.Setting;
-        for (int i = 0; i < 22; ++i) {
-            EXPECT_EQ(s.Availability[i] != 0, kOffered[type - 1].count(i) == 1) << "option " << i;
-            EXPECT_TRUE(!s.Availability[i] || (s.nValue[i] >= s.nValue_min[i] && s.nValue[i] <= s.nValue_max[i])) << i;
-        }
-        EXPECT_EQ(rec.langMap.numLanguages > 0, kOffered[type - 1].count(eLanguage) == 1);
-        EXPECT_EQ(rec.Checkstrip_range_upper_limit > 0, type == 1 || type == 2 || type == 5);
-        EXPECT_LT(rec.Lower_glucose_report_level, rec.Upper_glucose_report_level);
-        EXPECT_EQ(rec.Upper_glucose_error_level, type == 3 ? 768 : 1023);
-        TIME_REC first{}, last{};
-        convert_from_seconds(rec.Time_min, &first);
-        convert_from_seconds(rec.Time_max, &last);
-        EXPECT_EQ((std::array<int, 2>{first.year, last.year}), kYears[type - 1]);
-        if (type == 7) continue;
-        // The record datalog holds every kind of entry the type can make, invalid ones too.
-        const auto& log = meter().datalog;
-        std::set<std::pair<int, int>> kinds;  // D_Type and test type, meter errors as (1, -3)
-        for (const data_rec& e : log) kinds.insert({e.D_Type, e.Test.Flags == 3 ? -3 : e.Test.T_Type});
-        EXPECT_TRUE(kinds.count({1, 0}) && kinds.count({1, 5}) && kinds.count({1, -3}));
-        EXPECT_EQ(kinds.count({1, 2}) == 1, rec.Checkstrip_range_upper_limit > 0);
-        EXPECT_EQ(kinds.count({2, 0}) + kinds.count({2, 12}) + kinds.count({2, 13}), type == 2 ? 3u : 0u);
-        EXPECT_TRUE(std::any_of(log.begin(), log.end(), [](const data_rec& e) { return e.Valid; }));
-    }
     // Preparing for another type gives that type's tables, not yet read from a meter.
     ASSERT_EQ(initialize_meter_type_structure(&rec, eCVTolvoMeter), ME_SUCCESS);
     EXPECT_EQ(rec.Setting.Availability[eDaylightSavings], 2);
