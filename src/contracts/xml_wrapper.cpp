@@ -177,8 +177,20 @@ std::string_view checkedText(const char* op, const char* what, std::string_view 
     return v;
 }
 
+// Nearly every name is ASCII, and the documents use a few dozen constant ones:
+// those are told apart without decoding. Anything else takes the full check.
+bool isAsciiXmlName(const std::string& name) {
+    auto start = [](unsigned char c) { return (c | 0x20) >= 'a' && (c | 0x20) <= 'z' ? true : c == '_' || c == ':'; };
+    if (name.empty() || !start(static_cast<unsigned char>(name[0]))) return false;
+    for (std::size_t i = 1; i < name.size(); ++i) {
+        const auto c = static_cast<unsigned char>(name[i]);
+        if (!start(c) && !(c >= '0' && c <= '9') && c != '-' && c != '.') return false;
+    }
+    return true;
+}
+
 void checkName(const char* op, const std::string& name, const char* what) {
-    if (!detail::isXmlName(name))
+    if (!isAsciiXmlName(name) && !detail::isXmlName(name))
         raise(errc::document_failure, std::string(op) + ": " + quote(name) + " is not a valid XML " + what + " name");
 }
 

@@ -184,6 +184,9 @@ public:
     // Reading either list while it holds none starts a new, empty one.
     std::shared_ptr<CommentsCollection> Comments() const { return held(comments_); }
     std::shared_ptr<CommentsCollection> events() const { return held(events_); }
+    // The lists as they are, starting none: most readings carry no comment at all.
+    const CommentsCollection& commentsSeen() const { return comments_ ? *comments_ : kNone; }
+    const CommentsCollection& eventsSeen() const { return events_ ? *events_ : kNone; }
 
 private:
     static std::shared_ptr<CommentsCollection> held(std::shared_ptr<CommentsCollection>& list) {
@@ -191,8 +194,10 @@ private:
         return list;
     }
 
+    static inline const CommentsCollection kNone{};
+
     std::int32_t calibration_ = 0;
-    mutable std::shared_ptr<CommentsCollection> comments_ = std::make_shared<CommentsCollection>();
+    mutable std::shared_ptr<CommentsCollection> comments_;
     mutable std::shared_ptr<CommentsCollection> events_;
 };
 

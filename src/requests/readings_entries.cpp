@@ -84,8 +84,9 @@ const char* rangeText(std::int32_t valueInMeterRange) {
     return valueInMeterRange == 1 ? "High" : valueInMeterRange == 2 ? "Low" : nullptr;
 }
 
-constexpr const char* kMealSlotTexts[] = {"Before Breakfast", "After Breakfast", "Before Lunch", "After Lunch",
-                                          "Before Dinner",    "After Dinner",    "Night",        "Sleep"};
+// Made once: "Before Breakfast" is too long to be made per entry without the heap.
+const std::string kMealSlotTexts[] = {"Before Breakfast", "After Breakfast", "Before Lunch", "After Lunch",
+                                      "Before Dinner",    "After Dinner",    "Night",        "Sleep"};
 
 void mealSlot(Entry& e, std::int32_t slot, bool glucose) {
     if (slot < 1 || slot > 8) return;
@@ -130,20 +131,20 @@ const CommentElement* commentElement(std::int32_t id) {
 void comments(Entry& e, const Glucose& g) {
     // Meters of types 6 and 8 show no comments in the datalog.
     if (e.context.storedMeterType == 6 || e.context.storedMeterType == 8) return;
-    auto list = g.Comments();
-    auto events = g.events();
+    const CommentsCollection& list = g.commentsSeen();
+    const CommentsCollection& events = g.eventsSeen();
     // Any real comment counts, not just the first: a leading code 0 must not hide the rest.
-    bool any = events->Count() > 0;
-    for (const CommentPtr& c : *list) any = any || c->Id() != 0;
+    bool any = events.Count() > 0;
+    for (const CommentPtr& c : list) any = any || c->Id() != 0;
     if (!any) return;
     e.child("Comments");
-    for (const CommentPtr& c : *list) {
+    for (const CommentPtr& c : list) {
         const CommentElement* el = commentElement(c->Id());
         if (!el) continue;
         e.child(el->element, el->text ? el->text : "", "Comments");
         if (el->txt) e.childAttr("Txt", el->txt);
     }
-    for (const CommentPtr& c : *events) {
+    for (const CommentPtr& c : events) {
         e.child("Event", NumberText(c->Id()), "Comments");
         e.childAttr("Txt", "EVENT" + NumberText(c->Id()));
     }
@@ -392,6 +393,7 @@ Result& asResult(const ResultPtr& p) {
 }  // namespace
 
 bool ProcessCommentsAsPerDeviceType(Glucose& result, std::int16_t deviceType) {
+    if (result.commentsSeen().Count() == 0) return true;
     auto list = result.Comments();
     for (std::int32_t i = 1; i <= list->Count();) {
         const std::int32_t id = list->Item(i)->Id();
@@ -437,6 +439,7 @@ void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryC
         k.write(e, first);
         if (k.value) k.value(e, first, first);
 
+        if (k.merge.most == 0) continue;
         checker.Clear();
         checker.AddValue(NumberText(first.ResultType()));
         for (int absorbed = 0; absorbed < k.merge.most && i < count; ++absorbed) {
