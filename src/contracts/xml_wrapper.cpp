@@ -24,6 +24,7 @@
 // in order costs one step each instead of a walk from the first child.
 #include "varnel/xml_wrapper.h"
 
+#include <array>
 #include <cstddef>
 #include <cstdio>
 #include <deque>
@@ -35,6 +36,7 @@
 #include <vector>
 
 #include "contracts/xml_index_steps.h"
+#include "contracts/xml_wrapper_append.h"
 #include "varnel/component_error.h"
 #include "xmlcheck/xml_check.h"
 
@@ -169,17 +171,17 @@ std::string sizeLimitText() { return std::to_string(kXmlMaxBytes >> 20) + " MiB"
 
 // A caller's text as it goes into the document: up to its first zero byte,
 // UTF-8 made of XML characters.
-std::string_view checkedText(const char* op, const char* what, std::string_view owner, const std::string& text) {
-    const std::string_view v(text.c_str());
-    const std::string problem = detail::xmlTextProblem(v);
-    if (!problem.empty())
-        raise(errc::document_failure, std::string(op) + ": the " + what + " for " + quote(owner) + " has " + problem);
+std::string_view checkedText(const char* op, const char* what, std::string_view owner, std::string_view text) {
+    const std::string_view v = text.substr(0, text.find('\0'));
+    if (detail::findBadXmlChar(v) != v.size())
+        raise(errc::document_failure,
+              std::string(op) + ": the " + what + " for " + quote(owner) + " has " + detail::xmlTextProblem(v));
     return v;
 }
 
 // Nearly every name is ASCII, and the documents use a few dozen constant ones:
 // those are told apart without decoding. Anything else takes the full check.
-bool isAsciiXmlName(const std::string& name) {
+bool isAsciiXmlName(std::string_view name) {
     auto start = [](unsigned char c) { return (c | 0x20) >= 'a' && (c | 0x20) <= 'z' ? true : c == '_' || c == ':'; };
     if (name.empty() || !start(static_cast<unsigned char>(name[0]))) return false;
     for (std::size_t i = 1; i < name.size(); ++i) {
@@ -189,9 +191,32 @@ bool isAsciiXmlName(const std::string& name) {
     return true;
 }
 
-void checkName(const char* op, const std::string& name, const char* what) {
-    if (!isAsciiXmlName(name) && !detail::isXmlName(name))
-        raise(errc::document_failure, std::string(op) + ": " + quote(name) + " is not a valid XML " + what + " name");
+// A name as an operation takes it: a caller's text, or a writer's constant
+// (a string literal or a static table entry, so its address names it for good).
+struct Name {
+    std::string_view text;  // zero-terminated
+    bool constant = false;
+    Name(const std::string& s) : text(s) {}
+    Name(const char* s, bool isConstant) : text(s), constant(isConstant) {}
+    const char* c_str() const { return text.data(); }
+};
+
+// Constants seen valid, by address: each is checked once, not on every call.
+bool knownConstant(const char* name) {
+    static std::array<const char*, 256> seen{};
+    const char*& slot = seen[(reinterpret_cast<std::uintptr_t>(name) >> 2) % seen.size()];
+    if (slot == name) return true;
+    if (!isAsciiXmlName(name) && !detail::isXmlName(name)) return false;
+    slot = name;
+    return true;
+}
+
+void checkName(const char* op, const Name& name, const char* what) {
+    const bool valid = name.constant ? knownConstant(name.c_str())
+                                     : isAsciiXmlName(name.text) || detail::isXmlName(name.text);
+    if (!valid)
+        raise(errc::document_failure,
+              std::string(op) + ": " + quote(name.text) + " is not a valid XML " + what + " name");
 }
 
 // Positions of a node as offsets among its parent's children, from the document down.
@@ -248,6 +273,36 @@ struct XMLWrapper::Impl {
     };
     mutable Cursor cursor;
 
+    // The elements added last, each with a mask of the attribute names set on
+    // it since (a bit per name hash). An element starts with no attribute, so a
+    // name whose bit is clear is new and needs no lookup before it is appended;
+    // the writers set several attributes on each element they add.
+    // Their depth is kept too, so appending below one needs no walk up the tree.
+    struct Fresh {
+        const void* node = nullptr;
+        std::size_t depth = 0;
+        std::uint64_t names = 0;
+    };
+    std::array<Fresh, 4> fresh;
+    std::size_t nextFresh = 0;
+
+    static std::uint64_t nameBit(std::string_view name) {
+        const std::size_t h = name.size() * 31 + static_cast<unsigned char>(name.front()) * 7 +
+                              static_cast<unsigned char>(name.back());
+        return std::uint64_t(1) << (h % 64);
+    }
+    Fresh* freshOf(pugi::xml_node element) {
+        const void* key = element.internal_object();
+        for (Fresh& f : fresh)
+            if (f.node == key) return &f;
+        return nullptr;
+    }
+    std::size_t depthOfParent(pugi::xml_node parent) {
+        if (!parent) return 0;
+        const Fresh* f = freshOf(parent);
+        return f ? f->depth : depthOf(parent);
+    }
+
     Impl() = default;
     Impl(const Impl& other) : lastLoadError(other.lastLoadError), size(other.size) {
         doc.reset(other.doc);
@@ -265,6 +320,7 @@ struct XMLWrapper::Impl {
         lastAdded = pugi::xml_node();
         lastChild = pugi::xml_node();
         cursor = Cursor{};
+        fresh = {};
     }
 
     // The current element; raises missing_object for an empty document.
@@ -324,15 +380,15 @@ struct XMLWrapper::Impl {
     }
 
     // Appends element `name` with `text` under `parent`; checks everything first.
-    pugi::xml_node append(const char* op, pugi::xml_node parent, const std::string& name, const std::string& text) {
+    pugi::xml_node append(const char* op, pugi::xml_node parent, const Name& name, std::string_view text) {
         checkName(op, name, "element");
-        const std::string_view value = checkedText(op, "text", name, text);
-        const std::size_t depth = parent ? depthOf(parent) + 1 : 1;
+        const std::string_view value = checkedText(op, "text", name.text, text);
+        const std::size_t depth = depthOfParent(parent) + 1;
         if (depth > kXmlMaxDepth)
-            raise(errc::document_failure, std::string(op) + ": " + quote(name) + " would be nested deeper than " +
+            raise(errc::document_failure, std::string(op) + ": " + quote(name.text) + " would be nested deeper than " +
                                               std::to_string(kXmlMaxDepth) + " levels");
         const bool blank = !value.empty() && value.find_first_not_of(" \t\r\n") == std::string_view::npos;
-        const std::size_t more = elementSize(name, depth) + (blank ? cdataSize(value) : textSize(value));
+        const std::size_t more = elementSize(name.text, depth) + (blank ? cdataSize(value) : textSize(value));
         reserve(op, more);
         pugi::xml_node n = allocated(op, (parent ? parent : pugi::xml_node(doc)).append_child(name.c_str()));
         cursor = Cursor{};
@@ -340,28 +396,95 @@ struct XMLWrapper::Impl {
         // text it would be taken for indentation when read back next to child
         // elements, and dropped.
         if (!value.empty()) {
-            const bool stored = blank ? allocated(op, n.append_child(pugi::node_cdata)).set_value(value.data())
-                                      : n.text().set(value.data());
+            const bool stored =
+                blank ? allocated(op, n.append_child(pugi::node_cdata)).set_value(value.data(), value.size())
+                      : n.text().set(value.data(), value.size());
             if (!stored) {
                 n.parent().remove_child(n);
                 raise(errc::internal, std::string(op) + ": out of memory");
             }
         }
         size += more;
+        fresh[nextFresh++ % fresh.size()] = Fresh{n.internal_object(), depth, 0};
         return n;
     }
 
     // Sets attribute `name` to `value` on `element`; checks everything first.
-    void setAttribute(const char* op, pugi::xml_node element, const std::string& name, const std::string& value) {
+    void setAttribute(const char* op, pugi::xml_node element, const Name& name, std::string_view value) {
         checkName(op, name, "attribute");
-        const std::string_view v = checkedText(op, "value", name, value);
-        pugi::xml_attribute a = element.attribute(name.c_str());
-        const std::size_t less = a ? attributeSize(name, a.value()) : 0;
-        const std::size_t more = attributeSize(name, v);
+        const std::string_view v = checkedText(op, "value", name.text, value);
+        const std::uint64_t bit = nameBit(name.text);
+        Fresh* f = freshOf(element);
+        pugi::xml_attribute a = f && (f->names & bit) == 0 ? pugi::xml_attribute() : element.attribute(name.c_str());
+        const std::size_t less = a ? attributeSize(name.text, a.value()) : 0;
+        const std::size_t more = attributeSize(name.text, v);
         reserve(op, more, less);
-        if (!a) a = element.append_attribute(name.c_str());
-        if (!a || !a.set_value(v.data())) raise(errc::internal, std::string(op) + ": out of memory");
+        const bool added = !a;
+        if (added) a = element.append_attribute(name.c_str());
+        if (!a) raise(errc::internal, std::string(op) + ": out of memory");
+        if (f) f->names |= bit;
+        if (!a.set_value(v.data(), v.size())) {
+            if (added) element.remove_attribute(a);
+            raise(errc::internal, std::string(op) + ": out of memory");
+        }
         size = size - less + more;
+    }
+
+    // The four building operations, for XMLWrapper's members and for XmlAppender.
+
+    void addElement(const Name& name, std::string_view text) {
+        Impl& d = *this;
+        if (!d.root()) {
+            d.current = d.lastAdded = d.append("AddElement", {}, name, text);
+        } else {
+            d.lastAdded = d.append("AddElement", d.current, name, text);
+        }
+    }
+
+    void setLastAttribute(const Name& name, std::string_view value) {
+        Impl& d = *this;
+        d.cur("SetAttribute");
+        if (!d.lastAdded) raise(errc::missing_object, "SetAttribute: no element has been added");
+        d.setAttribute("SetAttribute", d.lastAdded, name, value);
+    }
+
+    void addChildElement(const Name& name, std::string_view parentName, std::string_view text) {
+        Impl& d = *this;
+        d.cur("AddChildElement");
+        if (!d.lastAdded) raise(errc::missing_object, "AddChildElement: no element has been added");
+        checkName("AddChildElement", name, "element");
+        pugi::xml_node parent = d.lastAdded;
+        if (!parentName.empty()) {
+            // The last direct child of that name, found from the end.
+            pugi::xml_node found = d.lastAdded.last_child();
+            while (found && !(isElement(found) && parentName == found.name())) found = found.previous_sibling();
+            if (!found) {
+                // Deeper: the last element of that name below, in document order.
+                struct Last : pugi::xml_tree_walker {
+                    std::string_view name;
+                    pugi::xml_node hit;
+                    bool for_each(pugi::xml_node& n) override {
+                        if (isElement(n) && name == n.name()) hit = n;
+                        return true;
+                    }
+                } walker;
+                walker.name = parentName;
+                d.lastAdded.traverse(walker);
+                found = walker.hit;
+            }
+            if (!found)
+                raise(errc::missing_object,
+                      "AddChildElement: no element " + quote(parentName) + " below " + quote(d.lastAdded.name()));
+            parent = found;
+        }
+        d.lastChild = d.append("AddChildElement", parent, name, text);
+    }
+
+    void setChildAttribute(const Name& name, std::string_view value) {
+        Impl& d = *this;
+        d.cur("SetChildAttribute");
+        if (!d.lastChild) raise(errc::missing_object, "SetChildAttribute: no child element has been added");
+        d.setAttribute("SetChildAttribute", d.lastChild, name, value);
     }
 
     // Builds a document from `text`; on success replaces ours and returns true.
@@ -423,15 +546,28 @@ const XMLWrapper::Impl& XMLWrapper::view() const {
 }
 
 void XMLWrapper::AddElement(const std::string& name, const std::string& text) {
-    shielded("AddElement", [&] {
-        Impl& d = edit();
-        if (!d.root()) {
-            d.current = d.lastAdded = d.append("AddElement", {}, name, text);
-        } else {
-            d.lastAdded = d.append("AddElement", d.current, name, text);
-        }
-    });
+    shielded("AddElement", [&] { edit().addElement(name, text); });
 }
+
+namespace detail {
+
+void XmlAppender::addElement(const char* name, std::string_view text) {
+    shielded("AddElement", [&] { doc_.edit().addElement(Name(name, true), text); });
+}
+
+void XmlAppender::setAttribute(const char* name, std::string_view value) {
+    shielded("SetAttribute", [&] { doc_.edit().setLastAttribute(Name(name, true), value); });
+}
+
+void XmlAppender::addChildElement(const char* name, const char* parentName, std::string_view text) {
+    shielded("AddChildElement", [&] { doc_.edit().addChildElement(Name(name, true), parentName, text); });
+}
+
+void XmlAppender::setChildAttribute(const char* name, std::string_view value) {
+    shielded("SetChildAttribute", [&] { doc_.edit().setChildAttribute(Name(name, true), value); });
+}
+
+}  // namespace detail
 
 std::int32_t XMLWrapper::GetChildCount() const {
     return shielded("GetChildCount", [&] {
@@ -441,46 +577,11 @@ std::int32_t XMLWrapper::GetChildCount() const {
 }
 
 void XMLWrapper::SetAttribute(const std::string& name, const std::string& value) {
-    shielded("SetAttribute", [&] {
-        Impl& d = edit();
-        d.cur("SetAttribute");
-        if (!d.lastAdded) raise(errc::missing_object, "SetAttribute: no element has been added");
-        d.setAttribute("SetAttribute", d.lastAdded, name, value);
-    });
+    shielded("SetAttribute", [&] { edit().setLastAttribute(name, value); });
 }
 
 void XMLWrapper::AddChildElement(const std::string& name, const std::string& parentName, const std::string& text) {
-    shielded("AddChildElement", [&] {
-        Impl& d = edit();
-        d.cur("AddChildElement");
-        if (!d.lastAdded) raise(errc::missing_object, "AddChildElement: no element has been added");
-        checkName("AddChildElement", name, "element");
-        pugi::xml_node parent = d.lastAdded;
-        if (!parentName.empty()) {
-            // The last direct child of that name, found from the end.
-            pugi::xml_node found = d.lastAdded.last_child();
-            while (found && !(isElement(found) && parentName == found.name())) found = found.previous_sibling();
-            if (!found) {
-                // Deeper: the last element of that name below, in document order.
-                struct Last : pugi::xml_tree_walker {
-                    const std::string* name;
-                    pugi::xml_node hit;
-                    bool for_each(pugi::xml_node& n) override {
-                        if (isElement(n) && *name == n.name()) hit = n;
-                        return true;
-                    }
-                } walker;
-                walker.name = &parentName;
-                d.lastAdded.traverse(walker);
-                found = walker.hit;
-            }
-            if (!found)
-                raise(errc::missing_object,
-                      "AddChildElement: no element " + quote(parentName) + " below " + quote(d.lastAdded.name()));
-            parent = found;
-        }
-        d.lastChild = d.append("AddChildElement", parent, name, text);
-    });
+    shielded("AddChildElement", [&] { edit().addChildElement(name, parentName, text); });
 }
 
 void XMLWrapper::MoveToRoot() {
@@ -556,8 +657,8 @@ void XMLWrapper::InitDocument(std::int32_t kind) {
         d.size = 0;
         d.resetPositions();
         if (s->root) {
-            pugi::xml_node r = d.append("InitDocument", {}, s->root, "");
-            for (const char* c : s->children) d.append("InitDocument", r, c, "");
+            pugi::xml_node r = d.append("InitDocument", {}, Name(s->root, true), "");
+            for (const char* c : s->children) d.append("InitDocument", r, Name(c, true), "");
         }
         d.resetPositions();
     });
@@ -581,12 +682,7 @@ std::int32_t XMLWrapper::CountElements(const std::string& name) const {
 }
 
 void XMLWrapper::SetChildAttribute(const std::string& name, const std::string& value) {
-    shielded("SetChildAttribute", [&] {
-        Impl& d = edit();
-        d.cur("SetChildAttribute");
-        if (!d.lastChild) raise(errc::missing_object, "SetChildAttribute: no child element has been added");
-        d.setAttribute("SetChildAttribute", d.lastChild, name, value);
-    });
+    shielded("SetChildAttribute", [&] { edit().setChildAttribute(name, value); });
 }
 
 void XMLWrapper::SelectElement(const std::string& name) {

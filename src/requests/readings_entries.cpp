@@ -8,7 +8,9 @@
 #include <concepts>
 #include <cstdio>
 #include <string>
+#include <string_view>
 
+#include "contracts/xml_wrapper_append.h"
 #include "errors/err_propagator.h"
 #include "requests/document_values.h"
 
@@ -49,15 +51,16 @@ const Coded* lookup(const Coded (&table)[N], std::int32_t type) {
 }
 
 // Writes into the entry element just added under Records.
+// Every name is a constant of this file.
 struct Entry {
-    XMLWrapper& doc;
+    XmlAppender doc;
     const EntryContext& context;
 
-    void attr(const char* name, const std::string& value) { doc.SetAttribute(name, value); }
-    void child(const char* name, const std::string& text = "", const char* parent = "") {
-        doc.AddChildElement(name, parent, text);
+    void attr(const char* name, std::string_view value) { doc.setAttribute(name, value); }
+    void child(const char* name, std::string_view text = {}, const char* parent = "") {
+        doc.addChildElement(name, parent, text);
     }
-    void childAttr(const char* name, const std::string& value) { doc.SetChildAttribute(name, value); }
+    void childAttr(const char* name, std::string_view value) { doc.setChildAttribute(name, value); }
     // Ord: only the binary-datalog meter numbers its entries.
     void ord(const Result& r) {
         if (context.storedMeterType == 7) attr("Ord", NumberText(r.Ordinal()));
@@ -84,9 +87,8 @@ const char* rangeText(std::int32_t valueInMeterRange) {
     return valueInMeterRange == 1 ? "High" : valueInMeterRange == 2 ? "Low" : nullptr;
 }
 
-// Made once: "Before Breakfast" is too long to be made per entry without the heap.
-const std::string kMealSlotTexts[] = {"Before Breakfast", "After Breakfast", "Before Lunch", "After Lunch",
-                                      "Before Dinner",    "After Dinner",    "Night",        "Sleep"};
+constexpr const char* kMealSlotTexts[] = {"Before Breakfast", "After Breakfast", "Before Lunch", "After Lunch",
+                                          "Before Dinner",    "After Dinner",    "Night",        "Sleep"};
 
 void mealSlot(Entry& e, std::int32_t slot, bool glucose) {
     if (slot < 1 || slot > 8) return;
@@ -141,7 +143,7 @@ void comments(Entry& e, const Glucose& g) {
     for (const CommentPtr& c : list) {
         const CommentElement* el = commentElement(c->Id());
         if (!el) continue;
-        e.child(el->element, el->text ? el->text : "", "Comments");
+        e.child(el->element, el->text ? el->text : std::string_view(), "Comments");
         if (el->txt) e.childAttr("Txt", el->txt);
     }
     for (const CommentPtr& c : events) {
@@ -417,7 +419,7 @@ bool ProcessCommentsAsPerDeviceType(Glucose& result, std::int16_t deviceType) {
 
 void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryContext& context,
                           UniqueChecker& checker) {
-    Entry e{datalog, context};
+    Entry e{XmlAppender(datalog), context};
     const std::int32_t count = results.Count();
     for (std::int32_t i = 1; i <= count; ++i) {
         const ResultPtr item = results.Item(i);
@@ -432,7 +434,7 @@ void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryC
             context.cholesUnitWritten = true;
         }
 
-        datalog.AddElement(elementName(k, first));
+        e.doc.addElement(elementName(k, first));
         for (const char* flag : k.flags)
             if (flag) e.attr(flag, kTrue);
         dateAttributes(e, first.DateTime());
