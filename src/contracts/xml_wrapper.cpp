@@ -171,7 +171,19 @@ std::string sizeLimitText() { return std::to_string(kXmlMaxBytes >> 20) + " MiB"
 
 // A caller's text as it goes into the document: up to its first zero byte,
 // UTF-8 made of XML characters.
-std::string_view checkedText(const char* op, const char* what, std::string_view owner, std::string_view text) {
+// `plain` tells whether it is printable ASCII that is written unescaped, so its
+// written size is its length: numbers and the writers' constants are.
+std::string_view checkedText(const char* op, const char* what, std::string_view owner, std::string_view text,
+                             bool* plain = nullptr) {
+    bool unescaped = true;
+    std::size_t i = 0;
+    for (; i < text.size(); ++i) {
+        const auto b = static_cast<unsigned char>(text[i]);
+        if (b < 0x20 || b >= 0x7F) break;
+        unescaped = unescaped && b != '&' && b != '<' && b != '>' && b != '"' && b != '\'';
+    }
+    if (plain) *plain = unescaped && i == text.size();
+    if (i == text.size()) return text;
     const std::string_view v = text.substr(0, text.find('\0'));
     if (detail::findBadXmlChar(v) != v.size())
         raise(errc::document_failure,
@@ -382,13 +394,15 @@ struct XMLWrapper::Impl {
     // Appends element `name` with `text` under `parent`; checks everything first.
     pugi::xml_node append(const char* op, pugi::xml_node parent, const Name& name, std::string_view text) {
         checkName(op, name, "element");
-        const std::string_view value = checkedText(op, "text", name.text, text);
+        bool plain = false;
+        const std::string_view value = checkedText(op, "text", name.text, text, &plain);
         const std::size_t depth = depthOfParent(parent) + 1;
         if (depth > kXmlMaxDepth)
             raise(errc::document_failure, std::string(op) + ": " + quote(name.text) + " would be nested deeper than " +
                                               std::to_string(kXmlMaxDepth) + " levels");
         const bool blank = !value.empty() && value.find_first_not_of(" \t\r\n") == std::string_view::npos;
-        const std::size_t more = elementSize(name.text, depth) + (blank ? cdataSize(value) : textSize(value));
+        const std::size_t more =
+            elementSize(name.text, depth) + (blank ? cdataSize(value) : plain ? value.size() : textSize(value));
         reserve(op, more);
         pugi::xml_node n = allocated(op, (parent ? parent : pugi::xml_node(doc)).append_child(name.c_str()));
         cursor = Cursor{};
@@ -412,12 +426,13 @@ struct XMLWrapper::Impl {
     // Sets attribute `name` to `value` on `element`; checks everything first.
     void setAttribute(const char* op, pugi::xml_node element, const Name& name, std::string_view value) {
         checkName(op, name, "attribute");
-        const std::string_view v = checkedText(op, "value", name.text, value);
+        bool plain = false;
+        const std::string_view v = checkedText(op, "value", name.text, value, &plain);
         const std::uint64_t bit = nameBit(name.text);
         Fresh* f = freshOf(element);
         pugi::xml_attribute a = f && (f->names & bit) == 0 ? pugi::xml_attribute() : element.attribute(name.c_str());
         const std::size_t less = a ? attributeSize(name.text, a.value()) : 0;
-        const std::size_t more = attributeSize(name.text, v);
+        const std::size_t more = plain ? name.text.size() + 4 + v.size() : attributeSize(name.text, v);
         reserve(op, more, less);
         const bool added = !a;
         if (added) a = element.append_attribute(name.c_str());

@@ -14,6 +14,8 @@ std::string NumberText(double v) {
         auto end = std::to_chars(buf.data(), buf.data() + buf.size(), v).ptr;
         return std::string(buf.data(), end);
     }
+    // Whole numbers, most readings among them, print as integers, exactly as below.
+    if (std::fabs(v) < 1e15 && v == std::trunc(v)) return std::to_string(static_cast<long long>(v));
     int decimals = std::max(0, 14 - static_cast<int>(std::floor(std::log10(std::fabs(v)))));
     char* end = std::to_chars(buf.data(), buf.data() + buf.size(), v, std::chars_format::fixed, decimals).ptr;
     // Trailing zeros go before the text is made, so a short number never takes the heap.
