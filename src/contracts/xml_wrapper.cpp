@@ -215,8 +215,9 @@ struct Name {
 
 // Constants seen valid, by address: each is checked once, not on every call.
 bool knownConstant(const char* name) {
-    static std::array<const char*, 256> seen{};
-    const char*& slot = seen[(reinterpret_cast<std::uintptr_t>(name) >> 2) % seen.size()];
+    static std::array<const char*, 1024> seen{};
+    // Constants lie a few bytes apart: every address bit goes into the slot.
+    const char*& slot = seen[(reinterpret_cast<std::uintptr_t>(name) * 0x9E3779B97F4A7C15u) >> 54];
     if (slot == name) return true;
     if (!isAsciiXmlName(name) && !detail::isXmlName(name)) return false;
     slot = name;
@@ -405,7 +406,7 @@ struct XMLWrapper::Impl {
             elementSize(name.text, depth) + (blank ? cdataSize(value) : plain ? value.size() : textSize(value));
         reserve(op, more);
         pugi::xml_node n = allocated(op, (parent ? parent : pugi::xml_node(doc)).append_child(name.c_str()));
-        cursor = Cursor{};
+        if (cursor.index >= 0 || cursor.count >= 0) cursor = Cursor{};  // forgets the children it knew
         // A text of whitespace alone is written as a CDATA section: as plain
         // text it would be taken for indentation when read back next to child
         // elements, and dropped.
@@ -456,11 +457,15 @@ struct XMLWrapper::Impl {
         }
     }
 
+    // The element SetAttribute writes on; raises when there is none.
+    pugi::xml_node attributeTarget() const {
+        cur("SetAttribute");
+        if (!lastAdded) raise(errc::missing_object, "SetAttribute: no element has been added");
+        return lastAdded;
+    }
+
     void setLastAttribute(const Name& name, std::string_view value) {
-        Impl& d = *this;
-        d.cur("SetAttribute");
-        if (!d.lastAdded) raise(errc::missing_object, "SetAttribute: no element has been added");
-        d.setAttribute("SetAttribute", d.lastAdded, name, value);
+        setAttribute("SetAttribute", attributeTarget(), name, value);
     }
 
     void addChildElement(const Name& name, std::string_view parentName, std::string_view text) {
@@ -572,6 +577,15 @@ void XmlAppender::addElement(const char* name, std::string_view text) {
 
 void XmlAppender::setAttribute(const char* name, std::string_view value) {
     shielded("SetAttribute", [&] { doc_.edit().setLastAttribute(Name(name, true), value); });
+}
+
+void XmlAppender::setAttributes(std::span<const Attribute> attributes) {
+    shielded("SetAttribute", [&] {
+        XMLWrapper::Impl& d = doc_.edit();
+        if (attributes.empty()) return;
+        const pugi::xml_node element = d.attributeTarget();
+        for (const Attribute& a : attributes) d.setAttribute("SetAttribute", element, Name(a.name, true), a.value);
+    });
 }
 
 void XmlAppender::addChildElement(const char* name, const char* parentName, std::string_view text) {

@@ -5,6 +5,7 @@
 // them for each of its thousands of entries.
 #pragma once
 
+#include <span>
 #include <string_view>
 
 #include "varnel/xml_wrapper.h"
@@ -19,6 +20,12 @@ public:
 
     void addElement(const char* name, std::string_view text = {});
     void setAttribute(const char* name, std::string_view value);
+    // Several attributes on the last added element, as setAttribute one after another.
+    struct Attribute {
+        const char* name;
+        std::string_view value;
+    };
+    void setAttributes(std::span<const Attribute> attributes);
     void addChildElement(const char* name, const char* parentName = "", std::string_view text = {});
     void setChildAttribute(const char* name, std::string_view value);
 

@@ -257,7 +257,7 @@ public:
     // Appends a result (never null) and returns the same object.
     ResultPtr Add(ResultPtr result);
     // The result at a 1-based position; nullptr when there is none.
-    ResultPtr Item(std::int32_t index) const;
+    const ResultPtr& Item(std::int32_t index) const;
     std::int32_t Count() const { return static_cast<std::int32_t>(items_.size()); }
 
     std::vector<ResultPtr>::const_iterator begin() const { return items_.begin(); }

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
+#include <chrono>
 #include <cmath>
 
 namespace varnel::detail {
@@ -42,12 +43,17 @@ std::string TwoDigits(long long value) {
 }
 
 DateAttributes::DateAttributes(const DateTime& t, bool withTime) {
+    // The calendar date once, not once for each of its three parts.
+    const std::int32_t dayNumber = t.dayNumber();
+    const std::chrono::year_month_day date{std::chrono::sys_days{std::chrono::year{1899} / 12 / 30} +
+                                           std::chrono::days{dayNumber}};
+    const std::int64_t time = t.seconds() - std::int64_t(dayNumber) * 86400;
     const struct {
         const char* name;
         long long value;
         int digits;
-    } parts[] = {{"D", t.day(), 1},     {"MM", t.month(), 2},   {"Y", t.year(), 1},
-                 {"h", t.hour(), 1},    {"m", t.minute(), 1},   {"s", t.second(), 1}};
+    } parts[] = {{"D", unsigned(date.day()), 1},  {"MM", unsigned(date.month()), 2}, {"Y", int(date.year()), 1},
+                 {"h", time / 3600, 1},           {"m", time / 60 % 60, 1},          {"s", time % 60, 1}};
     count_ = withTime ? 6 : 3;
     for (std::size_t i = 0; i < count_; ++i) {
         items_[i].name = parts[i].name;

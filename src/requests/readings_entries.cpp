@@ -372,10 +372,6 @@ const char* elementName(const EntryKind& k, const Result& r) {
     return k.kind == ResultKind::InsulinPump && r.ResultType() == 41 ? "MBolus" : k.element;
 }
 
-void dateAttributes(Entry& e, const DateTime& t) {
-    for (const auto& [attribute, value] : dateAttributes(t, true)) e.attr(attribute, value);
-}
-
 void cholesUnit(XMLWrapper& doc, const Cholestrol& first) {
     static constexpr Coded units[] = {{0, "0", "mg/dL"}, {1, "1", "mmol/L"}};
     doc.SelectElement("TransferDetail");
@@ -422,7 +418,7 @@ void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryC
     Entry e{XmlAppender(datalog), context};
     const std::int32_t count = results.Count();
     for (std::int32_t i = 1; i <= count; ++i) {
-        const ResultPtr item = results.Item(i);
+        const ResultPtr& item = results.Item(i);
         Result& first = asResult(item);
         const EntryKind& k = entryKind(first.kind());
 
@@ -435,9 +431,14 @@ void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryC
         }
 
         e.doc.addElement(elementName(k, first));
+        // The flags, then the date: every entry starts with them, set in one call.
+        std::array<XmlAppender::Attribute, 8> head;
+        std::size_t n = 0;
         for (const char* flag : k.flags)
-            if (flag) e.attr(flag, kTrue);
-        dateAttributes(e, first.DateTime());
+            if (flag) head[n++] = {flag, kTrue};
+        const DateAttributes date(first.DateTime(), true);
+        for (const DateAttributes::Attribute& a : date) head[n++] = {a.name, a.text};
+        e.doc.setAttributes({head.data(), n});
         k.write(e, first);
         if (k.value) k.value(e, first, first);
 
@@ -445,7 +446,7 @@ void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryC
         checker.Clear();
         checker.AddValue(NumberText(first.ResultType()));
         for (int absorbed = 0; absorbed < k.merge.most && i < count; ++absorbed) {
-            const ResultPtr nextItem = results.Item(i + 1);
+            const ResultPtr& nextItem = results.Item(i + 1);
             const Result& next = asResult(nextItem);
             if (next.kind() != k.kind) break;
             if (k.merge.sameGroup && next.GroupId() != first.GroupId()) break;
