@@ -20,6 +20,7 @@
 #include <vector>
 
 #include "component/wrapper_access.h"
+#include "platform/message_pump.h"
 #include "simulator.h"
 #include "support/sim_transport.h"
 #include "varnel/clock.h"
@@ -218,6 +219,11 @@ struct BinaryTransportSequence {
     TIME_REC time{};
 
     void run() {
+        // The component's message pump is its own share: the simulator yields to nothing here.
+        vx_set_yield_hook(nullptr, nullptr);
+        struct Restore {
+            ~Restore() { vx_set_yield_hook(&detail::pumpFromTransport, nullptr); }
+        } restore;
         METER_REC r = rec;
         initialize_meter_type_structure(&r, eMorvex);
         vb_Chk4Meter(&r);
