@@ -203,31 +203,40 @@ bool isAsciiXmlName(std::string_view name) {
     return true;
 }
 
+// Constants seen valid, by address, with their length: each is checked once,
+// not on every call. npos for a name that is not an XML Name.
+std::size_t constantNameSize(const char* name) {
+    struct Seen {
+        const char* name = nullptr;
+        std::size_t size = 0;
+    };
+    static std::array<Seen, 1024> seen{};
+    // Constants lie a few bytes apart: every address bit goes into the slot.
+    Seen& slot = seen[(reinterpret_cast<std::uintptr_t>(name) * 0x9E3779B97F4A7C15u) >> 54];
+    if (slot.name == name) return slot.size;
+    const std::string_view text(name);
+    if (!isAsciiXmlName(text) && !detail::isXmlName(text)) return std::string_view::npos;
+    slot = Seen{name, text.size()};
+    return text.size();
+}
+
 // A name as an operation takes it: a caller's text, or a writer's constant
 // (a string literal or a static table entry, so its address names it for good).
 struct Name {
     std::string_view text;  // zero-terminated
     bool constant = false;
+    bool valid = false;  // known for a constant only
     Name(const std::string& s) : text(s) {}
-    Name(const char* s, bool isConstant) : text(s), constant(isConstant) {}
+    Name(const char* s, bool isConstant) : constant(isConstant) {
+        const std::size_t size = isConstant ? constantNameSize(s) : std::string_view::npos;
+        valid = size != std::string_view::npos;
+        text = valid ? std::string_view(s, size) : std::string_view(s);
+    }
     const char* c_str() const { return text.data(); }
 };
 
-// Constants seen valid, by address: each is checked once, not on every call.
-bool knownConstant(const char* name) {
-    static std::array<const char*, 1024> seen{};
-    // Constants lie a few bytes apart: every address bit goes into the slot.
-    const char*& slot = seen[(reinterpret_cast<std::uintptr_t>(name) * 0x9E3779B97F4A7C15u) >> 54];
-    if (slot == name) return true;
-    if (!isAsciiXmlName(name) && !detail::isXmlName(name)) return false;
-    slot = name;
-    return true;
-}
-
 void checkName(const char* op, const Name& name, const char* what) {
-    const bool valid = name.constant ? knownConstant(name.c_str())
-                                     : isAsciiXmlName(name.text) || detail::isXmlName(name.text);
-    if (!valid)
+    if (name.constant ? !name.valid : !isAsciiXmlName(name.text) && !detail::isXmlName(name.text))
         raise(errc::document_failure,
               std::string(op) + ": " + quote(name.text) + " is not a valid XML " + what + " name");
 }

@@ -78,6 +78,8 @@ inline constexpr ResultShape resultShapes[] = {
 
 constexpr const ResultShape& resultShape(ResultKind kind) { return resultShapes[static_cast<std::size_t>(kind)]; }
 
+class Result;
+
 // What every result offers to the code that groups and identifies results.
 class IResult {
 public:
@@ -92,6 +94,8 @@ public:
     virtual void setId(std::int32_t v) = 0;
     // Which result class this is, for callers that branch on it.
     virtual ResultKind kind() const = 0;
+    // The shape every result class shares; null for anything else.
+    virtual Result* asResult() { return nullptr; }
 };
 
 // The shape all result classes share.
@@ -106,6 +110,7 @@ public:
     std::int32_t MeterGroupId() const final { return meterGroupId_; }
     void setMeterGroupId(std::int32_t v) final { meterGroupId_ = v; }
     ResultKind kind() const final { return kind_; }
+    Result* asResult() final { return this; }
 
     std::int16_t Ordinal() const { return ordinal_; }
     void setOrdinal(std::int16_t v) { ordinal_ = v; }

@@ -387,7 +387,9 @@ void cholesUnit(XMLWrapper& doc, const Cholestrol& first) {
 
 Result& asResult(const ResultPtr& p) {
     if (!p) raise(errc::missing_object, "Object variable not set");
-    return dynamic_cast<Result&>(*p);
+    Result* r = p->asResult();
+    if (!r) throw std::bad_cast();  // not one of the result classes, as a failed cast says
+    return *r;
 }
 
 }  // namespace
