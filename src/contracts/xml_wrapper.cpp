@@ -295,34 +295,34 @@ struct XMLWrapper::Impl {
     };
     mutable Cursor cursor;
 
-    // The elements added last, each with a mask of the attribute names set on
-    // it since (a bit per name hash). An element starts with no attribute, so a
-    // name whose bit is clear is new and needs no lookup before it is appended;
-    // the writers set several attributes on each element they add.
-    // Their depth is kept too, so appending below one needs no walk up the tree.
-    struct Fresh {
-        const void* node = nullptr;
-        std::size_t depth = 0;
-        std::uint64_t names = 0;
-    };
-    std::array<Fresh, 4> fresh;
-    std::size_t nextFresh = 0;
+    // Attribute names set on the last added element and on the last added
+    // child since they were added, a bit per name hash; all bits while that is
+    // not known. An element starts with no attribute, so a name whose bit is
+    // clear is new and needs no lookup before it is appended: the writers set
+    // several attributes on each element they add.
+    static constexpr std::uint64_t kUnknown = ~std::uint64_t(0);
+    std::uint64_t addedNames = kUnknown;
+    std::uint64_t childNames = kUnknown;
+    // The depth of the last added element (0: not known) and of the last
+    // parent measured, so appending below either needs no walk up the tree.
+    std::size_t addedDepth = 0;
+    mutable const void* measured = nullptr;
+    mutable std::size_t measuredDepth = 0;
 
     static std::uint64_t nameBit(std::string_view name) {
         const std::size_t h = name.size() * 31 + static_cast<unsigned char>(name.front()) * 7 +
                               static_cast<unsigned char>(name.back());
         return std::uint64_t(1) << (h % 64);
     }
-    Fresh* freshOf(pugi::xml_node element) {
-        const void* key = element.internal_object();
-        for (Fresh& f : fresh)
-            if (f.node == key) return &f;
-        return nullptr;
-    }
-    std::size_t depthOfParent(pugi::xml_node parent) {
+    std::size_t depthOfParent(pugi::xml_node parent) const {
         if (!parent) return 0;
-        const Fresh* f = freshOf(parent);
-        return f ? f->depth : depthOf(parent);
+        if (addedDepth != 0 && parent == lastAdded) return addedDepth;
+        const void* key = parent.internal_object();
+        if (key != measured) {
+            measured = key;
+            measuredDepth = depthOf(parent);
+        }
+        return measuredDepth;
     }
 
     Impl() = default;
@@ -342,7 +342,9 @@ struct XMLWrapper::Impl {
         lastAdded = pugi::xml_node();
         lastChild = pugi::xml_node();
         cursor = Cursor{};
-        fresh = {};
+        addedNames = childNames = kUnknown;
+        addedDepth = 0;
+        measured = nullptr;
     }
 
     // The current element; raises missing_object for an empty document.
@@ -402,6 +404,8 @@ struct XMLWrapper::Impl {
     }
 
     // Appends element `name` with `text` under `parent`; checks everything first.
+    std::size_t appendedDepth = 0;  // of the element append made last
+
     pugi::xml_node append(const char* op, pugi::xml_node parent, const Name& name, std::string_view text) {
         checkName(op, name, "element");
         bool plain = false;
@@ -429,25 +433,26 @@ struct XMLWrapper::Impl {
             }
         }
         size += more;
-        fresh[nextFresh++ % fresh.size()] = Fresh{n.internal_object(), depth, 0};
+        appendedDepth = depth;
         return n;
     }
 
     // Sets attribute `name` to `value` on `element`; checks everything first.
-    void setAttribute(const char* op, pugi::xml_node element, const Name& name, std::string_view value) {
+    // `names`: the mask of the element (addedNames or childNames).
+    void setAttribute(const char* op, pugi::xml_node element, std::uint64_t& names, const Name& name,
+                      std::string_view value) {
         checkName(op, name, "attribute");
         bool plain = false;
         const std::string_view v = checkedText(op, "value", name.text, value, &plain);
         const std::uint64_t bit = nameBit(name.text);
-        Fresh* f = freshOf(element);
-        pugi::xml_attribute a = f && (f->names & bit) == 0 ? pugi::xml_attribute() : element.attribute(name.c_str());
+        pugi::xml_attribute a = (names & bit) == 0 ? pugi::xml_attribute() : element.attribute(name.c_str());
         const std::size_t less = a ? attributeSize(name.text, a.value()) : 0;
         const std::size_t more = plain ? name.text.size() + 4 + v.size() : attributeSize(name.text, v);
         reserve(op, more, less);
         const bool added = !a;
         if (added) a = element.append_attribute(name.c_str());
         if (!a) raise(errc::internal, std::string(op) + ": out of memory");
-        if (f) f->names |= bit;
+        names |= bit;
         if (!a.set_value(v.data(), v.size())) {
             if (added) element.remove_attribute(a);
             raise(errc::internal, std::string(op) + ": out of memory");
@@ -461,8 +466,12 @@ struct XMLWrapper::Impl {
         Impl& d = *this;
         if (!d.root()) {
             d.current = d.lastAdded = d.append("AddElement", {}, name, text);
+            d.addedNames = 0;
+            d.addedDepth = d.appendedDepth;
         } else {
             d.lastAdded = d.append("AddElement", d.current, name, text);
+            d.addedNames = 0;
+            d.addedDepth = d.appendedDepth;
         }
     }
 
@@ -474,7 +483,7 @@ struct XMLWrapper::Impl {
     }
 
     void setLastAttribute(const Name& name, std::string_view value) {
-        setAttribute("SetAttribute", attributeTarget(), name, value);
+        setAttribute("SetAttribute", attributeTarget(), addedNames, name, value);
     }
 
     void addChildElement(const Name& name, std::string_view parentName, std::string_view text) {
@@ -507,13 +516,14 @@ struct XMLWrapper::Impl {
             parent = found;
         }
         d.lastChild = d.append("AddChildElement", parent, name, text);
+        d.childNames = 0;
     }
 
     void setChildAttribute(const Name& name, std::string_view value) {
         Impl& d = *this;
         d.cur("SetChildAttribute");
         if (!d.lastChild) raise(errc::missing_object, "SetChildAttribute: no child element has been added");
-        d.setAttribute("SetChildAttribute", d.lastChild, name, value);
+        d.setAttribute("SetChildAttribute", d.lastChild, d.childNames, name, value);
     }
 
     // Builds a document from `text`; on success replaces ours and returns true.
@@ -593,7 +603,8 @@ void XmlAppender::setAttributes(std::span<const Attribute> attributes) {
         XMLWrapper::Impl& d = doc_.edit();
         if (attributes.empty()) return;
         const pugi::xml_node element = d.attributeTarget();
-        for (const Attribute& a : attributes) d.setAttribute("SetAttribute", element, Name(a.name, true), a.value);
+        for (const Attribute& a : attributes)
+            d.setAttribute("SetAttribute", element, d.addedNames, Name(a.name, true), a.value);
     });
 }
 
