@@ -315,26 +315,26 @@ void BM_RawPugixmlBinary(benchmark::State& state) {
 
 // --- the other requests ---
 
-void BM_GetDeviceSettings(benchmark::State& state) {
+// A get-request in the all-information mode on a document of `kind`, and its text.
+using GetRequest = std::int32_t (DllWrapper::*)(METER_REC&, XMLWrapper&, XMLWrapper&, bool, XMLWrapper&, bool&);
+
+void getAll(benchmark::State& state, GetRequest request, std::int32_t kind, const char* name) {
     Session& s = binarySession();
     for (auto _ : state) {
-        XMLWrapper cfg = newDoc(doc_kind::device_settings), status = newDoc(doc_kind::status);
+        XMLWrapper doc = newDoc(kind), status = newDoc(doc_kind::status);
         bool checked = false;
-        if (s.wrapper->getDeviceSettings(s.rec, s.device, cfg, true, status, checked) != ME_SUCCESS)
-            fail("getDeviceSettings failed: " + status.XML());
-        benchmark::DoNotOptimize(cfg.XML());
+        if ((s.wrapper->*request)(s.rec, s.device, doc, true, status, checked) != ME_SUCCESS)
+            fail(std::string(name) + " failed: " + status.XML());
+        benchmark::DoNotOptimize(doc.XML());
     }
 }
 
+void BM_GetDeviceSettings(benchmark::State& state) {
+    getAll(state, &DllWrapper::getDeviceSettings, doc_kind::device_settings, "getDeviceSettings");
+}
+
 void BM_GetDeviceCaps(benchmark::State& state) {
-    Session& s = binarySession();
-    for (auto _ : state) {
-        XMLWrapper caps = newDoc(doc_kind::device_caps), status = newDoc(doc_kind::status);
-        bool checked = false;
-        if (s.wrapper->getDeviceCaps(s.rec, s.device, caps, true, status, checked) != ME_SUCCESS)
-            fail("getDeviceCaps failed: " + status.XML());
-        benchmark::DoNotOptimize(caps.XML());
-    }
+    getAll(state, &DllWrapper::getDeviceCaps, doc_kind::device_caps, "getDeviceCaps");
 }
 
 void BM_Discover(benchmark::State& state) {
