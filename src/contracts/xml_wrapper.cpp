@@ -477,9 +477,10 @@ struct XMLWrapper::Impl {
 
     // The element SetAttribute writes on; raises when there is none.
     pugi::xml_node attributeTarget() const {
+        // An added element means a document element: only without one is the document looked at.
+        if (lastAdded) return lastAdded;
         cur("SetAttribute");
-        if (!lastAdded) raise(errc::missing_object, "SetAttribute: no element has been added");
-        return lastAdded;
+        raise(errc::missing_object, "SetAttribute: no element has been added");
     }
 
     void setLastAttribute(const Name& name, std::string_view value) {
@@ -488,8 +489,10 @@ struct XMLWrapper::Impl {
 
     void addChildElement(const Name& name, std::string_view parentName, std::string_view text) {
         Impl& d = *this;
-        d.cur("AddChildElement");
-        if (!d.lastAdded) raise(errc::missing_object, "AddChildElement: no element has been added");
+        if (!d.lastAdded) {
+            d.cur("AddChildElement");
+            raise(errc::missing_object, "AddChildElement: no element has been added");
+        }
         checkName("AddChildElement", name, "element");
         pugi::xml_node parent = d.lastAdded;
         if (!parentName.empty()) {
@@ -521,8 +524,10 @@ struct XMLWrapper::Impl {
 
     void setChildAttribute(const Name& name, std::string_view value) {
         Impl& d = *this;
-        d.cur("SetChildAttribute");
-        if (!d.lastChild) raise(errc::missing_object, "SetChildAttribute: no child element has been added");
+        if (!d.lastChild) {
+            d.cur("SetChildAttribute");
+            raise(errc::missing_object, "SetChildAttribute: no child element has been added");
+        }
         d.setAttribute("SetChildAttribute", d.lastChild, d.childNames, name, value);
     }
 
