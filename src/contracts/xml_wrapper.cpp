@@ -770,8 +770,10 @@ bool XMLWrapper::LoadXML(const std::string& text) {
 }
 
 namespace {
-std::string written(const char* op, const pugi::xml_document& doc, unsigned flags) {
+// `bound`: the document's written size bound, so the text grows in one step.
+std::string written(const char* op, const pugi::xml_document& doc, unsigned flags, std::size_t bound) {
     StringWriter w;
+    w.out.reserve(bound + 64);  // 64: room for the declaration
     doc.save(w, "  ", flags, pugi::encoding_utf8);
     if (w.overflow)
         raise(errc::document_failure,
@@ -783,7 +785,7 @@ std::string written(const char* op, const pugi::xml_document& doc, unsigned flag
 std::string XMLWrapper::XML() const {
     return shielded("XML", [&]() -> std::string {
         if (!impl_ || !impl_->root()) return {};
-        return written("XML", impl_->doc, pugi::format_default | pugi::format_no_declaration);
+        return written("XML", impl_->doc, pugi::format_default | pugi::format_no_declaration, impl_->size);
     });
 }
 
@@ -823,7 +825,7 @@ void XMLWrapper::SaveFile(const std::string& path) const {
     shielded("SaveFile", [&] {
         const Impl& d = view();
         d.cur("SaveFile");
-        const std::string text = written("SaveFile", d.doc, pugi::format_default);
+        const std::string text = written("SaveFile", d.doc, pugi::format_default, d.size);
         std::ofstream out(path, std::ios::binary | std::ios::trunc);
         if (out) out.write(text.data(), static_cast<std::streamsize>(text.size()));
         if (out) out.close();
