@@ -12,6 +12,10 @@
 
 namespace varnel {
 
+namespace detail {
+class XmlAppender;
+}
+
 // Kinds of XMLWrapper::InitDocument. 2, 4 and 7 are fixed by the interface; the
 // others are this component's, for the documents a client passes in.
 namespace doc_kind {
@@ -194,6 +198,7 @@ public:
     bool IsEmpty() const;
 
 private:
+    friend class detail::XmlAppender;
     struct Impl;
     std::unique_ptr<Impl> impl_;  // null only after a move: an empty document
     Impl& edit();                 // makes an Impl for a moved-from object

@@ -6,6 +6,7 @@
 // Each record is found through its own offset and checked on its own, so one
 // damaged record never hides or garbles another.
 #include <algorithm>
+#include <array>
 #include <cmath>
 #include <cstring>
 #include <string>
@@ -117,10 +118,14 @@ const Layout kLayouts[] = {
     {VX_REC_CAL_CODE, "CalCode", kCalCode},
 };
 
+// The layout of each record type a byte can hold, looked up once per call.
 const Layout* layoutOf(std::int16_t recType) {
-    for (const Layout& l : kLayouts)
-        if (l.recType == recType) return &l;
-    return nullptr;
+    static const auto byType = [] {
+        std::array<const Layout*, 256> table{};
+        for (const Layout& l : kLayouts) table[std::size_t(l.recType)] = &l;
+        return table;
+    }();
+    return recType >= 0 && recType < 256 ? byType[std::size_t(recType)] : nullptr;
 }
 
 }  // namespace
@@ -170,13 +175,21 @@ std::size_t payloadSize(std::int16_t recType) {
     return n;
 }
 
-std::uint16_t crc16(const std::uint8_t* p, std::size_t n) {
-    std::uint16_t crc = 0xFFFF;
-    while (n--) {
-        crc ^= static_cast<std::uint16_t>(*p++ << 8);
+// CRC-16/CCITT a byte at a time: the table holds the eight bit steps of every byte value.
+constexpr std::array<std::uint16_t, 256> kCrcTable = [] {
+    std::array<std::uint16_t, 256> table{};
+    for (unsigned byte = 0; byte < 256; ++byte) {
+        auto crc = static_cast<std::uint16_t>(byte << 8);
         for (int bit = 0; bit < 8; ++bit)
             crc = static_cast<std::uint16_t>(crc & 0x8000 ? (crc << 1) ^ 0x1021 : crc << 1);
+        table[byte] = crc;
     }
+    return table;
+}();
+
+std::uint16_t crc16(const std::uint8_t* p, std::size_t n) {
+    std::uint16_t crc = 0xFFFF;
+    while (n--) crc = static_cast<std::uint16_t>((crc << 8) ^ kCrcTable[((crc >> 8) ^ *p++) & 0xFF]);
     return crc;
 }
 
@@ -224,11 +237,20 @@ const std::uint8_t* recordAt(const METER_BIN_DATALOG& d, int index) {
 
 }  // namespace
 
+std::size_t encodedRecordSize(const RECORD_DATA& record) { return kRecordFrame + payloadSize(record.recType); }
+
 std::size_t encodedSize(const std::vector<RECORD_DATA>& records) {
     std::size_t n = kHeaderSize;
-    for (const RECORD_DATA& r : records) n += 2 + kRecordFrame + payloadSize(r.recType);
+    for (const RECORD_DATA& r : records) n += 2 + encodedRecordSize(r);
     return n;
 }
+
+namespace {
+
+// The same field, whatever width a record type stores it in.
+bool sameField(const Field& a, const Field& b) { return a.integer == b.integer && a.realOffset == b.realOffset; }
+
+}  // namespace
 
 void encodeBinaryDatalog(const std::vector<RECORD_DATA>& records, METER_BIN_DATALOG& datalog) {
     const std::size_t size = encodedSize(records);
@@ -243,11 +265,10 @@ void encodeBinaryDatalog(const std::vector<RECORD_DATA>& records, METER_BIN_DATA
         const RECORD_DATA& r = records[i];
         if (r.recType < 0 || r.recType > 255)
             refuse(i, r, "recType", std::to_string(r.recType), "does not fit one byte");
+        const auto carried = detail::fieldsOf(r.recType);
         for (const Field& f : detail::allValueFields()) {
-            const auto carried = detail::fieldsOf(r.recType);
             const bool set = f.isReal() ? f.real(r) != 0.0 : r.*f.integer != 0;
-            if (set && std::none_of(carried.begin(), carried.end(),
-                                    [&](const Field& c) { return std::string_view(c.name) == f.name; }))
+            if (set && std::none_of(carried.begin(), carried.end(), [&](const Field& c) { return sameField(c, f); }))
                 refuse(i, r, f.name, "", "is not carried by this record type");
         }
         put(table, p - buf, 2);

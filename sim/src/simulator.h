@@ -104,6 +104,8 @@ std::int32_t secondsOf(int year, int month, int day, int hour = 0, int minute = 
 void encodeBinaryDatalog(const std::vector<RECORD_DATA>& records, METER_BIN_DATALOG& datalog);
 // Bytes the records take in binBuf.
 std::size_t encodedSize(const std::vector<RECORD_DATA>& records);
+// Bytes one record takes in binBuf after the header and offset table.
+std::size_t encodedRecordSize(const RECORD_DATA& record);
 // 0 and the record, or ME_BAD_PARAMETER (index), ME_CHKSUM_ERROR (damaged), ME_VALIDATION_ERROR (malformed).
 std::int16_t decodeBinaryRecord(const METER_BIN_DATALOG& datalog, int index, RECORD_DATA& record);
 // Damages record index in place so that decoding it fails; the others stay readable.

@@ -6,6 +6,7 @@
 #include <ctime>
 #include <memory>
 #include <new>
+#include <optional>
 
 #include "meter_state.h"
 #include "varnel/vantrix32.h"
@@ -102,7 +103,10 @@ void putOptions(SETTINGS_REC& s, const MeterProfile& m) {
 // Prepares the record for a meter of this type: the held meter's tables when
 // it is of that type, the type's default meter's otherwise.
 void prepareType(State& s, METER_REC& rec, std::int16_t type) {
-    const MeterProfile m = s.meter().type == type ? s.meter() : defaultProfile(type);
+    // The held meter is used in place; only another type's default meter is made.
+    std::optional<MeterProfile> other;
+    if (s.meter().type != type) other = defaultProfile(type);
+    const MeterProfile& m = other ? *other : s.meter();
     rec.M_Type = type;
     putOptions(rec.Setting, m);
     for (int i = 0; i < kOptionCount; ++i) rec.Setting.Status[i] = 0;  // not read from the meter yet
@@ -519,7 +523,8 @@ VX_API std::int16_t GetMeterDatalog(METER_REC* rec, METER_BIN_DATALOG* datalog, 
         const std::size_t header = encodedSize({});
         std::vector<std::size_t> ends;
         std::size_t end = header + 2 * sent.size();  // header and offset table come first
-        for (const RECORD_DATA& rd : sent) ends.push_back(end += encodedSize({rd}) - header - 2);
+        ends.reserve(sent.size());
+        for (const RECORD_DATA& rd : sent) ends.push_back(end += encodedRecordSize(rd));
         const std::size_t size = encodedSize(sent);
 
         std::memset(datalog, 0, sizeof *datalog);

@@ -24,6 +24,7 @@
 // in order costs one step each instead of a walk from the first child.
 #include "varnel/xml_wrapper.h"
 
+#include <array>
 #include <cstddef>
 #include <cstdio>
 #include <deque>
@@ -35,6 +36,7 @@
 #include <vector>
 
 #include "contracts/xml_index_steps.h"
+#include "contracts/xml_wrapper_append.h"
 #include "varnel/component_error.h"
 #include "xmlcheck/xml_check.h"
 
@@ -169,17 +171,74 @@ std::string sizeLimitText() { return std::to_string(kXmlMaxBytes >> 20) + " MiB"
 
 // A caller's text as it goes into the document: up to its first zero byte,
 // UTF-8 made of XML characters.
-std::string_view checkedText(const char* op, const char* what, std::string_view owner, const std::string& text) {
-    const std::string_view v(text.c_str());
-    const std::string problem = detail::xmlTextProblem(v);
-    if (!problem.empty())
-        raise(errc::document_failure, std::string(op) + ": the " + what + " for " + quote(owner) + " has " + problem);
+// `plain` tells whether it is printable ASCII that is written unescaped, so its
+// written size is its length: numbers and the writers' constants are.
+std::string_view checkedText(const char* op, const char* what, std::string_view owner, std::string_view text,
+                             bool* plain = nullptr) {
+    bool unescaped = true;
+    std::size_t i = 0;
+    for (; i < text.size(); ++i) {
+        const auto b = static_cast<unsigned char>(text[i]);
+        if (b < 0x20 || b >= 0x7F) break;
+        unescaped = unescaped && b != '&' && b != '<' && b != '>' && b != '"' && b != '\'';
+    }
+    if (plain) *plain = unescaped && i == text.size();
+    if (i == text.size()) return text;
+    const std::string_view v = text.substr(0, text.find('\0'));
+    if (detail::findBadXmlChar(v) != v.size())
+        raise(errc::document_failure,
+              std::string(op) + ": the " + what + " for " + quote(owner) + " has " + detail::xmlTextProblem(v));
     return v;
 }
 
-void checkName(const char* op, const std::string& name, const char* what) {
-    if (!detail::isXmlName(name))
-        raise(errc::document_failure, std::string(op) + ": " + quote(name) + " is not a valid XML " + what + " name");
+// Nearly every name is ASCII, and the documents use a few dozen constant ones:
+// those are told apart without decoding. Anything else takes the full check.
+bool isAsciiXmlName(std::string_view name) {
+    auto start = [](unsigned char c) { return (c | 0x20) >= 'a' && (c | 0x20) <= 'z' ? true : c == '_' || c == ':'; };
+    if (name.empty() || !start(static_cast<unsigned char>(name[0]))) return false;
+    for (std::size_t i = 1; i < name.size(); ++i) {
+        const auto c = static_cast<unsigned char>(name[i]);
+        if (!start(c) && !(c >= '0' && c <= '9') && c != '-' && c != '.') return false;
+    }
+    return true;
+}
+
+// Constants seen valid, by address, with their length: each is checked once,
+// not on every call. npos for a name that is not an XML Name.
+std::size_t constantNameSize(const char* name) {
+    struct Seen {
+        const char* name = nullptr;
+        std::size_t size = 0;
+    };
+    static std::array<Seen, 1024> seen{};
+    // Constants lie a few bytes apart: every address bit goes into the slot.
+    Seen& slot = seen[(reinterpret_cast<std::uintptr_t>(name) * 0x9E3779B97F4A7C15u) >> 54];
+    if (slot.name == name) return slot.size;
+    const std::string_view text(name);
+    if (!isAsciiXmlName(text) && !detail::isXmlName(text)) return std::string_view::npos;
+    slot = Seen{name, text.size()};
+    return text.size();
+}
+
+// A name as an operation takes it: a caller's text, or a writer's constant
+// (a string literal or a static table entry, so its address names it for good).
+struct Name {
+    std::string_view text;  // zero-terminated
+    bool constant = false;
+    bool valid = false;  // known for a constant only
+    Name(const std::string& s) : text(s) {}
+    Name(const char* s, bool isConstant) : constant(isConstant) {
+        const std::size_t size = isConstant ? constantNameSize(s) : std::string_view::npos;
+        valid = size != std::string_view::npos;
+        text = valid ? std::string_view(s, size) : std::string_view(s);
+    }
+    const char* c_str() const { return text.data(); }
+};
+
+void checkName(const char* op, const Name& name, const char* what) {
+    if (name.constant ? !name.valid : !isAsciiXmlName(name.text) && !detail::isXmlName(name.text))
+        raise(errc::document_failure,
+              std::string(op) + ": " + quote(name.text) + " is not a valid XML " + what + " name");
 }
 
 // Positions of a node as offsets among its parent's children, from the document down.
@@ -236,6 +295,36 @@ struct XMLWrapper::Impl {
     };
     mutable Cursor cursor;
 
+    // Attribute names set on the last added element and on the last added
+    // child since they were added, a bit per name hash; all bits while that is
+    // not known. An element starts with no attribute, so a name whose bit is
+    // clear is new and needs no lookup before it is appended: the writers set
+    // several attributes on each element they add.
+    static constexpr std::uint64_t kUnknown = ~std::uint64_t(0);
+    std::uint64_t addedNames = kUnknown;
+    std::uint64_t childNames = kUnknown;
+    // The depth of the last added element (0: not known) and of the last
+    // parent measured, so appending below either needs no walk up the tree.
+    std::size_t addedDepth = 0;
+    mutable const void* measured = nullptr;
+    mutable std::size_t measuredDepth = 0;
+
+    static std::uint64_t nameBit(std::string_view name) {
+        const std::size_t h = name.size() * 31 + static_cast<unsigned char>(name.front()) * 7 +
+                              static_cast<unsigned char>(name.back());
+        return std::uint64_t(1) << (h % 64);
+    }
+    std::size_t depthOfParent(pugi::xml_node parent) const {
+        if (!parent) return 0;
+        if (addedDepth != 0 && parent == lastAdded) return addedDepth;
+        const void* key = parent.internal_object();
+        if (key != measured) {
+            measured = key;
+            measuredDepth = depthOf(parent);
+        }
+        return measuredDepth;
+    }
+
     Impl() = default;
     Impl(const Impl& other) : lastLoadError(other.lastLoadError), size(other.size) {
         doc.reset(other.doc);
@@ -253,6 +342,9 @@ struct XMLWrapper::Impl {
         lastAdded = pugi::xml_node();
         lastChild = pugi::xml_node();
         cursor = Cursor{};
+        addedNames = childNames = kUnknown;
+        addedDepth = 0;
+        measured = nullptr;
     }
 
     // The current element; raises missing_object for an empty document.
@@ -312,44 +404,131 @@ struct XMLWrapper::Impl {
     }
 
     // Appends element `name` with `text` under `parent`; checks everything first.
-    pugi::xml_node append(const char* op, pugi::xml_node parent, const std::string& name, const std::string& text) {
+    std::size_t appendedDepth = 0;  // of the element append made last
+
+    pugi::xml_node append(const char* op, pugi::xml_node parent, const Name& name, std::string_view text) {
         checkName(op, name, "element");
-        const std::string_view value = checkedText(op, "text", name, text);
-        const std::size_t depth = parent ? depthOf(parent) + 1 : 1;
+        bool plain = false;
+        const std::string_view value = checkedText(op, "text", name.text, text, &plain);
+        const std::size_t depth = depthOfParent(parent) + 1;
         if (depth > kXmlMaxDepth)
-            raise(errc::document_failure, std::string(op) + ": " + quote(name) + " would be nested deeper than " +
+            raise(errc::document_failure, std::string(op) + ": " + quote(name.text) + " would be nested deeper than " +
                                               std::to_string(kXmlMaxDepth) + " levels");
         const bool blank = !value.empty() && value.find_first_not_of(" \t\r\n") == std::string_view::npos;
-        const std::size_t more = elementSize(name, depth) + (blank ? cdataSize(value) : textSize(value));
+        const std::size_t more =
+            elementSize(name.text, depth) + (blank ? cdataSize(value) : plain ? value.size() : textSize(value));
         reserve(op, more);
         pugi::xml_node n = allocated(op, (parent ? parent : pugi::xml_node(doc)).append_child(name.c_str()));
-        cursor = Cursor{};
+        if (cursor.index >= 0 || cursor.count >= 0) cursor = Cursor{};  // forgets the children it knew
         // A text of whitespace alone is written as a CDATA section: as plain
         // text it would be taken for indentation when read back next to child
         // elements, and dropped.
         if (!value.empty()) {
-            const bool stored = blank ? allocated(op, n.append_child(pugi::node_cdata)).set_value(value.data())
-                                      : n.text().set(value.data());
+            const bool stored =
+                blank ? allocated(op, n.append_child(pugi::node_cdata)).set_value(value.data(), value.size())
+                      : n.text().set(value.data(), value.size());
             if (!stored) {
                 n.parent().remove_child(n);
                 raise(errc::internal, std::string(op) + ": out of memory");
             }
         }
         size += more;
+        appendedDepth = depth;
         return n;
     }
 
     // Sets attribute `name` to `value` on `element`; checks everything first.
-    void setAttribute(const char* op, pugi::xml_node element, const std::string& name, const std::string& value) {
+    // `names`: the mask of the element (addedNames or childNames).
+    void setAttribute(const char* op, pugi::xml_node element, std::uint64_t& names, const Name& name,
+                      std::string_view value) {
         checkName(op, name, "attribute");
-        const std::string_view v = checkedText(op, "value", name, value);
-        pugi::xml_attribute a = element.attribute(name.c_str());
-        const std::size_t less = a ? attributeSize(name, a.value()) : 0;
-        const std::size_t more = attributeSize(name, v);
+        bool plain = false;
+        const std::string_view v = checkedText(op, "value", name.text, value, &plain);
+        const std::uint64_t bit = nameBit(name.text);
+        pugi::xml_attribute a = (names & bit) == 0 ? pugi::xml_attribute() : element.attribute(name.c_str());
+        const std::size_t less = a ? attributeSize(name.text, a.value()) : 0;
+        const std::size_t more = plain ? name.text.size() + 4 + v.size() : attributeSize(name.text, v);
         reserve(op, more, less);
-        if (!a) a = element.append_attribute(name.c_str());
-        if (!a || !a.set_value(v.data())) raise(errc::internal, std::string(op) + ": out of memory");
+        const bool added = !a;
+        if (added) a = element.append_attribute(name.c_str());
+        if (!a) raise(errc::internal, std::string(op) + ": out of memory");
+        names |= bit;
+        if (!a.set_value(v.data(), v.size())) {
+            if (added) element.remove_attribute(a);
+            raise(errc::internal, std::string(op) + ": out of memory");
+        }
         size = size - less + more;
+    }
+
+    // The four building operations, for XMLWrapper's members and for XmlAppender.
+
+    void addElement(const Name& name, std::string_view text) {
+        Impl& d = *this;
+        if (!d.root()) {
+            d.current = d.lastAdded = d.append("AddElement", {}, name, text);
+            d.addedNames = 0;
+            d.addedDepth = d.appendedDepth;
+        } else {
+            d.lastAdded = d.append("AddElement", d.current, name, text);
+            d.addedNames = 0;
+            d.addedDepth = d.appendedDepth;
+        }
+    }
+
+    // The element SetAttribute writes on; raises when there is none.
+    pugi::xml_node attributeTarget() const {
+        // An added element means a document element: only without one is the document looked at.
+        if (lastAdded) return lastAdded;
+        cur("SetAttribute");
+        raise(errc::missing_object, "SetAttribute: no element has been added");
+    }
+
+    void setLastAttribute(const Name& name, std::string_view value) {
+        setAttribute("SetAttribute", attributeTarget(), addedNames, name, value);
+    }
+
+    void addChildElement(const Name& name, std::string_view parentName, std::string_view text) {
+        Impl& d = *this;
+        if (!d.lastAdded) {
+            d.cur("AddChildElement");
+            raise(errc::missing_object, "AddChildElement: no element has been added");
+        }
+        checkName("AddChildElement", name, "element");
+        pugi::xml_node parent = d.lastAdded;
+        if (!parentName.empty()) {
+            // The last direct child of that name, found from the end.
+            pugi::xml_node found = d.lastAdded.last_child();
+            while (found && !(isElement(found) && parentName == found.name())) found = found.previous_sibling();
+            if (!found) {
+                // Deeper: the last element of that name below, in document order.
+                struct Last : pugi::xml_tree_walker {
+                    std::string_view name;
+                    pugi::xml_node hit;
+                    bool for_each(pugi::xml_node& n) override {
+                        if (isElement(n) && name == n.name()) hit = n;
+                        return true;
+                    }
+                } walker;
+                walker.name = parentName;
+                d.lastAdded.traverse(walker);
+                found = walker.hit;
+            }
+            if (!found)
+                raise(errc::missing_object,
+                      "AddChildElement: no element " + quote(parentName) + " below " + quote(d.lastAdded.name()));
+            parent = found;
+        }
+        d.lastChild = d.append("AddChildElement", parent, name, text);
+        d.childNames = 0;
+    }
+
+    void setChildAttribute(const Name& name, std::string_view value) {
+        Impl& d = *this;
+        if (!d.lastChild) {
+            d.cur("SetChildAttribute");
+            raise(errc::missing_object, "SetChildAttribute: no child element has been added");
+        }
+        d.setAttribute("SetChildAttribute", d.lastChild, d.childNames, name, value);
     }
 
     // Builds a document from `text`; on success replaces ours and returns true.
@@ -411,15 +590,38 @@ const XMLWrapper::Impl& XMLWrapper::view() const {
 }
 
 void XMLWrapper::AddElement(const std::string& name, const std::string& text) {
-    shielded("AddElement", [&] {
-        Impl& d = edit();
-        if (!d.root()) {
-            d.current = d.lastAdded = d.append("AddElement", {}, name, text);
-        } else {
-            d.lastAdded = d.append("AddElement", d.current, name, text);
-        }
+    shielded("AddElement", [&] { edit().addElement(name, text); });
+}
+
+namespace detail {
+
+void XmlAppender::addElement(const char* name, std::string_view text) {
+    shielded("AddElement", [&] { doc_.edit().addElement(Name(name, true), text); });
+}
+
+void XmlAppender::setAttribute(const char* name, std::string_view value) {
+    shielded("SetAttribute", [&] { doc_.edit().setLastAttribute(Name(name, true), value); });
+}
+
+void XmlAppender::setAttributes(std::span<const Attribute> attributes) {
+    shielded("SetAttribute", [&] {
+        XMLWrapper::Impl& d = doc_.edit();
+        if (attributes.empty()) return;
+        const pugi::xml_node element = d.attributeTarget();
+        for (const Attribute& a : attributes)
+            d.setAttribute("SetAttribute", element, d.addedNames, Name(a.name, true), a.value);
     });
 }
+
+void XmlAppender::addChildElement(const char* name, const char* parentName, std::string_view text) {
+    shielded("AddChildElement", [&] { doc_.edit().addChildElement(Name(name, true), parentName, text); });
+}
+
+void XmlAppender::setChildAttribute(const char* name, std::string_view value) {
+    shielded("SetChildAttribute", [&] { doc_.edit().setChildAttribute(Name(name, true), value); });
+}
+
+}  // namespace detail
 
 std::int32_t XMLWrapper::GetChildCount() const {
     return shielded("GetChildCount", [&] {
@@ -429,46 +631,11 @@ std::int32_t XMLWrapper::GetChildCount() const {
 }
 
 void XMLWrapper::SetAttribute(const std::string& name, const std::string& value) {
-    shielded("SetAttribute", [&] {
-        Impl& d = edit();
-        d.cur("SetAttribute");
-        if (!d.lastAdded) raise(errc::missing_object, "SetAttribute: no element has been added");
-        d.setAttribute("SetAttribute", d.lastAdded, name, value);
-    });
+    shielded("SetAttribute", [&] { edit().setLastAttribute(name, value); });
 }
 
 void XMLWrapper::AddChildElement(const std::string& name, const std::string& parentName, const std::string& text) {
-    shielded("AddChildElement", [&] {
-        Impl& d = edit();
-        d.cur("AddChildElement");
-        if (!d.lastAdded) raise(errc::missing_object, "AddChildElement: no element has been added");
-        checkName("AddChildElement", name, "element");
-        pugi::xml_node parent = d.lastAdded;
-        if (!parentName.empty()) {
-            // The last direct child of that name, found from the end.
-            pugi::xml_node found = d.lastAdded.last_child();
-            while (found && !(isElement(found) && parentName == found.name())) found = found.previous_sibling();
-            if (!found) {
-                // Deeper: the last element of that name below, in document order.
-                struct Last : pugi::xml_tree_walker {
-                    const std::string* name;
-                    pugi::xml_node hit;
-                    bool for_each(pugi::xml_node& n) override {
-                        if (isElement(n) && *name == n.name()) hit = n;
-                        return true;
-                    }
-                } walker;
-                walker.name = &parentName;
-                d.lastAdded.traverse(walker);
-                found = walker.hit;
-            }
-            if (!found)
-                raise(errc::missing_object,
-                      "AddChildElement: no element " + quote(parentName) + " below " + quote(d.lastAdded.name()));
-            parent = found;
-        }
-        d.lastChild = d.append("AddChildElement", parent, name, text);
-    });
+    shielded("AddChildElement", [&] { edit().addChildElement(name, parentName, text); });
 }
 
 void XMLWrapper::MoveToRoot() {
@@ -544,8 +711,8 @@ void XMLWrapper::InitDocument(std::int32_t kind) {
         d.size = 0;
         d.resetPositions();
         if (s->root) {
-            pugi::xml_node r = d.append("InitDocument", {}, s->root, "");
-            for (const char* c : s->children) d.append("InitDocument", r, c, "");
+            pugi::xml_node r = d.append("InitDocument", {}, Name(s->root, true), "");
+            for (const char* c : s->children) d.append("InitDocument", r, Name(c, true), "");
         }
         d.resetPositions();
     });
@@ -569,12 +736,7 @@ std::int32_t XMLWrapper::CountElements(const std::string& name) const {
 }
 
 void XMLWrapper::SetChildAttribute(const std::string& name, const std::string& value) {
-    shielded("SetChildAttribute", [&] {
-        Impl& d = edit();
-        d.cur("SetChildAttribute");
-        if (!d.lastChild) raise(errc::missing_object, "SetChildAttribute: no child element has been added");
-        d.setAttribute("SetChildAttribute", d.lastChild, name, value);
-    });
+    shielded("SetChildAttribute", [&] { edit().setChildAttribute(name, value); });
 }
 
 void XMLWrapper::SelectElement(const std::string& name) {
@@ -608,8 +770,10 @@ bool XMLWrapper::LoadXML(const std::string& text) {
 }
 
 namespace {
-std::string written(const char* op, const pugi::xml_document& doc, unsigned flags) {
+// `bound`: the document's written size bound, so the text grows in one step.
+std::string written(const char* op, const pugi::xml_document& doc, unsigned flags, std::size_t bound) {
     StringWriter w;
+    w.out.reserve(bound + 64);  // 64: room for the declaration
     doc.save(w, "  ", flags, pugi::encoding_utf8);
     if (w.overflow)
         raise(errc::document_failure,
@@ -621,7 +785,7 @@ std::string written(const char* op, const pugi::xml_document& doc, unsigned flag
 std::string XMLWrapper::XML() const {
     return shielded("XML", [&]() -> std::string {
         if (!impl_ || !impl_->root()) return {};
-        return written("XML", impl_->doc, pugi::format_default | pugi::format_no_declaration);
+        return written("XML", impl_->doc, pugi::format_default | pugi::format_no_declaration, impl_->size);
     });
 }
 
@@ -661,7 +825,7 @@ void XMLWrapper::SaveFile(const std::string& path) const {
     shielded("SaveFile", [&] {
         const Impl& d = view();
         d.cur("SaveFile");
-        const std::string text = written("SaveFile", d.doc, pugi::format_default);
+        const std::string text = written("SaveFile", d.doc, pugi::format_default, d.size);
         std::ofstream out(path, std::ios::binary | std::ios::trunc);
         if (out) out.write(text.data(), static_cast<std::streamsize>(text.size()));
         if (out) out.close();

@@ -51,7 +51,21 @@ thread_local std::exception_ptr t_yieldError;
 
 }  // namespace
 
+namespace {
+
+// True when some timer of the thread is due now.
+bool anyDue() {
+    const std::uint32_t now = threadClock().tickCount();
+    for (const auto& t : threadTimers())
+        if (auto timer = t.lock(); timer && timer->canTick() && since(timer->due, now) >= 0) return true;
+    return false;
+}
+
+}  // namespace
+
 void doEvents() {
+    // A transport yields often and mostly finds nothing due: look before copying the timer list.
+    if (!anyDue()) return;
     std::exception_ptr first;
     for (const auto& timer : liveTimers()) {
         const std::uint32_t now = threadClock().tickCount();

@@ -157,11 +157,12 @@ void glucoseRecord(const BinaryRecord& r) {
     glucose->setCalibration(w.controlFlag == 1 ? 1 : 2);
     glucose->setValue(w.reading);
     glucose->setResultType(w.alternateSiteFlag == 1 ? 11 : w.controlFlag == 1 ? 21 : 10);
-    auto comments = glucose->Comments();
+    // The comment list starts with the first comment.
     constexpr std::int32_t kExerciseComments[] = {11, 10, 12};
-    if (w.exerciseLabel >= 1 && w.exerciseLabel <= 3) comments->Add(kExerciseComments[w.exerciseLabel - 1], 1);
+    if (w.exerciseLabel >= 1 && w.exerciseLabel <= 3)
+        glucose->Comments()->Add(kExerciseComments[w.exerciseLabel - 1], 1);
     for (auto [flag, code] : kGlucoseFlagComments)
-        if (w.*flag == 1) comments->Add(code, 1);
+        if (w.*flag == 1) glucose->Comments()->Add(code, 1);
     r.out.Add(glucose);
 }
 

@@ -10,8 +10,9 @@ ResultPtr ResultCollection::Add(ResultPtr result) {
     return items_.back();
 }
 
-ResultPtr ResultCollection::Item(std::int32_t index) const {
-    if (index < 1 || index > Count()) return nullptr;
+const ResultPtr& ResultCollection::Item(std::int32_t index) const {
+    static const ResultPtr none;
+    if (index < 1 || index > Count()) return none;
     return items_[static_cast<std::size_t>(index - 1)];
 }
 

@@ -78,6 +78,8 @@ inline constexpr ResultShape resultShapes[] = {
 
 constexpr const ResultShape& resultShape(ResultKind kind) { return resultShapes[static_cast<std::size_t>(kind)]; }
 
+class Result;
+
 // What every result offers to the code that groups and identifies results.
 class IResult {
 public:
@@ -92,6 +94,8 @@ public:
     virtual void setId(std::int32_t v) = 0;
     // Which result class this is, for callers that branch on it.
     virtual ResultKind kind() const = 0;
+    // The shape every result class shares; null for anything else.
+    virtual Result* asResult() { return nullptr; }
 };
 
 // The shape all result classes share.
@@ -106,6 +110,7 @@ public:
     std::int32_t MeterGroupId() const final { return meterGroupId_; }
     void setMeterGroupId(std::int32_t v) final { meterGroupId_ = v; }
     ResultKind kind() const final { return kind_; }
+    Result* asResult() final { return this; }
 
     std::int16_t Ordinal() const { return ordinal_; }
     void setOrdinal(std::int16_t v) { ordinal_ = v; }
@@ -184,6 +189,9 @@ public:
     // Reading either list while it holds none starts a new, empty one.
     std::shared_ptr<CommentsCollection> Comments() const { return held(comments_); }
     std::shared_ptr<CommentsCollection> events() const { return held(events_); }
+    // The lists as they are, starting none: most readings carry no comment at all.
+    const CommentsCollection& commentsSeen() const { return comments_ ? *comments_ : kNone; }
+    const CommentsCollection& eventsSeen() const { return events_ ? *events_ : kNone; }
 
 private:
     static std::shared_ptr<CommentsCollection> held(std::shared_ptr<CommentsCollection>& list) {
@@ -191,8 +199,10 @@ private:
         return list;
     }
 
+    static inline const CommentsCollection kNone{};
+
     std::int32_t calibration_ = 0;
-    mutable std::shared_ptr<CommentsCollection> comments_ = std::make_shared<CommentsCollection>();
+    mutable std::shared_ptr<CommentsCollection> comments_;
     mutable std::shared_ptr<CommentsCollection> events_;
 };
 
@@ -252,7 +262,7 @@ public:
     // Appends a result (never null) and returns the same object.
     ResultPtr Add(ResultPtr result);
     // The result at a 1-based position; nullptr when there is none.
-    ResultPtr Item(std::int32_t index) const;
+    const ResultPtr& Item(std::int32_t index) const;
     std::int32_t Count() const { return static_cast<std::int32_t>(items_.size()); }
 
     std::vector<ResultPtr>::const_iterator begin() const { return items_.begin(); }

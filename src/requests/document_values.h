@@ -3,12 +3,12 @@
 // per-type item tables.
 #pragma once
 
+#include <array>
 #include <concepts>
+#include <cstddef>
 #include <cstdint>
 #include <initializer_list>
 #include <string>
-#include <utility>
-#include <vector>
 
 #include "util/date_time.h"
 
@@ -40,7 +40,23 @@ std::string NumberText(double v);
 // A number with at least two digits (the documents' "00" month format).
 std::string TwoDigits(long long value);
 
-// The attributes D, MM, Y (and with the time h, m, s) of a date-time, in document order.
-std::vector<std::pair<const char*, std::string>> dateAttributes(const DateTime& t, bool withTime);
+// The attributes D, MM, Y (and with the time h, m, s) of a date-time, in document
+// order, formatted into fixed buffers: a datalog writes them for every entry.
+class DateAttributes {
+public:
+    struct Attribute {
+        const char* name;
+        char text[24];  // any 64-bit number, sign and terminating zero included
+    };
+    DateAttributes(const DateTime& t, bool withTime);
+    const Attribute* begin() const { return items_.data(); }
+    const Attribute* end() const { return items_.data() + count_; }
+
+private:
+    std::array<Attribute, 6> items_;
+    std::size_t count_ = 0;
+};
+
+inline DateAttributes dateAttributes(const DateTime& t, bool withTime) { return DateAttributes(t, withTime); }
 
 }  // namespace varnel::detail

@@ -8,7 +8,10 @@
 #include <concepts>
 #include <cstdio>
 #include <string>
+#include <string_view>
+#include <typeinfo>
 
+#include "contracts/xml_wrapper_append.h"
 #include "errors/err_propagator.h"
 #include "requests/document_values.h"
 
@@ -20,13 +23,14 @@ namespace {
 constexpr const char* kTrue = "true";
 
 // The concrete class of a result; a result that is not what its kind says is an error, never a guess.
+// The exact class, the usual case, is told by its type alone, without a walk of the hierarchy.
 template <class T>
 const T& as(const Result& r) {
-    return dynamic_cast<const T&>(r);
+    return typeid(r) == typeid(T) ? static_cast<const T&>(r) : dynamic_cast<const T&>(r);
 }
 template <class T>
 T& as(Result& r) {
-    return dynamic_cast<T&>(r);
+    return typeid(r) == typeid(T) ? static_cast<T&>(r) : dynamic_cast<T&>(r);
 }
 
 template <ResultKind K>
@@ -49,15 +53,16 @@ const Coded* lookup(const Coded (&table)[N], std::int32_t type) {
 }
 
 // Writes into the entry element just added under Records.
+// Every name is a constant of this file.
 struct Entry {
-    XMLWrapper& doc;
+    XmlAppender doc;
     const EntryContext& context;
 
-    void attr(const char* name, const std::string& value) { doc.SetAttribute(name, value); }
-    void child(const char* name, const std::string& text = "", const char* parent = "") {
-        doc.AddChildElement(name, parent, text);
+    void attr(const char* name, std::string_view value) { doc.setAttribute(name, value); }
+    void child(const char* name, std::string_view text = {}, const char* parent = "") {
+        doc.addChildElement(name, parent, text);
     }
-    void childAttr(const char* name, const std::string& value) { doc.SetChildAttribute(name, value); }
+    void childAttr(const char* name, std::string_view value) { doc.setChildAttribute(name, value); }
     // Ord: only the binary-datalog meter numbers its entries.
     void ord(const Result& r) {
         if (context.storedMeterType == 7) attr("Ord", NumberText(r.Ordinal()));
@@ -130,20 +135,20 @@ const CommentElement* commentElement(std::int32_t id) {
 void comments(Entry& e, const Glucose& g) {
     // Meters of types 6 and 8 show no comments in the datalog.
     if (e.context.storedMeterType == 6 || e.context.storedMeterType == 8) return;
-    auto list = g.Comments();
-    auto events = g.events();
+    const CommentsCollection& list = g.commentsSeen();
+    const CommentsCollection& events = g.eventsSeen();
     // Any real comment counts, not just the first: a leading code 0 must not hide the rest.
-    bool any = events->Count() > 0;
-    for (const CommentPtr& c : *list) any = any || c->Id() != 0;
+    bool any = events.Count() > 0;
+    for (const CommentPtr& c : list) any = any || c->Id() != 0;
     if (!any) return;
     e.child("Comments");
-    for (const CommentPtr& c : *list) {
+    for (const CommentPtr& c : list) {
         const CommentElement* el = commentElement(c->Id());
         if (!el) continue;
-        e.child(el->element, el->text ? el->text : "", "Comments");
+        e.child(el->element, el->text ? el->text : std::string_view(), "Comments");
         if (el->txt) e.childAttr("Txt", el->txt);
     }
-    for (const CommentPtr& c : *events) {
+    for (const CommentPtr& c : events) {
         e.child("Event", NumberText(c->Id()), "Comments");
         e.childAttr("Txt", "EVENT" + NumberText(c->Id()));
     }
@@ -369,10 +374,6 @@ const char* elementName(const EntryKind& k, const Result& r) {
     return k.kind == ResultKind::InsulinPump && r.ResultType() == 41 ? "MBolus" : k.element;
 }
 
-void dateAttributes(Entry& e, const DateTime& t) {
-    for (const auto& [attribute, value] : dateAttributes(t, true)) e.attr(attribute, value);
-}
-
 void cholesUnit(XMLWrapper& doc, const Cholestrol& first) {
     static constexpr Coded units[] = {{0, "0", "mg/dL"}, {1, "1", "mmol/L"}};
     doc.SelectElement("TransferDetail");
@@ -386,12 +387,15 @@ void cholesUnit(XMLWrapper& doc, const Cholestrol& first) {
 
 Result& asResult(const ResultPtr& p) {
     if (!p) raise(errc::missing_object, "Object variable not set");
-    return dynamic_cast<Result&>(*p);
+    Result* r = p->asResult();
+    if (!r) throw std::bad_cast();  // not one of the result classes, as a failed cast says
+    return *r;
 }
 
 }  // namespace
 
 bool ProcessCommentsAsPerDeviceType(Glucose& result, std::int16_t deviceType) {
+    if (result.commentsSeen().Count() == 0) return true;
     auto list = result.Comments();
     for (std::int32_t i = 1; i <= list->Count();) {
         const std::int32_t id = list->Item(i)->Id();
@@ -415,10 +419,10 @@ bool ProcessCommentsAsPerDeviceType(Glucose& result, std::int16_t deviceType) {
 
 void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryContext& context,
                           UniqueChecker& checker) {
-    Entry e{datalog, context};
+    Entry e{XmlAppender(datalog), context};
     const std::int32_t count = results.Count();
     for (std::int32_t i = 1; i <= count; ++i) {
-        const ResultPtr item = results.Item(i);
+        const ResultPtr& item = results.Item(i);
         Result& first = asResult(item);
         const EntryKind& k = entryKind(first.kind());
 
@@ -430,17 +434,23 @@ void writeReadingsEntries(XMLWrapper& datalog, ResultCollection& results, EntryC
             context.cholesUnitWritten = true;
         }
 
-        datalog.AddElement(elementName(k, first));
+        e.doc.addElement(elementName(k, first));
+        // The flags, then the date: every entry starts with them, set in one call.
+        std::array<XmlAppender::Attribute, 8> head;
+        std::size_t n = 0;
         for (const char* flag : k.flags)
-            if (flag) e.attr(flag, kTrue);
-        dateAttributes(e, first.DateTime());
+            if (flag) head[n++] = {flag, kTrue};
+        const DateAttributes date(first.DateTime(), true);
+        for (const DateAttributes::Attribute& a : date) head[n++] = {a.name, a.text};
+        e.doc.setAttributes({head.data(), n});
         k.write(e, first);
         if (k.value) k.value(e, first, first);
 
+        if (k.merge.most == 0) continue;
         checker.Clear();
         checker.AddValue(NumberText(first.ResultType()));
         for (int absorbed = 0; absorbed < k.merge.most && i < count; ++absorbed) {
-            const ResultPtr nextItem = results.Item(i + 1);
+            const ResultPtr& nextItem = results.Item(i + 1);
             const Result& next = asResult(nextItem);
             if (next.kind() != k.kind) break;
             if (k.merge.sameGroup && next.GroupId() != first.GroupId()) break;
