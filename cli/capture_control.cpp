@@ -1,7 +1,5 @@
 #include "capture_control.h"
 
-#include <dlfcn.h>
-
 #include <filesystem>
 
 #include "varnel/dll_wrapper.h"
@@ -18,18 +16,15 @@ std::string besideTransport(const char* name) {
 
 }  // namespace
 
-CaptureControls::CaptureControls(std::string path, bool replaying) : path_(std::move(path)), replaying_(replaying) {
-    library_ = ::dlopen(path_.c_str(), RTLD_NOW | RTLD_LOCAL);
-    if (!library_) {
-        const char* why = ::dlerror();
-        throw CaptureError("cannot load the capture library " + path_ + ": " + (why ? why : "unknown reason"));
-    }
+CaptureControls::CaptureControls(std::string path, bool replaying)
+    : path_(std::move(path)), replaying_(replaying), library_(path_) {
+    if (!library_) throw CaptureError("cannot load the capture library " + path_ + ": " + library_.why());
 }
 
-CaptureControls::~CaptureControls() { ::dlclose(library_); }
+CaptureControls::~CaptureControls() = default;
 
 void* CaptureControls::symbol(const char* name) const {
-    void* fn = ::dlsym(library_, name);
+    void* fn = library_.find(name);
     if (!fn) throw CaptureError("the capture library " + path_ + " has no " + name);
     return fn;
 }

@@ -6,6 +6,8 @@
 #include <stdexcept>
 #include <string>
 
+#include "shared_library.h"
+
 namespace varnel::cli {
 
 // A capture library that could not be loaded or refused to start; what() says why.
@@ -37,7 +39,7 @@ private:
 
     std::string path_;
     bool replaying_;
-    void* library_;
+    SharedLibrary library_;
 };
 
 }  // namespace varnel::cli

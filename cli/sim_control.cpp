@@ -1,23 +1,17 @@
 #include "sim_control.h"
 
-#include <dlfcn.h>
-
 #include "varnel/vxsim.h"
 
 namespace varnel::cli {
 
-SimulatorControls::SimulatorControls(const std::string& path) : path_(path) {
-    library_ = ::dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL);
-    if (!library_) {
-        const char* why = ::dlerror();
-        throw SimulatorError("cannot load the transport library " + path + ": " + (why ? why : "unknown reason"));
-    }
+SimulatorControls::SimulatorControls(const std::string& path) : path_(path), library_(path) {
+    if (!library_) throw SimulatorError("cannot load the transport library " + path + ": " + library_.why());
 }
 
-SimulatorControls::~SimulatorControls() { ::dlclose(library_); }
+SimulatorControls::~SimulatorControls() = default;
 
 void* SimulatorControls::symbol(const char* name) const {
-    void* fn = ::dlsym(library_, name);
+    void* fn = library_.find(name);
     if (!fn)
         throw SimulatorError("the transport library " + path_ + " has no simulated meters (" + name +
                              " is missing); --sim-type, --sim-profile and --sim-save need the simulated transport");

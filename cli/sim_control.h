@@ -4,6 +4,8 @@
 #include <stdexcept>
 #include <string>
 
+#include "shared_library.h"
+
 namespace varnel::cli {
 
 // A control that could not be reached or refused; what() says which and why.
@@ -34,7 +36,7 @@ private:
     void check(int code, const std::string& what) const;
 
     std::string path_;
-    void* library_;
+    SharedLibrary library_;
 };
 
 }  // namespace varnel::cli
