@@ -144,8 +144,7 @@ TEST_F(CInterface, MissingArgumentsAreRefusedWithoutTouchingAnything) {
     for (std::int32_t got :
          {varnel_discover_device(nullptr, &rec, dv, conn.get(), st),
           varnel_discover_device(c, nullptr, dv, conn.get(), st),
-          varnel_discover_device(c, &rec, nullptr, conn.get(), st), varnel_discover_device(c, &rec, dv, nullptr, st),
-          varnel_discover_device(c, &rec, dv, conn.get(), nullptr),
+          varnel_discover_device(c, &rec, dv, nullptr, st),
           varnel_set_device_settings(c, &rec, dv, nullptr, st),
           varnel_get_device_settings(c, &rec, dv, nullptr, 1, st, nullptr),
           varnel_get_device_caps(c, &rec, nullptr, d.get(), 1, st, nullptr),

@@ -33,18 +33,7 @@ struct Library {
         return reinterpret_cast<F*>(dlsym(handle, name));
     }
 };
-const Library& sim() {
-    static Library l(VARNEL_TEST_TRANSPORT_PATH);
-    return l;
-}
-const Library& recorder() {
-    static Library l(VARNEL_RECORD_PATH);
-    return l;
-}
-const Library& replayer() {
-    static Library l(VARNEL_REPLAY_PATH);
-    return l;
-}
+const Library sim(VARNEL_TEST_TRANSPORT_PATH), recorder(VARNEL_RECORD_PATH), replayer(VARNEL_REPLAY_PATH);
 
 enum class Step { Discover, Settings, SetSettings, Caps, Readings, Clear, Close };
 using Steps = std::vector<Step>;
@@ -118,15 +107,15 @@ Lines runSession(const std::string& transport, const Steps& steps) {
     return seen;
 }
 
-std::string recordError() { return recorder().fn<decltype(vxcap_last_error)>("vxcap_last_error")(); }
-std::string replayError() { return replayer().fn<decltype(vxcap_last_error)>("vxcap_last_error")(); }
+std::string recordError() { return recorder.fn<decltype(vxcap_last_error)>("vxcap_last_error")(); }
+std::string replayError() { return replayer.fn<decltype(vxcap_last_error)>("vxcap_last_error")(); }
 
 // Records the steps on the default simulated meter of a type, with an optional fault.
 Lines record(int type, const Steps& steps, const fs::path& file, const char* faultFunction = nullptr) {
-    sim().fn<decltype(vxsim_select_type)>("vxsim_select_type")(type);
-    if (faultFunction) sim().fn<decltype(vxsim_fail_call)>("vxsim_fail_call")(faultFunction, 1, ME_TIME_OUT, 0);
+    sim.fn<decltype(vxsim_select_type)>("vxsim_select_type")(type);
+    if (faultFunction) sim.fn<decltype(vxsim_fail_call)>("vxsim_fail_call")(faultFunction, 1, ME_TIME_OUT, 0);
     EXPECT_EQ(
-        recorder().fn<decltype(vxcap_record_start)>("vxcap_record_start")(VARNEL_TEST_TRANSPORT_PATH, file.c_str()), 0)
+        recorder.fn<decltype(vxcap_record_start)>("vxcap_record_start")(VARNEL_TEST_TRANSPORT_PATH, file.c_str()), 0)
         << recordError();
     Lines seen = runSession(VARNEL_RECORD_PATH, steps);
     EXPECT_EQ(recordError(), "");
@@ -135,9 +124,9 @@ Lines record(int type, const Steps& steps, const fs::path& file, const char* fau
 
 // Replays a capture under the steps; `finished` tells whether every recorded call was asked for.
 Lines replay(const fs::path& file, const Steps& steps, bool* finished = nullptr) {
-    replayer().fn<decltype(vxcap_replay_start)>("vxcap_replay_start")(file.c_str());
+    replayer.fn<decltype(vxcap_replay_start)>("vxcap_replay_start")(file.c_str());
     Lines seen = runSession(VARNEL_REPLAY_PATH, steps);
-    const int end = replayer().fn<decltype(vxcap_replay_finish)>("vxcap_replay_finish")();
+    const int end = replayer.fn<decltype(vxcap_replay_finish)>("vxcap_replay_finish")();
     if (finished) *finished = end == 0;
     return seen;
 }
@@ -171,12 +160,8 @@ const Steps kFullSession{Step::Discover, Step::Settings, Step::Caps, Step::Readi
 // Every public request on every simulated type: what the client sees on replay is what it saw live.
 TEST(Capture, ReplayShowsTheClientTheRecordedSessionOnEveryMeterType) {
     const std::vector<std::pair<const char*, Steps>> sessions{
-        {"discover", {Step::Discover, Step::Close}},
-        {"settings", {Step::Discover, Step::Settings, Step::Close}},
-        {"set", {Step::Discover, Step::Settings, Step::SetSettings, Step::Close}},
-        {"caps", {Step::Discover, Step::Caps, Step::Close}},
-        {"readings", {Step::Discover, Step::Readings, Step::Close}},
-        {"clear", {Step::Discover, Step::Clear, Step::Close}},
+        {"full", kFullSession},
+        {"set and clear", {Step::Discover, Step::Settings, Step::SetSettings, Step::Clear, Step::Close}},
     };
     for (int type = 1; type <= 8; ++type) {
         for (const auto& [name, steps] : sessions) {
@@ -186,7 +171,6 @@ TEST(Capture, ReplayShowsTheClientTheRecordedSessionOnEveryMeterType) {
             bool finished = false;
             EXPECT_EQ(replay(file, steps, &finished), live);
             EXPECT_TRUE(finished) << replayError();
-            EXPECT_EQ(stepLine(live, Step::Discover), "step 0 code 0 check 1");
             fs::remove(file);
         }
     }
@@ -258,11 +242,8 @@ TEST(Capture, KeptSessionsReplayWithoutDivergence) {
         bool finished = false;
         const Lines seen = replay(file, kFullSession, &finished);
         EXPECT_TRUE(finished) << replayError();
-        for (const std::string& l : seen) {
-            if (l.rfind("step ", 0) == 0) {
-                EXPECT_NE(l.find(" code 0 "), std::string::npos) << l;
-            }
-        }
+        for (const std::string& l : seen)
+            EXPECT_TRUE(l.rfind("step ", 0) != 0 || l.find(" code 0 ") != std::string::npos) << l;
     }
 }
 

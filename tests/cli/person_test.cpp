@@ -3,61 +3,11 @@
 #include <gtest/gtest.h>
 #include <signal.h>
 
-#include <cstdlib>
-
 #include "support/varnel_command.h"
 
 namespace {
 
 using namespace varnel::test;
-
-// A run started in the background: standard error comes through a pipe, line by line.
-struct Running {
-    pid_t pid = 0;
-    FILE* err = nullptr;
-    std::string seen;
-
-    Running(std::vector<std::string> args, const fs::path& out) {
-        args.insert(args.begin(), VARNEL_CLI_PATH);
-        std::vector<char*> argv;
-        for (std::string& a : args) argv.push_back(a.data());
-        argv.push_back(nullptr);
-        int fds[2];
-        EXPECT_EQ(::pipe(fds), 0);
-        posix_spawn_file_actions_t actions;
-        posix_spawn_file_actions_init(&actions);
-        posix_spawn_file_actions_addopen(&actions, 1, out.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-        posix_spawn_file_actions_adddup2(&actions, fds[1], 2);
-        posix_spawn_file_actions_addclose(&actions, fds[0]);
-        EXPECT_EQ(posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ), 0);
-        posix_spawn_file_actions_destroy(&actions);
-        ::close(fds[1]);
-        err = ::fdopen(fds[0], "r");
-    }
-    // Reads standard error up to the first line that starts with `prefix`; false at its end.
-    bool waitFor(const std::string& prefix) {
-        char line[512];
-        while (std::fgets(line, sizeof line, err)) {
-            seen += line;
-            if (std::string(line).rfind(prefix, 0) == 0) return true;
-        }
-        return false;
-    }
-    // The exit status once the run ends; the rest of standard error is in `seen`.
-    int finish() {
-        for (int c; (c = std::fgetc(err)) != EOF;) seen += static_cast<char>(c);
-        std::fclose(err);
-        int wstatus = 0;
-        ::waitpid(pid, &wstatus, 0);
-        return WIFEXITED(wstatus) ? WEXITSTATUS(wstatus) : 128 + WTERMSIG(wstatus);
-    }
-};
-
-// The computer clock as the command sees it, for the runs of one test.
-struct Now {
-    explicit Now(const char* time) { ::setenv("VARNEL_NOW", time, 1); }
-    ~Now() { ::unsetenv("VARNEL_NOW"); }
-};
 
 TEST_F(VarnelCommand, InfoTellsTheMeterInPlainWordsAndWarnsOfAClockThatIsOff) {
     // The test meter's clock stands at 2008-03-07 14:05:09 and holds 2000-2020.
@@ -78,10 +28,7 @@ TEST_F(VarnelCommand, InfoTellsTheMeterInPlainWordsAndWarnsOfAClockThatIsOff) {
         EXPECT_EQ(r.err, c.warning) << c.now;
         const auto shown = lines(r.out);
         ASSERT_EQ(shown.size(), 11u) << r.out;
-        EXPECT_EQ(shown[0], "Model:          Corvia(R) Morvex(TM)");
-        EXPECT_EQ(shown[3], "Firmware:       MX2210 of 2003-05-07");
         EXPECT_EQ(shown[5], "Records:        12 of 1000");
-        EXPECT_EQ(shown[6], "Glucose unit:   mg/dL");
         EXPECT_EQ(shown[8], std::string("Computer clock: ") + c.now);
     }
     // The same warning comes before an upload, and the upload goes on.
@@ -146,10 +93,7 @@ TEST_F(VarnelCommand, SettingsWrittenBackUnchangedOnEveryMeterType) {
 }
 
 TEST_F(VarnelCommand, ExitStatusesTellUsageFilesAndRequestsApart) {
-    Outcome r = varnel({"--version"});
-    EXPECT_EQ(r.status, 0);
-    EXPECT_EQ(r.out.rfind("varnel ", 0), 0u) << r.out;
-    r = varnel({"readngs"});
+    Outcome r = varnel({"readngs"});
     EXPECT_EQ(r.status, 64);
     EXPECT_EQ(r.err, "varnel: unknown command 'readngs'; did you mean 'readings'? ('varnel --help' lists the commands)\n");
     // An output that cannot be written is found before the meter is touched.

@@ -53,11 +53,8 @@ TEST_F(Caps, FullDescriptionListsEveryItemAndRecordKind) {
         expectExit(describe(), ME_SUCCESS, kReportOk, false);
         EXPECT_EQ(described(), full);
         EXPECT_TRUE(checked);
-        // One even step per entry, capped at 100: type 4 steps 17 at a time.
-        const int entries = static_cast<int>(std::count(full.begin(), full.end(), ' ')) - 2;
-        const int step = static_cast<int>(std::nearbyint(100.0 / entries));
-        ASSERT_EQ(progress.size(), std::size_t(entries));
-        for (int i = 0; i < entries; ++i) EXPECT_EQ(progress[i], std::min(step * (i + 1), 100));
+        // One step per entry (the stepping itself: the settings request's test).
+        EXPECT_EQ(progress.size(), std::size_t(std::count(full.begin(), full.end(), ' ') - 2));
     }
 }
 
@@ -69,7 +66,6 @@ TEST_F(Caps, LimitsModesAndWords) {
     discover(tarn);
     ASSERT_EQ(describe(), ME_SUCCESS);
     EXPECT_EQ(described().find("Decimal"), std::string::npos);
-    EXPECT_EQ(progress.size(), 15u);
     EXPECT_EQ(at("Settings/Clock") + at("Settings/Clock/Min") + at("Settings/Clock/Max"),
               "Mode=1 D=1 MM=01 Y=1990 D=31 MM=12 Y=2014 ");
     EXPECT_EQ(childTexts(parsed(caps)->document_element().first_element_by_path("Settings/Language/ValidLang")),

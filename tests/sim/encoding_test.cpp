@@ -1,7 +1,6 @@
 // Time conversion and the binary datalog encoding.
 #include <gmock/gmock.h>
 
-
 #include "fixture.h"
 
 using namespace varnel::sim;
@@ -13,6 +12,16 @@ namespace {
 TIME_REC timeRec(int y, int mo, int d, int h = 0, int mi = 0, int s = 0) {
     using I = std::int16_t;
     return TIME_REC{I(s), I(mi), I(h), I(d), I(mo), I(y), 0, 0, 0};
+}
+
+// CRC-16/CCITT (polynomial 0x1021, start 0xFFFF) bit by bit, as another reader of the layout computes it.
+std::uint16_t bitwiseCrc(const std::uint8_t* p, std::size_t n) {
+    std::uint16_t crc = 0xFFFF;
+    while (n--) {
+        crc ^= static_cast<std::uint16_t>(*p++ << 8);
+        for (int bit = 0; bit < 8; ++bit) crc = static_cast<std::uint16_t>(crc & 0x8000 ? (crc << 1) ^ 0x1021 : crc << 1);
+    }
+    return crc;
 }
 
 bool same(const RECORD_DATA& a, const RECORD_DATA& b) { return std::memcmp(&a, &b, sizeof a) == 0; }
@@ -50,15 +59,22 @@ TEST(TimeConversion, ExactInversesWithWeekdayAndYearDayWithinTheValidRange) {
     EXPECT_EQ(t.mday, 29);  // untouched
 }
 
+// Each record decodes as written and carries its checksum over index..payload.
 TEST(BinaryDatalog, DefaultMeterLogDecodesRecordByRecord) {
+    const std::uint8_t check[] = {'1', '2', '3', '4', '5', '6', '7', '8', '9'};
+    ASSERT_EQ(bitwiseCrc(check, sizeof check), 0x29B1);  // the reference value of this CRC
     const MeterProfile p = defaultProfile(7);
     auto log = std::make_unique<METER_BIN_DATALOG>();
     encodeBinaryDatalog(p.binaryDatalog, *log);
     ASSERT_EQ(log->recordCount, std::int16_t(p.binaryDatalog.size()));
+    const std::uint8_t* table = log->binBuf + 4;
     for (int i = 0; i < log->recordCount; ++i) {
         RECORD_DATA r{};
         ASSERT_EQ(GetMeterDatalogRecordData(log.get(), std::int16_t(i), &r), ME_SUCCESS) << i;
         ASSERT_TRUE(same(r, p.binaryDatalog[std::size_t(i)])) << "record " << i;
+        const std::uint8_t* start = log->binBuf + (table[2 * i] | (table[2 * i + 1] << 8));
+        const std::size_t covered = 10 + start[3];  // index, type, length, time, ordinal, payload
+        EXPECT_EQ(start[covered] | (start[covered + 1] << 8), bitwiseCrc(start, covered)) << "record " << i;
     }
 }
 

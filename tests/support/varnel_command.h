@@ -9,6 +9,7 @@
 #include <pugixml.hpp>
 
 #include <cstdio>
+#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
@@ -48,6 +49,55 @@ inline std::vector<std::string> lines(const std::string& text) {
     return result;
 }
 
+// The command started as a process: standard output to a file, standard error through a pipe, line by line.
+struct Running {
+    pid_t pid = 0;
+    FILE* err = nullptr;
+    std::string seen;
+
+    Running(std::vector<std::string> args, const fs::path& out) {
+        args.insert(args.begin(), VARNEL_CLI_PATH);
+        std::vector<char*> argv;
+        for (std::string& a : args) argv.push_back(a.data());
+        argv.push_back(nullptr);
+        int fds[2];
+        EXPECT_EQ(::pipe(fds), 0);
+        posix_spawn_file_actions_t actions;
+        posix_spawn_file_actions_init(&actions);
+        posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
+        posix_spawn_file_actions_addopen(&actions, 1, out.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+        posix_spawn_file_actions_adddup2(&actions, fds[1], 2);
+        posix_spawn_file_actions_addclose(&actions, fds[0]);
+        EXPECT_EQ(posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ), 0);
+        posix_spawn_file_actions_destroy(&actions);
+        ::close(fds[1]);
+        err = ::fdopen(fds[0], "r");
+    }
+    // Reads standard error up to the first line that starts with `prefix`; false at its end.
+    bool waitFor(const std::string& prefix) {
+        char line[512];
+        while (std::fgets(line, sizeof line, err)) {
+            seen += line;
+            if (std::string(line).rfind(prefix, 0) == 0) return true;
+        }
+        return false;
+    }
+    // The exit status once the run ends; the rest of standard error is in `seen`.
+    int finish() {
+        for (int c; (c = std::fgetc(err)) != EOF;) seen += static_cast<char>(c);
+        std::fclose(err);
+        int wstatus = 0;
+        ::waitpid(pid, &wstatus, 0);
+        return WIFEXITED(wstatus) ? WEXITSTATUS(wstatus) : 128 + WTERMSIG(wstatus);
+    }
+};
+
+// The computer clock as the command sees it, for the runs of one test.
+struct Now {
+    explicit Now(const char* time) { ::setenv("VARNEL_NOW", time, 1); }
+    ~Now() { ::unsetenv("VARNEL_NOW"); }
+};
+
 class VarnelCommand : public ::testing::Test {
 protected:
     fs::path dir;
@@ -73,27 +123,12 @@ protected:
     void TearDown() override { fs::remove_all(dir); }
 
     Outcome varnel(std::vector<std::string> args) const {
-        args.insert(args.begin(), VARNEL_CLI_PATH);
-        std::vector<char*> argv;
-        for (std::string& a : args) argv.push_back(a.data());
-        argv.push_back(nullptr);
-        const fs::path out = dir / "stdout", err = dir / "stderr";
-        posix_spawn_file_actions_t actions;
-        posix_spawn_file_actions_init(&actions);
-        posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
-        posix_spawn_file_actions_addopen(&actions, 1, out.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-        posix_spawn_file_actions_addopen(&actions, 2, err.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-        pid_t pid = 0;
-        Outcome run;
-        if (posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ) == 0) {
-            int wstatus = 0;
-            ::waitpid(pid, &wstatus, 0);
-            run.status = WIFEXITED(wstatus) ? WEXITSTATUS(wstatus) : 128 + WTERMSIG(wstatus);
-        }
-        posix_spawn_file_actions_destroy(&actions);
-        run.out = slurp(out);
-        run.err = slurp(err);
-        return run;
+        Running run(std::move(args), dir / "stdout");
+        Outcome r;
+        r.status = run.finish();
+        r.err = run.seen;
+        r.out = slurp(dir / "stdout");
+        return r;
     }
 
     // The test meter as the last run saved it.
@@ -105,16 +140,6 @@ protected:
         pugi::xml_document doc;
         const pugi::xml_node log = saved(doc).child("binaryDatalog");
         return static_cast<std::size_t>(std::distance(log.begin(), log.end()));
-    }
-
-    // A readings run on the test meter, its datalog parsed.
-    pugi::xml_node readings(pugi::xml_document& doc, std::vector<std::string> more = {}) const {
-        std::vector<std::string> args{"readings", "-q", "--sim-profile", meter.string()};
-        args.insert(args.end(), more.begin(), more.end());
-        const Outcome r = varnel(args);
-        EXPECT_EQ(r.status, 0) << r.err;
-        EXPECT_TRUE(doc.load_string(r.out.c_str())) << r.out;
-        return doc.child("Datalog");
     }
 };
 
