@@ -85,6 +85,8 @@ TEST_F(VarnelCommand, SettingsWrittenBackUnchangedOnEveryMeterType) {
         for (int t = 1; t <= 8; ++t) {
             const auto& [status, err] = ends[static_cast<std::size_t>(t - 1)];
             EXPECT_EQ(status, 0) << name << " type " << t << ": " << err;
+            // Both documents a client gets to edit keep to the settings schema.
+            EXPECT_EQ(varnel({"validate", file(name, t)}).status, 0) << name << " type " << t;
             // The full document brings read-only items, which are skipped and said; the writable one brings none.
             EXPECT_EQ(err.find("varnel: skipped the items the meter only reports: "), name[0] == 'c' ? 0 : std::string::npos)
                 << name << " type " << t << ": " << err;
