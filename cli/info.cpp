@@ -41,7 +41,7 @@ std::string recordsText(XMLWrapper& datalog) {
     const std::string corrupted = datalog.GetChildValue("Corrupted");
     datalog.MoveToRoot();
     std::string text = total + " of " + capacity;
-    if (!corrupted.empty() && corrupted != "0") text += " (" + corrupted + " could not be read)";
+    if (!corrupted.empty() && corrupted != "0") text += " (" + corrupted + " damaged, left out of the datalog)";
     return text;
 }
 
