@@ -77,6 +77,16 @@ R shielded(R failed, F&& body) noexcept {
     }
 }
 
+// Runs a request that says whether the meter should be checked again, and hands that to the
+// caller when it asked (check_meter may be null).
+template <class F>
+std::int32_t reportingCheck(int* check_meter, F&& call) {
+    bool check = false;
+    const std::int32_t result = call(check);
+    if (check_meter) *check_meter = check;
+    return result;
+}
+
 }  // namespace
 }  // namespace varnel::detail
 
@@ -84,6 +94,7 @@ using varnel::DllWrapper;
 using varnel::XMLWrapper;
 using varnel::detail::request;
 using varnel::detail::shielded;
+using varnel::detail::reportingCheck;
 
 extern "C" {
 
@@ -145,22 +156,18 @@ int32_t varnel_set_device_settings(varnel_component* c, METER_REC* rec, varnel_d
 int32_t varnel_get_device_settings(varnel_component* c, METER_REC* rec, varnel_doc* device_info, varnel_doc* device_cfg,
                                    int fetch_all, varnel_doc* status, int* check_meter) {
     return request(c, rec && device_info && device_cfg && status, [&](DllWrapper& w) {
-        bool check = false;
-        const std::int32_t result =
-            w.getDeviceSettings(*rec, device_info->xml, device_cfg->xml, fetch_all != 0, status->xml, check);
-        if (check_meter) *check_meter = check;
-        return result;
+        return reportingCheck(check_meter, [&](bool& check) {
+            return w.getDeviceSettings(*rec, device_info->xml, device_cfg->xml, fetch_all != 0, status->xml, check);
+        });
     });
 }
 
 int32_t varnel_get_device_caps(varnel_component* c, METER_REC* rec, varnel_doc* device_info, varnel_doc* device_caps,
                                int fetch_all, varnel_doc* status, int* check_meter) {
     return request(c, rec && device_info && device_caps && status, [&](DllWrapper& w) {
-        bool check = false;
-        const std::int32_t result =
-            w.getDeviceCaps(*rec, device_info->xml, device_caps->xml, fetch_all != 0, status->xml, check);
-        if (check_meter) *check_meter = check;
-        return result;
+        return reportingCheck(check_meter, [&](bool& check) {
+            return w.getDeviceCaps(*rec, device_info->xml, device_caps->xml, fetch_all != 0, status->xml, check);
+        });
     });
 }
 
@@ -168,11 +175,10 @@ int32_t varnel_get_readings(varnel_component* c, METER_REC* rec, varnel_doc* dev
                             varnel_doc* filter, varnel_doc* status, int* check_meter) {
     return request(c, rec && device_info && datalog && status, [&](DllWrapper& w) {
         XMLWrapper noFilter;
-        bool check = false;
-        const std::int32_t result =
-            w.getReadings(*rec, device_info->xml, datalog->xml, filter ? filter->xml : noFilter, status->xml, check);
-        if (check_meter) *check_meter = check;
-        return result;
+        return reportingCheck(check_meter, [&](bool& check) {
+            return w.getReadings(*rec, device_info->xml, datalog->xml, filter ? filter->xml : noFilter, status->xml,
+                                 check);
+        });
     });
 }
 

@@ -5,15 +5,7 @@
 
 #include "varnel/varnel.h"
 
-static int failures = 0;
-
-#define CHECK(cond)                                                            \
-    do {                                                                       \
-        if (!(cond)) {                                                         \
-            fprintf(stderr, "%s:%d: failed: %s\n", __FILE__, __LINE__, #cond); \
-            ++failures;                                                        \
-        }                                                                      \
-    } while (0)
+#include "../support/c_check.h"
 
 int main(int argc, char** argv) {
     if (argc != 2) {

@@ -10,15 +10,7 @@
 
 #include "varnel/vantrix32.h"
 
-static int failures = 0;
-
-#define CHECK(cond)                                                            \
-    do {                                                                       \
-        if (!(cond)) {                                                         \
-            fprintf(stderr, "%s:%d: failed: %s\n", __FILE__, __LINE__, #cond); \
-            ++failures;                                                        \
-        }                                                                      \
-    } while (0)
+#include "../support/c_check.h"
 
 /* Every function of the library, resolved by name. */
 static struct {
