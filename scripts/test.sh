@@ -1,18 +1,31 @@
 #!/usr/bin/env bash
-# Installs what is missing, builds everything and runs the whole test suite
-# (build/); then the same suite built with AddressSanitizer and
-# UndefinedBehaviorSanitizer, which stop at the first finding (build-asan/);
-# then each fuzz target for a minute (VARNEL_FUZZ_SECONDS) on its seed corpus (build-fuzz/).
-# Every stage runs; the command fails when any of them failed.
+# The test command. Installs what is missing, builds everything into build/
+# and runs the whole suite there (fault sweep, command, packaging, schemas and
+# capture tests included).
+#
+# --all adds what CI runs: the benchmark program (run once by the suite), the
+# same suite built with AddressSanitizer and UndefinedBehaviorSanitizer
+# (build-asan/), each fuzz target for a minute (VARNEL_FUZZ_SECONDS) on its
+# seed corpus (build-fuzz/), and every further stage found in scripts/ (the
+# Windows cross build under Wine). Every stage runs; the command fails when any
+# of them failed.
 set -uo pipefail
 cd "$(dirname "$0")/.."
 jobs="$(nproc)"
+all=0
+case "${1:-}" in
+  "") ;;
+  --all) all=1 ;;
+  *) echo "usage: bash scripts/test.sh [--all]" >&2; exit 64 ;;
+esac
 failed=()
 
 stage() {
   local name="$1"; shift
   echo "== $name"
+  local start=$SECONDS
   if ! "$@"; then failed+=("$name"); fi
+  echo "== $name: $((SECONDS - start)) s"
 }
 
 suite() {
@@ -27,15 +40,19 @@ sanitized() {
       suite build-asan
 }
 
-if ! bash scripts/build.sh; then
+if ! VARNEL_BENCH=$all bash scripts/build.sh; then
   echo "The build failed." >&2
   exit 1
 fi
 stage "test suite" suite build
-stage "test suite under sanitizers" sanitized
-stage "fuzzing" bash scripts/fuzz.sh "${VARNEL_FUZZ_SECONDS:-60}"
+if [ $all = 1 ]; then
+  stage "test suite under sanitizers" sanitized
+  stage "fuzzing" bash scripts/fuzz.sh "${VARNEL_FUZZ_SECONDS:-60}"
+  [ -f scripts/windows.sh ] && stage "Windows" bash scripts/windows.sh
+fi
 
 if [ ${#failed[@]} -gt 0 ]; then
   echo "Failed: ${failed[*]}" >&2
   exit 1
 fi
+echo "All stages passed."
