@@ -4,7 +4,7 @@
 #include <memory>
 
 #include "documents.h"
-#include "export.h"
+#include "varnel/readings.h"
 #include "output.h"
 #include "session.h"
 #include "settings_commands.h"

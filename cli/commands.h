@@ -6,7 +6,7 @@
 
 #include <string>
 
-#include "export.h"
+#include "varnel/readings.h"
 #include "session.h"
 #include "varnel/xml_wrapper.h"
 

@@ -1,10 +1,13 @@
 #include "report_command.h"
 
 #include <memory>
+#include <optional>
 #include <string>
 
 #include "commands.h"
+#include "meter_clock.h"
 #include "report.h"
+#include "varnel/version.h"
 
 namespace varnel::cli {
 
@@ -16,8 +19,21 @@ struct ReportLine {
     std::string unit = "mgdl";
 };
 
-using Render = std::string (*)(const Datalog&, GlucoseUnit);
+// What is wrong with the meter clock compared with the computer's, "" when nothing is; nothing when it
+// cannot be read.
+std::optional<std::string> meterClockWarning(MeterSession& s, const LocalTime& computer) {
+    try {
+        std::string warning = clockWarning(readMeterClock(s), computer);
+        const std::string prefix = "warning: ";
+        if (warning.rfind(prefix, 0) == 0) warning.erase(0, prefix.size());
+        return warning;
+    } catch (const RunEnd& end) {
+        if (end.status >= exit_status::interrupted) throw;
+        return std::nullopt;
+    }
+}
 
+template <class Render>
 void addSummaryCommand(CLI::App& app, int& status, const char* name, const char* help, Render render) {
     auto cl = std::make_shared<ReportLine>();
     auto* cmd = app.add_subcommand(name, help);
@@ -26,8 +42,7 @@ void addSummaryCommand(CLI::App& app, int& status, const char* name, const char*
     addUnitOption(cmd, cl->unit);
     cmd->callback([cl, &status, render] {
         status = MeterSession(cl->meter).run([&](MeterSession& s) {
-            const XMLWrapper datalog = uploadDatalog(s);
-            emit(cl->output, render(readDatalog(datalog.XML()), glucoseUnit(cl->unit)));
+            emit(cl->output, render(s, glucoseUnit(cl->unit)));
         });
     });
 }
@@ -36,9 +51,15 @@ void addSummaryCommand(CLI::App& app, int& status, const char* name, const char*
 
 void addReportCommands(CLI::App& app, int& status) {
     addSummaryCommand(app, status, "report",
-                      "Upload the readings and write a printable HTML report with the glucose summary and charts",
-                      reportHtml);
-    addSummaryCommand(app, status, "summary", "Upload the readings and print the glucose summary as text", summaryText);
+                      "Upload the readings and write a printable HTML report: summary, charts, logbook, low "
+                      "glucose and treatment",
+                      [](MeterSession& s, GlucoseUnit unit) {
+                          const LocalTime now = computerNow();
+                          const ReportContext context{now.text(), VARNEL_VERSION_STRING, meterClockWarning(s, now)};
+                          return reportHtml(readDatalog(uploadDatalog(s).XML()), unit, context);
+                      });
+    addSummaryCommand(app, status, "summary", "Upload the readings and print the glucose summary as text",
+                      [](MeterSession& s, GlucoseUnit unit) { return summaryText(readDatalog(uploadDatalog(s).XML()), unit); });
 }
 
 }  // namespace varnel::cli

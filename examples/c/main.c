@@ -19,6 +19,15 @@ static int attribute(const char* element, const char* name) {
     return at && end && at < end ? atoi(at + strlen(key)) : 0;
 }
 
+/* True when the element starting at element has attribute name with that exact text. */
+static int has_text(const char* element, const char* name, const char* text) {
+    char key[64];
+    snprintf(key, sizeof key, " %s=\"%s\"", name, text);
+    const char* end = strchr(element, '>');
+    const char* at = strstr(element, key);
+    return at && end && at < end;
+}
+
 static int failed(const char* request, int32_t code, varnel_component* c, const varnel_doc* status) {
     char* text = varnel_doc_xml(status);
     fprintf(stderr, "%s failed (%d)\n%s\n", request, (int)code, text ? text : "");
@@ -59,6 +68,8 @@ int main(void) {
     }
     text = varnel_doc_xml(datalog);
     for (const char* at = text ? strstr(text, "<Gluc ") : NULL; at; at = strstr(at + 1, "<Gluc ")) {
+        /* Blood glucose only: control-solution and check-strip readings test the meter, not the blood. */
+        if (!has_text(at, "Txt", "Blood")) continue;
         printf("%04d-%02d-%02d %02d:%02d  %d\n", attribute(at, "Y"), attribute(at, "MM"), attribute(at, "D"),
                attribute(at, "h"), attribute(at, "m"), attribute(at, "Val"));
     }

@@ -2,6 +2,7 @@
 // prints what it is and one line per glucose reading, and releases it.
 #include <varnel/component_error.h>
 #include <varnel/dll_wrapper.h>
+#include <varnel/readings.h>
 #include <varnel/return_codes.h>
 #include <varnel/xml_wrapper.h>
 
@@ -16,8 +17,6 @@ varnel::XMLWrapper document(std::int32_t kind) {
     doc.InitDocument(kind);
     return doc;
 }
-
-std::string twoDigits(const std::string& text) { return text.size() == 1 ? "0" + text : text; }
 
 // Says what a failed request reported in its status document.
 int failed(const char* request, std::int32_t code, const varnel::XMLWrapper& status) {
@@ -52,12 +51,12 @@ int main() {
         meter.closeMeter(rec);
         if (code != 0) return failed("getReadings", code, status);
 
-        datalog.SelectElement("Records");
-        for (std::int32_t i = 0; i < datalog.GetChildCount(); ++i) {
-            if (datalog.GetChildName(i) != "Gluc") continue;
-            const auto at = [&](const char* name) { return twoDigits(datalog.GetChildAttributeAt(i, name)); };
-            std::cout << at("Y") << "-" << at("MM") << "-" << at("D") << " " << at("h") << ":" << at("m") << "  "
-                      << datalog.GetChildAttributeAt(i, "Val") << "\n";
+        // Blood glucose only: control-solution and check-strip readings test the meter, not the blood.
+        for (const varnel::Reading& r : varnel::readDatalog(datalog.XML()).readings) {
+            if (r.kind != "glucose" || r.values.empty() || r.time.size() < 16) continue;
+            std::string time = r.time.substr(0, 16);  // "2008-02-15T07:05"
+            time[10] = ' ';
+            std::cout << time << "  " << r.values.front().value << "\n";
         }
         return 0;
     } catch (const varnel::ComponentError& e) {

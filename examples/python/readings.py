@@ -6,7 +6,7 @@ with varnel.Component() as meter:
     device = meter.discover(port=1)
     info = device.find("DeviceInfo")
     print(f"meter: {info.findtext('Name')}, type {info.findtext('TypeID')}, serial number {info.findtext('SN')}")
-    log = meter.get_readings()
-    for reading in log.find("Records").findall("Gluc"):
-        a = reading.attrib
-        print(f"{a['Y']}-{int(a['MM']):02}-{int(a['D']):02} {int(a['h']):02}:{int(a['m']):02}  {a['Val']}")
+    # Blood glucose only: control-solution and check-strip readings test the meter, not the blood.
+    for reading in varnel.readings(meter.get_readings()):
+        if reading["kind"] == "glucose":
+            print(f"{reading['time']:%Y-%m-%d %H:%M}  {reading['values'][0]['value']}")

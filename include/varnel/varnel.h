@@ -43,9 +43,14 @@ VARNEL_API int varnel_doc_load(varnel_doc* doc, const char* xml);
 /* The document as text, newly allocated ("" when empty); release with varnel_free.
    NULL for a NULL document or when out of memory. */
 VARNEL_API char* varnel_doc_xml(const varnel_doc* doc);
+/* The readings of a datalog document as the JSON of `varnel readings --json`
+   (docs/exports.md), newly allocated; glucose in mmol/L when glucose_mmol is
+   non-zero, else in the meter's unit. Release with varnel_free. NULL when the
+   document is not a datalog (or NULL), or when out of memory. */
+VARNEL_API char* varnel_doc_readings_json(const varnel_doc* datalog, int glucose_mmol);
 /* Releases a document; NULL does nothing. */
 VARNEL_API void varnel_doc_free(varnel_doc* doc);
-/* Releases a text of varnel_doc_xml; NULL does nothing. */
+/* Releases a text of varnel_doc_xml or varnel_doc_readings_json; NULL does nothing. */
 VARNEL_API void varnel_free(void* text);
 
 /* A component over the transport library at that path (loaded on the first

@@ -51,3 +51,34 @@ def test_a_whole_session_through_the_package():
     with varnel.Component(transport="/nonexistent/libnotransport.so") as broken:
         with pytest.raises(varnel.ComponentError, match="/nonexistent/libnotransport.so.*cannot open shared object"):
             broken.discover()
+
+
+def test_readings_as_python_values():
+    from datetime import datetime
+
+    with varnel.Component() as c:
+        c.discover(port=1)
+        log = c.get_readings()
+    entries = log.find("Records")
+    got = varnel.readings(log)
+    assert len(got) == len(entries)
+    assert all(r["serial"] == log.findtext("DeviceInfo/SN") for r in got)
+    # Each entry's own number and date, as Python values.
+    assert [r["ord"] for r in got] == [int(e.get("Ord")) for e in entries]
+    first = entries[0].attrib
+    assert got[0]["time"] == datetime(int(first["Y"]), int(first["MM"]), int(first["D"]),
+                                      int(first["h"]), int(first["m"]), int(first["s"]))
+    # A control-solution reading is not glucose.
+    control = [r for r in got if r["time"] == datetime(2008, 2, 27, 6, 7, r["time"].second)]
+    assert [r["kind"] for r in control] == ["control"]
+    assert control[0]["values"][0]["value"] == 121
+    mmol = varnel.readings(ET.tostring(log, encoding="unicode"), mmol=True)
+    assert [r for r in mmol if r["kind"] == "control"][0]["values"][0] == {
+        "quantity": "control", "value": 6.7, "unit": "mmol/L"}
+
+    with pytest.raises(ValueError):
+        varnel.readings("<DeviceSettings/>")
+
+    pandas = pytest.importorskip("pandas")
+    frame = varnel.readings_frame(log)
+    assert len(frame) >= len(got) and isinstance(frame, pandas.DataFrame)

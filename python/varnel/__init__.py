@@ -4,13 +4,14 @@
     with varnel.Component() as c:
         device = c.discover(port=1)
         log = c.get_readings()
+        glucose = [r for r in varnel.readings(log) if r["kind"] == "glucose"]
 """
 import ctypes
 import os
 import xml.etree.ElementTree as ET
 from pathlib import Path
 
-__all__ = ["Component", "RequestError", "ComponentError", "METER_REC", "library"]
+__all__ = ["Component", "RequestError", "ComponentError", "METER_REC", "library", "readings", "readings_frame"]
 
 _LIBRARY_NAME = "libvarnel.so.0"
 
@@ -280,3 +281,6 @@ class Component:
             raise ComponentError(number, text.decode("utf-8", "replace") if text else "")
         descriptions = [e.text or "" for e in status.element().iter("ErrDesc")] if status else []
         raise RequestError(request, code, descriptions)
+
+
+from .readings import readings, readings_frame  # noqa: E402  (needs the names above)

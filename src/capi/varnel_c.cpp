@@ -11,6 +11,7 @@
 
 #include "errors/err_propagator.h"
 #include "varnel/dll_wrapper.h"
+#include "varnel/readings.h"
 #include "varnel/xml_wrapper.h"
 
 struct varnel_doc {
@@ -87,11 +88,19 @@ std::int32_t reportingCheck(int* check_meter, F&& call) {
     return result;
 }
 
+// A text the client releases with varnel_free; NULL when out of memory.
+char* copyOf(const std::string& text) {
+    char* copy = static_cast<char*>(std::malloc(text.size() + 1));
+    if (copy) std::memcpy(copy, text.c_str(), text.size() + 1);
+    return copy;
+}
+
 }  // namespace
 }  // namespace varnel::detail
 
 using varnel::DllWrapper;
 using varnel::XMLWrapper;
+using varnel::detail::copyOf;
 using varnel::detail::request;
 using varnel::detail::shielded;
 using varnel::detail::reportingCheck;
@@ -115,11 +124,14 @@ int varnel_doc_load(varnel_doc* doc, const char* xml) {
 
 char* varnel_doc_xml(const varnel_doc* doc) {
     if (!doc) return nullptr;
+    return shielded<char*>(nullptr, [&] { return copyOf(doc->xml.XML()); });
+}
+
+char* varnel_doc_readings_json(const varnel_doc* datalog, int glucose_mmol) {
+    if (!datalog) return nullptr;
     return shielded<char*>(nullptr, [&] {
-        const std::string text = doc->xml.XML();
-        char* copy = static_cast<char*>(std::malloc(text.size() + 1));
-        if (copy) std::memcpy(copy, text.c_str(), text.size() + 1);
-        return copy;
+        const auto unit = glucose_mmol ? varnel::GlucoseUnit::mmol : varnel::GlucoseUnit::meter;
+        return copyOf(varnel::readingsJson(varnel::readDatalog(datalog->xml.XML()), unit));
     });
 }
 

@@ -5,9 +5,11 @@
 
 #include <cstdio>
 #include <map>
+#include <regex>
 #include <set>
 
-#include "export.h"
+#include "exports/csv.h"
+#include "varnel/readings.h"
 #include "support/varnel_command.h"
 
 namespace {
@@ -63,7 +65,7 @@ std::string describe(const std::vector<std::vector<std::string>>& lines) {
     std::string text = lines.front()[1] + ":";
     for (const auto& l : lines) {
         if (l[2].empty()) continue;
-        const auto number = varnel::cli::numberIn(l[3]);
+        const auto number = varnel::numberIn(l[3]);
         text += " " + l[2] + "=" + (number ? valueText(*number) : l[3]) + " " + l[4] + " " + l[7] + ";";
     }
     return text;
@@ -113,13 +115,20 @@ TEST_F(VarnelCommand, CsvAndJsonHoldEveryEntryOfTheDatalogValueForValue) {
         const auto csv = parseCsv(csvText);
         ASSERT_FALSE(csv.empty());
         EXPECT_EQ(csv[0], (std::vector<std::string>{"date-time", "kind", "quantity", "value", "unit", "slot",
-                                                    "comments", "range"}));
+                                                    "comments", "range", "ord", "serial", "model"}));
+        // What merging several meters and uploads needs: the meter on every line, each entry's own number.
+        const pugi::xml_node device = xml.child("Datalog").child("DeviceInfo");
+        EXPECT_EQ(doc["meter"]["serial"], device.child_value("SN"));
+        std::set<std::string> ords;
 
         std::size_t line = 1, i = 0;
         for (const pugi::xml_node& entry : xml.child("Datalog").child("Records").children()) {
             ASSERT_LT(i, doc["readings"].size());
             const json& r = doc["readings"][i++];
             EXPECT_EQ(r["time"], entryTime(entry));
+            const std::string ord = entry.attribute("Ord").value();
+            EXPECT_EQ(r["ord"], ord.empty() ? json() : json(std::stoll(ord)));
+            EXPECT_TRUE(ord.empty() || ords.insert(ord).second) << "Ord " << ord << " twice";
             kinds.insert(r["kind"].get<std::string>());
             // Its CSV lines: one per value, at least one.
             std::vector<std::vector<std::string>> lines;
@@ -128,6 +137,8 @@ TEST_F(VarnelCommand, CsvAndJsonHoldEveryEntryOfTheDatalogValueForValue) {
                 lines.push_back(csv[line++]);
                 EXPECT_EQ(lines.back()[0], r["time"]);
                 EXPECT_EQ(lines.back()[5], r.value("slot", ""));
+                EXPECT_EQ(std::vector<std::string>(lines.back().begin() + 8, lines.back().end()),
+                          (std::vector<std::string>{ord, device.child_value("SN"), device.child_value("Name")}));
             }
             EXPECT_EQ(describe(lines), describe(r)) << entryTime(entry);
             if (const auto row = expected.find(r["time"]); row != expected.end()) {
@@ -136,6 +147,7 @@ TEST_F(VarnelCommand, CsvAndJsonHoldEveryEntryOfTheDatalogValueForValue) {
             }
         }
         EXPECT_EQ(i, doc["readings"].size());
+        if (profile == kEveryKind) EXPECT_EQ(ords.size(), i);  // the binary-datalog meter numbers every entry
         EXPECT_EQ(line, csv.size());
         // RFC 4180: the insulin name with a comma and a quote, quoted with the quote doubled.
         if (profile == kEveryKind) {
@@ -157,19 +169,30 @@ TEST_F(VarnelCommand, CsvInMmolConvertsGlucoseOnlyAndSaysSoInTheHeader) {
     const auto mmol = parseCsv(varnel({"readings", "-q", "--csv", "--sim-profile", kRecordLog, "--unit", "mmol"}).out);
     ASSERT_EQ(mmol.size(), mgdl.size());
     EXPECT_NE(mmol[0][3].find("mmol/L"), std::string::npos) << mmol[0][3];
-    int converted = 0;
+    int converted = 0, ranges = 0;
     for (std::size_t i = 1; i < mgdl.size(); ++i) {
         auto want = mgdl[i];
-        if (want[4] == "mg/dL") {
+        const auto mmolOf = [](const std::string& mgdlText) {
             char text[16];
-            std::snprintf(text, sizeof text, "%.1f", std::stod(want[3]) / 18.0182);
-            want[3] = text;
+            std::snprintf(text, sizeof text, "%.1f", std::stod(mgdlText) / 18.0182);
+            return std::string(text);
+        };
+        if (want[4] == "mg/dL") {
+            want[3] = mmolOf(want[3]);
             want[4] = "mmol/L";
             ++converted;
+        }
+        // A check strip's range converts with its value, and says its unit.
+        std::smatch range;
+        if (std::regex_search(want[6], range, std::regex("Strip range ([0-9]+)-([0-9]+) mg/dL"))) {
+            want[6] = range.prefix().str() + "Strip range " + mmolOf(range[1]) + "-" + mmolOf(range[2]) + " mmol/L" +
+                      range.suffix().str();
+            ++ranges;
         }
         EXPECT_EQ(mmol[i], want);
     }
     EXPECT_EQ(converted, 7);  // five glucose readings, a control and a check strip
+    EXPECT_EQ(ranges, 1);
     EXPECT_EQ(mmol[4][3] + " " + mmol[4][7], "33.3 HI");
 
     // The XML datalog keeps the meter's unit: asking to convert it is refused before the meter is touched.
@@ -177,11 +200,21 @@ TEST_F(VarnelCommand, CsvInMmolConvertsGlucoseOnlyAndSaysSoInTheHeader) {
 }
 
 TEST(CsvField, QuotesWhatASpreadsheetWouldSplitAndDisarmsFormulas) {
-    using varnel::cli::csvField;
+    using varnel::detail::csvField;
     EXPECT_EQ(csvField("two\r\nlines"), "\"two\r\nlines\"");
     EXPECT_EQ(csvField("=HYPERLINK(\"x\")"), "\"'=HYPERLINK(\"\"x\"\")\"");
     EXPECT_EQ(csvField("@cmd"), "'@cmd");
     EXPECT_EQ(csvField("-2.5"), "-2.5");
+    EXPECT_EQ(csvField("-0x10"), "'-0x10");
+}
+
+TEST(Numbers, OnlyPlainDecimalNumbersAreNumbers) {
+    for (const char* text : {"12", "-2.5", "1e3", "9223372036854775807", "-9223372036854775808"})
+        EXPECT_TRUE(varnel::numberIn(text)) << text;
+    // JSON would write these as numbers a reader takes differently, or cannot hold.
+    for (const char* text : {"0x1A", "-0x1", " 12", "\t5", "12 ", "9223372036854775808", "-9223372036854775809",
+                             "inf", "nan", ""})
+        EXPECT_FALSE(varnel::numberIn(text)) << text;
 }
 
 }  // namespace

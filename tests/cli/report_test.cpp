@@ -3,6 +3,7 @@
 
 #include <cmath>
 #include <map>
+#include <tuple>
 
 #include "report.h"
 #include "support/varnel_command.h"
@@ -59,6 +60,7 @@ TEST_F(VarnelCommand, ReportAndSummaryShowTheFiguresOfTheGlucoseReadings) {
               "20.0 %0.0 %60.0 %0.0 %20.0 %");
 
     const fs::path file = dir / "report.html";
+    const Now now("2005-02-10 20:00:00");  // the meter clock says 18:45
     const Outcome report = varnel(args({"report", "-o", file.string()}));
     ASSERT_EQ(report.status, 0) << report.err;
     const std::string html = slurp(file);
@@ -73,8 +75,30 @@ TEST_F(VarnelCommand, ReportAndSummaryShowTheFiguresOfTheGlucoseReadings) {
     for (const pugi::xpath_node& tr : page.select_nodes("//table[@class='summary']/tr"))
         EXPECT_EQ(tr.node().child_value("td"), rows[tr.node().child_value("th")]) << tr.node().child_value("th");
     EXPECT_EQ(page.select_nodes("//svg[@id='glucose-over-time']/circle[@class='reading']").size(), values.size());
+    EXPECT_EQ(std::string(page.select_node("//span[@class='report-date']").node().child_value()),
+              "Report date 2005-02-10 20:00");
+    EXPECT_NE(std::string(page.select_node("//p[contains(@class,'clock-offset')]").node().child_value())
+                  .find("meter is 01:15:00 behind"),
+              std::string::npos);
+    // The time axis spans whole days, a tick on each.
     const pugi::xml_node x = page.select_node("//svg[@id='glucose-over-time']/g[@class='axis x']").node();
-    EXPECT_EQ(std::string(x.attribute("data-min").value()) + " " + x.attribute("data-max").value(), first + " " + last);
+    EXPECT_EQ(std::string(x.attribute("data-min").value()) + " " + x.attribute("data-max").value(),
+              "2005-01-11T00:00:00 2005-01-21T00:00:00");
+    EXPECT_EQ(page.select_nodes("//svg[@id='glucose-over-time']/g[@class='tick']").size(), 10u);
+    std::string limits;
+    for (const pugi::xpath_node& g : page.select_nodes("//svg[@id='glucose-over-time']/g[@class='limit']"))
+        limits += g.node().child_value("text") + std::string(";");
+    EXPECT_EQ(limits, "54 mg/dL;70 mg/dL;180 mg/dL;250 mg/dL;");
+    // Every part a meter review needs, and what was left out said once.
+    for (const char* id : {"summary", "ranges", "over-time", "modal-day", "low-events", "treatment", "logbook"})
+        EXPECT_TRUE(page.select_node(("//section[@id='" + std::string(id) + "']").c_str())) << id;
+    EXPECT_EQ(std::string(page.select_node("//section[@id='ranges']/h2").node().child_value()), "Readings in ranges");
+    EXPECT_EQ(std::string(page.select_node("//p[contains(@class,'left-out')]").node().child_value()),
+              "Not counted as glucose: 1 control-solution and 1 check-strip readings (they test the meter, not the "
+              "blood).");
+    EXPECT_EQ(page.select_nodes("//table[@class='low-events']/tbody/tr[@class='serious']").size(), 1u);  // the LO 20
+    EXPECT_EQ(page.select_nodes("//table[@class='low-events']/tbody/tr").size(), 1u);  // 70 is not low
+    EXPECT_EQ(page.select_nodes("//table[@class='logbook']//span[contains(@class,'value')]").size(), values.size());
     std::string slots;
     for (const pugi::xpath_node& r : page.select_nodes("//svg[@id='slots']/rect[@class='slot-mean']"))
         slots += std::string(r.node().attribute("data-slot").value()) + "=" + r.node().attribute("data-mean").value() +
@@ -102,10 +126,10 @@ TEST_F(VarnelCommand, ReportWithoutGlucoseReadingsSaysSo) {
 }
 
 TEST(GlucoseSummary, EachBandTakesItsBoundaryValues) {
-    std::vector<varnel::cli::Reading> readings;
+    std::vector<varnel::Reading> readings;
     for (const char* v : {"53", "54", "69", "70", "180", "181", "250", "251"})
-        readings.push_back({"2020-01-01T08:00:00", "glucose", {{"glucose", v, "mg/dL", ""}}, "", {}});
-    readings.push_back({"2020-01-01T09:00:00", "control", {{"control", "20", "mg/dL", ""}}, "", {}});
+        readings.push_back({"", "2020-01-01T08:00:00", "glucose", {{"glucose", v, "mg/dL", ""}}, {}, "", {}});
+    readings.push_back({"", "2020-01-01T09:00:00", "control", {{"control", "20", "mg/dL", ""}}, {}, "", {}});
     const auto s = varnel::cli::summarize(readings);
     EXPECT_EQ(s.count, 8);
     const std::vector<double> shares(std::begin(s.bandShares), std::end(s.bandShares));
@@ -113,3 +137,87 @@ TEST(GlucoseSummary, EachBandTakesItsBoundaryValues) {
 }
 
 }  // namespace
+
+namespace figures {
+
+using namespace varnel::cli;
+
+varnel::Reading entry(const char* time, const char* kind, const char* quantity, const char* value,
+                      std::vector<std::string> comments = {}, const char* slot = "") {
+    return {"", time, kind, {{quantity, value, kind == std::string("glucose") ? "mg/dL" : "", ""}}, {}, slot, comments};
+}
+
+TEST(ReportFigures, LogbookColumnsTakeTheMeterSlotElseTheTimeOfDay) {
+    const std::vector<std::tuple<const char*, const char*, int>> cases = {
+        {"Sleep", "2020-01-01T14:00:00", 7},  {"Night", "2020-01-01T03:00:00", 6},
+        {"After Lunch", "2020-01-01T07:00:00", 3}, {"", "2020-01-01T05:59:59", 7},
+        {"", "2020-01-01T06:00:00", 0},       {"", "2020-01-01T21:59:00", 5},
+        {"", "2020-01-01T22:00:00", 6},       {"Snack", "2020-01-01T12:30:00", 2},
+    };
+    for (const auto& [slot, time, column] : cases) EXPECT_EQ(logbookColumn(slot, time), column) << slot << " " << time;
+}
+
+TEST(ReportFigures, LogbookTreatmentAndLowsCountEachDayOnce) {
+    const std::vector<varnel::Reading> readings = {
+        entry("2020-01-01T07:00:00", "glucose", "glucose", "53"),
+        entry("2020-01-01T07:05:00", "control", "control", "40"),  // not glucose: no cell, no low
+        entry("2020-01-01T07:10:00", "insulin", "insulin", "4.5", {"Rapid"}),
+        entry("2020-01-01T18:00:00", "insulin", "insulin", "6", {"Rapid"}),
+        entry("2020-01-01T22:00:00", "insulin", "insulin", "12", {"LongAct"}),
+        entry("2020-01-01T07:15:00", "food", "Carbs", "50"),
+        entry("2020-01-01T12:15:00", "food", "Carbs", "70"),
+        entry("2020-01-03T08:00:00", "oral_medication", "dose", "1", {"Metformn"}),
+        entry("2020-01-03T08:30:00", "glucose", "glucose", "69"),
+        entry("2020-01-03T09:30:00", "glucose", "glucose", "70"),
+    };
+    const auto days = logbook(readings);
+    ASSERT_EQ(days.size(), 2u);  // the day without an entry has no row
+    EXPECT_EQ(days[0].date, "2020-01-01");
+    EXPECT_EQ(days[0].cells[0].size(), 1u);
+    EXPECT_EQ(days[0].insulin, (std::map<std::string, double>{{"LongAct", 12}, {"Rapid", 10.5}}));
+    EXPECT_EQ(days[0].carbs, 120);
+    EXPECT_EQ(days[1].cells[0].size() + days[1].cells[1].size(), 2u);
+    EXPECT_FALSE(days[1].hasCarbs);
+
+    const TreatmentSummary t = treatmentSummary(days);
+    ASSERT_EQ(t.insulins.size(), 2u);
+    EXPECT_EQ(t.insulins[1].name + " " + std::to_string(t.insulins[1].days), "Rapid 1");
+    EXPECT_EQ(t.carbDays, 1);
+    ASSERT_EQ(t.oralMeds.size(), 1u);
+    EXPECT_EQ(t.oralMeds[0].name + " " + std::to_string(t.oralMeds[0].days), "Metformn 1");
+    EXPECT_EQ(t.insulins[1].total, 10.5);
+
+    const auto lows = lowEvents(glucosePoints(readings));
+    ASSERT_EQ(lows.size(), 2u);
+    EXPECT_TRUE(lows[0].serious);
+    EXPECT_FALSE(lows[1].serious);
+}
+
+TEST(ReportFigures, ModalDayIsHourlyOnlyWhereEveryHourHasEnoughReadings) {
+    std::vector<GlucosePoint> points;
+    for (double v : {100, 120, 140, 160}) points.push_back({v, "2020-01-01T08:10:00", "", "", 0});
+    ModalDay day = modalDay(points);
+    ASSERT_TRUE(day.hourly);
+    ASSERT_EQ(day.bins.size(), 1u);
+    EXPECT_EQ(day.bins[0].fromHour, 8);
+    EXPECT_EQ(std::vector<double>({day.bins[0].q1, day.bins[0].median, day.bins[0].q3}),
+              std::vector<double>({115, 130, 145}));
+    // One reading alone at 3 h: by time-of-day window, night first.
+    points.push_back({80, "2020-01-02T03:00:00", "", "", 7});
+    day = modalDay(points);
+    EXPECT_FALSE(day.hourly);
+    ASSERT_EQ(day.bins.size(), 2u);
+    EXPECT_EQ(day.bins[0].fromHour + day.bins[0].toHour + day.bins[1].fromHour, 0 + 6 + 6);
+    EXPECT_EQ(day.bins[0].median, 80);
+}
+
+TEST(ReportFigures, DayTicksStayFewAndStartOnTheFirstDay) {
+    EXPECT_EQ(dayTicks(100, 109).size(), 10u);
+    const auto quarter = dayTicks(100, 190);
+    EXPECT_LE(quarter.size(), 12u);
+    EXPECT_EQ(quarter.front(), 100);
+    EXPECT_EQ(quarter[1] - quarter[0], 14);
+    EXPECT_EQ(dateOf(dayNumber("2024-02-29T10:00:00") + 1), "2024-03-01");
+}
+
+}  // namespace figures

@@ -5,7 +5,7 @@
 set -eu
 lib=${1:?usage: check_exports.sh LIBRARY}
 public='Clock|ManualClock|ComponentError|DllWrapper|UniqueChecker|XMLWrapper'
-functions='threadClock|setThreadClock|returnCodeText'
+functions='threadClock|setThreadClock|returnCodeText|readDatalog|isGlucoseKind|numberIn|inUnit|readingNotes|readingsCsv|readingsJson'
 # The C interface: every function varnel.h declares.
 header=$(dirname "$0")/../../include/varnel/varnel.h
 c_functions=$(sed -n 's/^VARNEL_API [^(]*[ *]\(varnel_[a-z_]*\)(.*/\1/p' "$header" | paste -sd'|' -)

@@ -22,6 +22,8 @@ fail() { echo "package: $*"; exit 1; }
 readings() {
     grep -q 'MVX7001184' "$1" || { cat "$1"; fail "$2 did not print the simulated meter"; }
     grep -Eq '^[0-9]{4}-[0-9]{2}-[0-9]{2} [0-9]{2}:[0-9]{2}  [0-9]+$' "$1" || { cat "$1"; fail "$2 printed no reading"; }
+    # The shipped meter's control-solution reading is not glucose.
+    ! grep -q '^2008-02-27 06:07  121$' "$1" || fail "$2 printed a control-solution reading as glucose"
     echo "package: $2 printed the meter and $(grep -Ec '^[0-9]{4}-' "$1") readings"
 }
 

@@ -1,15 +1,16 @@
-#include "export.h"
+#include "varnel/readings.h"
 
-#include <nlohmann/json.hpp>
 #include <pugixml.hpp>
 
+#include <cctype>
+#include <cerrno>
 #include <cmath>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <stdexcept>
 
-namespace varnel::cli {
+namespace varnel {
 
 namespace {
 
@@ -50,7 +51,7 @@ void fillGlucose(const pugi::xml_node& e, const Units& u, Reading& r) {
         r.comments.push_back(txt.empty() ? name : name == "Ex" ? "Exercise " + txt : txt);
     }
     for (const pugi::xml_node& lvl : e.child("Strip").children("Lvl"))
-        r.comments.push_back("Strip range " + attr(lvl, "Lower") + "-" + attr(lvl, "Upper"));
+        r.limits.push_back({"Strip range", attr(lvl, "Lower"), attr(lvl, "Upper"), u.glucose});
 }
 
 void fillError(const pugi::xml_node& e, const Units&, Reading& r) {
@@ -111,9 +112,9 @@ void fillOralMed(const pugi::xml_node& e, const Units& u, Reading& r) {
     if (!e.child("OMedName").text().empty()) r.comments.push_back(e.child("OMedName").text().get());
 }
 
-// Everything but the date of an entry this table does not know, so nothing is dropped.
+// Everything but the date and number of an entry this table does not know, so nothing is dropped.
 void fillUnknown(const pugi::xml_node& e, const Units&, Reading& r) {
-    static constexpr const char* kDate[] = {"Y", "MM", "D", "h", "m", "s"};
+    static constexpr const char* kDate[] = {"Y", "MM", "D", "h", "m", "s", "Ord"};
     for (const pugi::xml_attribute& a : e.attributes()) {
         bool isDate = false;
         for (const char* d : kDate) isDate = isDate || std::strcmp(d, a.name()) == 0;
@@ -160,6 +161,7 @@ std::string isoTime(const pugi::xml_node& e) {
 
 Reading readingFor(const pugi::xml_node& entry, const Units& units) {
     Reading r;
+    r.ord = attr(entry, "Ord");
     r.time = isoTime(entry);
     r.kind = entry.name();
     for (const EntryKind& k : kEntryKinds) {
@@ -172,121 +174,77 @@ Reading readingFor(const pugi::xml_node& entry, const Units& units) {
     return r;
 }
 
-constexpr double kMgdlPerMmol = 18.0182;
-
 }  // namespace
 
-Datalog readDatalog(const std::string& datalogXml) {
+DatalogReadings readDatalog(const std::string& datalogXml) {
     pugi::xml_document doc;
     if (!doc.load_string(datalogXml.c_str()) || !doc.child("Datalog"))
-        throw std::runtime_error("the component returned no datalog document");
+        throw std::invalid_argument("not a datalog document");
     const pugi::xml_node datalog = doc.child("Datalog");
     const pugi::xml_node extra = datalog.child("TransferDetail").child("ExtraInfo");
     const Units units{attr(extra.child("GlucUnit"), "Txt"), attr(extra.child("InsUnit"), "Txt"),
                       attr(extra.child("OMedUnit"), "Txt"), attr(extra.child("CholesUnit"), "Txt")};
     const pugi::xml_node device = datalog.child("DeviceInfo");
-    Datalog log{device.child_value("SN"), device.child_value("Name"), device.child_value("TypeID"), {}};
+    DatalogReadings log{device.child_value("SN"), device.child_value("Name"), device.child_value("TypeID"), {}};
     for (const pugi::xml_node& entry : datalog.child("Records").children())
         log.readings.push_back(readingFor(entry, units));
     return log;
 }
 
+
 bool isGlucoseKind(const std::string& kind) { return kind == "glucose" || kind == "control" || kind == "check_strip"; }
 
 std::optional<double> numberIn(const std::string& text) {
-    if (text.empty()) return std::nullopt;
+    // strtod alone would also take leading blanks and hexadecimal.
+    if (text.empty() || std::isspace(static_cast<unsigned char>(text.front())) ||
+        text.find_first_of("xX") != std::string::npos)
+        return std::nullopt;
     char* end = nullptr;
     const double value = std::strtod(text.c_str(), &end);
     if (*end != '\0' || !std::isfinite(value)) return std::nullopt;
+    // An integer is written as one, so it must fit one.
+    if (text.find_first_of(".eE") == std::string::npos) {
+        errno = 0;
+        std::strtoll(text.c_str(), nullptr, 10);
+        if (errno == ERANGE) return std::nullopt;
+    }
     return value;
 }
 
-std::string mmolText(double mgdl) {
+namespace {
+
+// mg/dL text as mmol/L with one decimal; text that is not a number stays as it is.
+bool toMmol(std::string& value, std::string& unit) {
+    const auto mgdl = numberIn(value);
+    if (unit != "mg/dL" || !mgdl) return false;
     char text[32];
-    std::snprintf(text, sizeof text, "%.1f", mgdl / kMgdlPerMmol);
-    return text;
+    std::snprintf(text, sizeof text, "%.1f", *mgdl / kMgdlPerMmol);
+    value = text;
+    return true;
 }
+
+}  // namespace
 
 std::vector<Reading> inUnit(std::vector<Reading> readings, GlucoseUnit unit) {
     if (unit == GlucoseUnit::meter) return readings;
     for (Reading& r : readings) {
         if (!isGlucoseKind(r.kind)) continue;
-        for (ReadingValue& v : r.values) {
-            const auto mgdl = numberIn(v.value);
-            if (v.unit != "mg/dL" || !mgdl) continue;
-            v.value = mmolText(*mgdl);
-            v.unit = "mmol/L";
+        for (ReadingValue& v : r.values)
+            if (toMmol(v.value, v.unit)) v.unit = "mmol/L";
+        for (ReadingLimits& l : r.limits) {
+            // Both ends or neither, so a range never mixes units.
+            std::string lower = l.lower, upper = l.upper, mgdl = l.unit;
+            if (toMmol(lower, mgdl) && toMmol(upper, mgdl)) l = {l.name, lower, upper, "mmol/L"};
         }
     }
     return readings;
 }
 
-std::string csvField(const std::string& text) {
-    std::string field = text;
-    if (!field.empty() && std::strchr("=+-@\t\r", field.front()) && !numberIn(field)) field.insert(0, "'");
-    if (field.find_first_of(",\"\r\n") == std::string::npos) return field;
-    std::string quoted = "\"";
-    for (char c : field) {
-        if (c == '"') quoted += '"';
-        quoted += c;
-    }
-    return quoted + '"';
+std::vector<std::string> readingNotes(const Reading& reading) {
+    std::vector<std::string> notes = reading.comments;
+    for (const ReadingLimits& l : reading.limits)
+        notes.push_back(l.name + " " + l.lower + "-" + l.upper + (l.unit.empty() ? "" : " " + l.unit));
+    return notes;
 }
 
-std::string csvLine(const std::vector<std::string>& fields) {
-    std::string line;
-    for (std::size_t i = 0; i < fields.size(); ++i) {
-        if (i) line += ',';
-        line += csvField(fields[i]);
-    }
-    return line + "\r\n";
-}
-
-std::string readingsCsv(const Datalog& log, GlucoseUnit unit) {
-    // The header says when glucose was converted, so a reader never takes mmol/L for the meter's own unit.
-    std::string csv = csvLine({"date-time", "kind", "quantity",
-                               unit == GlucoseUnit::mmol ? "value (glucose converted to mmol/L)" : "value", "unit",
-                               "slot", "comments", "range"});
-    for (const Reading& r : inUnit(log.readings, unit)) {
-        std::string comments;
-        for (const std::string& c : r.comments) comments += (comments.empty() ? "" : "; ") + c;
-        if (r.values.empty()) csv += csvLine({r.time, r.kind, "", "", "", r.slot, comments, ""});
-        for (const ReadingValue& v : r.values)
-            csv += csvLine({r.time, r.kind, v.quantity, v.value, v.unit, r.slot, comments, v.range});
-    }
-    return csv;
-}
-
-std::string readingsJson(const Datalog& log, GlucoseUnit unit) {
-    nlohmann::ordered_json doc;
-    doc["format"] = "varnel-readings";
-    doc["version"] = 1;
-    doc["meter"] = {{"serial", log.serial}, {"model", log.model}, {"type", log.meterType}};
-    doc["glucose_converted_to_mmol"] = unit == GlucoseUnit::mmol;
-    auto& list = doc["readings"] = nlohmann::ordered_json::array();
-    for (const Reading& r : inUnit(log.readings, unit)) {
-        nlohmann::ordered_json item;
-        item["time"] = r.time.empty() ? nlohmann::ordered_json() : nlohmann::ordered_json(r.time);
-        item["kind"] = r.kind;
-        auto& values = item["values"] = nlohmann::ordered_json::array();
-        for (const ReadingValue& v : r.values) {
-            nlohmann::ordered_json value{{"quantity", v.quantity}};
-            // A number stays a number for the importing program; a level ("Trace", ">1000") stays text.
-            if (const auto number = numberIn(v.value); number && v.value.find_first_of(".eE") == std::string::npos)
-                value["value"] = std::strtoll(v.value.c_str(), nullptr, 10);
-            else if (number)
-                value["value"] = *number;
-            else
-                value["value"] = v.value;
-            if (!v.unit.empty()) value["unit"] = v.unit;
-            if (!v.range.empty()) value["range"] = v.range;
-            values.push_back(value);
-        }
-        if (!r.slot.empty()) item["slot"] = r.slot;
-        item["comments"] = r.comments;
-        list.push_back(item);
-    }
-    return doc.dump(2) + "\n";
-}
-
-}  // namespace varnel::cli
+}  // namespace varnel
