@@ -447,10 +447,10 @@ std::string reportHtml(const DatalogReadings& log, GlucoseUnit unit, const Repor
     Html body = html.add("body");
     Html header = body.add("header");
     header.add("h1", title);
-    Html facts = header.add("p");
-    facts.set("class", "meta");
-    facts.add("span", "Report date " + context.reportDate.substr(0, 16)).set("class", "report-date");
-    facts.add("span", ", varnel " + context.version).set("class", "version");
+    header.add("p", "Report date " + context.reportDate.substr(0, 16) + ", varnel " + context.version)
+        .set("class", "meta")
+        .set("data-report-date", context.reportDate)
+        .set("data-version", context.version);
     if (!context.clockWarning) {
         header.add("p", "The meter clock could not be read: the readings' times are as the meter stored them.")
             .set("class", "clock-offset");

@@ -5,7 +5,6 @@
 
 #include <pugixml.hpp>
 
-#include <cstring>
 #include <memory>
 #include <new>
 #include <stdexcept>
@@ -121,15 +120,6 @@ TEST_F(CInterface, EveryRequestOnTheSimulator) {
     EXPECT_EQ(events.completions, 1);
     ASSERT_FALSE(events.progress.empty());
     EXPECT_TRUE(std::is_sorted(events.progress.begin(), events.progress.end()));
-    // The readings as JSON, one per entry; a document of another kind has none.
-    const std::unique_ptr<char, decltype(&varnel_free)> json(varnel_doc_readings_json(datalog.get(), 1), &varnel_free);
-    ASSERT_NE(json, nullptr);
-    std::size_t kinds = 0;
-    for (const char* at = json.get(); (at = std::strstr(at, "\"kind\": ")); ++at) ++kinds;
-    EXPECT_EQ(kinds, children(datalog.get(), "Datalog/Records"));
-    EXPECT_NE(std::strstr(json.get(), "\"glucose_converted_to_mmol\": true"), nullptr);
-    EXPECT_EQ(varnel_doc_readings_json(settings.get(), 0), nullptr);
-    EXPECT_EQ(varnel_doc_readings_json(nullptr, 0), nullptr);
 
     EXPECT_EQ(varnel_clear_meter(c, &rec, device.get(), status.get()), ME_SUCCESS) << text(status.get());
     EXPECT_EQ(varnel_get_readings(c, &rec, device.get(), after.get(), filter.get(), status.get(), nullptr), ME_SUCCESS);

@@ -1,12 +1,8 @@
-"""The glucose report as a browser lays it out: headless Chromium renders each report
-at the printable width of A4 and of Letter paper (12 mm margins), and a test-only page
-around it (the report itself holds no script) checks that every section is there and
-that no element reaches past the page width.
-
-    report_in_browser.py VARNEL PROFILE...
-
-Exits 77 ("skipped") when no Chromium is installed.
-"""
+# The glucose report as a browser lays it out: headless Chromium renders each report at the printable
+# width of A4 and of Letter paper (12 mm margins), and a test-only page around it (the report itself
+# holds no script) checks that every section is there and that no element reaches past the page width.
+#   report_in_browser.py VARNEL PROFILE...
+# Exits 77 ("skipped") when no Chromium is installed.
 import html
 import json
 import os
@@ -19,37 +15,25 @@ SECTIONS = ["summary", "ranges", "over-time", "modal-day", "slots-section", "low
 # Printable width in CSS pixels (96 per inch) of A4 (210 mm) and Letter (215.9 mm) less two 12 mm margins.
 WIDTHS = {"A4": round((210 - 24) / 25.4 * 96), "Letter": round((215.9 - 24) / 25.4 * 96)}
 
-MEASURE = """
-<script>
+MEASURE = """<script>
 function measure(frame) {
   const doc = frame.contentDocument, width = doc.documentElement.clientWidth;
-  const over = [];
-  for (const el of doc.body.querySelectorAll('*')) {
-    const box = el.getBoundingClientRect();
-    if (box.width > 0 && box.right > width + 0.5)
-      over.push(el.tagName + (el.id ? '#' + el.id : '') + '.' + (el.getAttribute('class') || '') + ' ' + box.right);
-  }
-  return {paper: frame.dataset.paper, width: width, scrollWidth: doc.documentElement.scrollWidth,
+  const over = [...doc.body.querySelectorAll('*')].map(el => [el, el.getBoundingClientRect()])
+    .filter(([el, box]) => box.width > 0 && box.right > width + 0.5).map(([el, box]) => el.tagName + ' ' + box.right);
+  return {paper: frame.dataset.paper, width: width, scrollWidth: doc.documentElement.scrollWidth, over: over,
           sections: [...doc.querySelectorAll('section[id]')].map(s => s.id),
-          headings: [...doc.querySelectorAll('h2')].map(h => h.textContent), over: over};
+          headings: [...doc.querySelectorAll('h2')].map(h => h.textContent)};
 }
 const results = [];
-for (const frame of document.querySelectorAll('iframe')) {
-  frame.addEventListener('load', () => {
-    results.push(measure(frame));
-    document.getElementById('result').textContent = JSON.stringify(results);
-  });
-}
-</script>
-"""
+for (const frame of document.querySelectorAll('iframe')) frame.addEventListener('load', () => {
+  results.push(measure(frame));
+  document.getElementById('result').textContent = JSON.stringify(results);
+});
+</script>"""
 
 
 def chromium():
-    for name in ("chromium", "chromium-browser"):
-        path = shutil.which(name)
-        if path:
-            return path
-    return None
+    return shutil.which("chromium") or shutil.which("chromium-browser")
 
 
 def check(browser, report_html, work):
