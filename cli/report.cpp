@@ -404,7 +404,8 @@ void treatmentTables(Html s, const std::vector<LogbookDay>& days) {
     };
     for (const TreatmentSummary::Item& i : t.insulins) row("Insulin " + i.name, i.total, " units", i.days);
     if (t.carbDays > 0) row("Carbohydrates", t.carbs, " g", t.carbDays);
-    for (const TreatmentSummary::Item& m : t.oralMeds) row("Oral medication " + m.name, m.total, " doses", m.days);
+    for (const TreatmentSummary::Item& m : t.oralMeds)
+        row("Oral medication " + m.name, m.total, m.total == 1 ? " dose" : " doses", m.days);
 }
 
 constexpr const char* kStyle =

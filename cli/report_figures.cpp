@@ -143,7 +143,7 @@ std::vector<LogbookDay> logbook(const std::vector<Reading>& readings) {
             const auto number = numberIn(v.value);
             if (!number) continue;
             if (r.kind == "insulin" && v.quantity == "insulin")
-                day(r.time).insulin[nameOf(r, "Insulin")] += *number;
+                day(r.time).insulin[nameOf(r, "(unnamed)")] += *number;
             else if (r.kind == "pump_bolus")
                 day(r.time).insulin["Pump bolus"] += *number;
             else if (r.kind == "food" && v.quantity == "Carbs") {
@@ -152,7 +152,7 @@ std::vector<LogbookDay> logbook(const std::vector<Reading>& readings) {
                 d.hasCarbs = true;
             }
         }
-        if (r.kind == "oral_medication") ++day(r.time).oralMeds[nameOf(r, "Oral medication")];
+        if (r.kind == "oral_medication") ++day(r.time).oralMeds[nameOf(r, "(unnamed)")];
     }
     std::vector<LogbookDay> rows;
     for (auto& [date, d] : days) {
