@@ -3,7 +3,6 @@
 
 #include <cmath>
 #include <map>
-#include <tuple>
 
 #include "report.h"
 #include "support/varnel_command.h"
@@ -89,10 +88,7 @@ TEST_F(VarnelCommand, ReportAndSummaryShowTheFiguresOfTheGlucoseReadings) {
     for (const pugi::xpath_node& g : page.select_nodes("//svg[@id='glucose-over-time']/g[@class='limit']"))
         limits += g.node().child_value("text") + std::string(";");
     EXPECT_EQ(limits, "54 mg/dL;70 mg/dL;180 mg/dL;250 mg/dL;");
-    // Every part a meter review needs, and what was left out said once.
-    for (const char* id : {"summary", "ranges", "over-time", "modal-day", "low-events", "treatment", "logbook"})
-        EXPECT_TRUE(page.select_node(("//section[@id='" + std::string(id) + "']").c_str())) << id;
-    EXPECT_EQ(std::string(page.select_node("//section[@id='ranges']/h2").node().child_value()), "Readings in ranges");
+    // What was left out said once; every section is checked in a browser (report_in_browser).
     EXPECT_EQ(std::string(page.select_node("//p[contains(@class,'left-out')]").node().child_value()),
               "Not counted as glucose: 1 control-solution and 1 check-strip readings (they test the meter, not the "
               "blood).");
@@ -147,19 +143,9 @@ varnel::Reading entry(const char* time, const char* kind, const char* quantity, 
     return {"", time, kind, {{quantity, value, kind == std::string("glucose") ? "mg/dL" : "", ""}}, {}, slot, comments};
 }
 
-TEST(ReportFigures, LogbookColumnsTakeTheMeterSlotElseTheTimeOfDay) {
-    const std::vector<std::tuple<const char*, const char*, int>> cases = {
-        {"Sleep", "2020-01-01T14:00:00", 7},  {"Night", "2020-01-01T03:00:00", 6},
-        {"After Lunch", "2020-01-01T07:00:00", 3}, {"", "2020-01-01T05:59:59", 7},
-        {"", "2020-01-01T06:00:00", 0},       {"", "2020-01-01T21:59:00", 5},
-        {"", "2020-01-01T22:00:00", 6},       {"Snack", "2020-01-01T12:30:00", 2},
-    };
-    for (const auto& [slot, time, column] : cases) EXPECT_EQ(logbookColumn(slot, time), column) << slot << " " << time;
-}
-
 TEST(ReportFigures, LogbookTreatmentAndLowsCountEachDayOnce) {
     const std::vector<varnel::Reading> readings = {
-        entry("2020-01-01T07:00:00", "glucose", "glucose", "53"),
+        entry("2020-01-01T07:00:00", "glucose", "glucose", "53", {}, "Sleep"),  // the meter's slot over the time
         entry("2020-01-01T07:05:00", "control", "control", "40"),  // not glucose: no cell, no low
         entry("2020-01-01T07:10:00", "insulin", "insulin", "4.5", {"Rapid"}),
         entry("2020-01-01T18:00:00", "insulin", "insulin", "6", {"Rapid"}),
@@ -173,10 +159,10 @@ TEST(ReportFigures, LogbookTreatmentAndLowsCountEachDayOnce) {
     const auto days = logbook(readings);
     ASSERT_EQ(days.size(), 2u);  // the day without an entry has no row
     EXPECT_EQ(days[0].date, "2020-01-01");
-    EXPECT_EQ(days[0].cells[0].size(), 1u);
+    EXPECT_EQ(days[0].cells[7].size(), 1u);  // night
     EXPECT_EQ(days[0].insulin, (std::map<std::string, double>{{"LongAct", 12}, {"Rapid", 10.5}}));
     EXPECT_EQ(days[0].carbs, 120);
-    EXPECT_EQ(days[1].cells[0].size() + days[1].cells[1].size(), 2u);
+    EXPECT_EQ(days[1].cells[0].size() + days[1].cells[1].size(), 2u);  // before and after breakfast by time
     EXPECT_FALSE(days[1].hasCarbs);
 
     const TreatmentSummary t = treatmentSummary(days);
