@@ -19,8 +19,8 @@ struct Band {
 };
 
 constexpr Band kBands[kBandCount] = {
-    {"very-low", "below 54", "below 3.0", "#b2182b"}, {"low", "54-69", "3.0-3.8", "#ef8a62"},
-    {"target", "70-180", "3.9-10.0", "#1a9850"},      {"high", "181-250", "10.1-13.9", "#fdae61"},
+    {"very-low", "below 54", "below 3.0", "#b2182b"},    {"low", "54-69", "3.0-3.8", "#ef8a62"},
+    {"target", "70-180", "3.9-10.0", "#1a9850"},         {"high", "181-250", "10.1-13.9", "#fdae61"},
     {"very-high", "above 250", "above 13.9", "#d73027"},
 };
 
@@ -243,9 +243,10 @@ void overTimeChart(Html s, const std::vector<GlucosePoint>& points, const Glucos
 void modalDayChart(Html s, const std::vector<GlucosePoint>& points, GlucoseUnit unit) {
     const ModalDay day = modalDay(points);
     s.add("p",
-          day.hourly ? "Median and interquartile range (the middle half of the readings) for each hour, over every reading."
-                     : "Too few readings for each hour: median and interquartile range (the middle half of the "
-                       "readings) for each time of day of the logbook, over every reading.")
+          day.hourly
+              ? "Median and interquartile range (the middle half of the readings) for each hour, over every reading."
+              : "Too few readings for each hour: median and interquartile range (the middle half of the "
+                "readings) for each time of day of the logbook, over every reading.")
         .set("class", "note");
     const Plot p = startPlot(s, "glucose-by-hour", "Every reading on one 24-hour axis", 0, 24, axisTop(points, unit),
                              "0", "24", unit);
@@ -302,7 +303,8 @@ void bandChart(Html s, const GlucoseSummary& g, GlucoseUnit unit) {
 
 void slotChart(Html s, const GlucoseSummary& g, GlucoseUnit unit) {
     const double rowHeight = 24;
-    Html svg = svgIn(s, "slots", "Mean glucose by meal slot", kTop + rowHeight * static_cast<double>(g.slots.size()) + 8);
+    Html svg =
+        svgIn(s, "slots", "Mean glucose by meal slot", kTop + rowHeight * static_cast<double>(g.slots.size()) + 8);
     double top = 0;
     for (const SlotMean& m : g.slots) top = std::max(top, m.meanMgdl);
     const double left = 150, width = kWidth - left - 160;

@@ -41,9 +41,8 @@ void addSummaryCommand(CLI::App& app, int& status, const char* name, const char*
     addOutputOption(cmd, cl->output);
     addUnitOption(cmd, cl->unit);
     cmd->callback([cl, &status, render] {
-        status = MeterSession(cl->meter).run([&](MeterSession& s) {
-            emit(cl->output, render(s, glucoseUnit(cl->unit)));
-        });
+        status =
+            MeterSession(cl->meter).run([&](MeterSession& s) { emit(cl->output, render(s, glucoseUnit(cl->unit))); });
     });
 }
 
@@ -58,8 +57,9 @@ void addReportCommands(CLI::App& app, int& status) {
                           const ReportContext context{now.text(), VARNEL_VERSION_STRING, meterClockWarning(s, now)};
                           return reportHtml(readDatalog(uploadDatalog(s).XML()), unit, context);
                       });
-    addSummaryCommand(app, status, "summary", "Upload the readings and print the glucose summary as text",
-                      [](MeterSession& s, GlucoseUnit unit) { return summaryText(readDatalog(uploadDatalog(s).XML()), unit); });
+    addSummaryCommand(
+        app, status, "summary", "Upload the readings and print the glucose summary as text",
+        [](MeterSession& s, GlucoseUnit unit) { return summaryText(readDatalog(uploadDatalog(s).XML()), unit); });
 }
 
 }  // namespace varnel::cli

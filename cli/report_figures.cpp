@@ -51,8 +51,8 @@ long long dayNumber(const std::string& time) {
 std::string dateOf(long long day) {
     const std::chrono::year_month_day ymd{std::chrono::sys_days{std::chrono::days{day}}};
     char text[16];
-    std::snprintf(text, sizeof text, "%04d-%02u-%02u", static_cast<int>(ymd.year()),
-                  static_cast<unsigned>(ymd.month()), static_cast<unsigned>(ymd.day()));
+    std::snprintf(text, sizeof text, "%04d-%02u-%02u", static_cast<int>(ymd.year()), static_cast<unsigned>(ymd.month()),
+                  static_cast<unsigned>(ymd.day()));
     return text;
 }
 
@@ -157,9 +157,8 @@ std::vector<LogbookDay> logbook(const std::vector<Reading>& readings) {
     std::vector<LogbookDay> rows;
     for (auto& [date, d] : days) {
         for (auto& cell : d.cells)
-            std::sort(cell.begin(), cell.end(), [](const GlucosePoint& a, const GlucosePoint& b) {
-                return a.time < b.time;
-            });
+            std::sort(cell.begin(), cell.end(),
+                      [](const GlucosePoint& a, const GlucosePoint& b) { return a.time < b.time; });
         rows.push_back(std::move(d));
     }
     return rows;
@@ -217,9 +216,8 @@ ModalDay modalDay(const std::vector<GlucosePoint>& points) {
     std::vector<std::vector<double>> hours(24);
     for (const GlucosePoint& p : points) hours[static_cast<std::size_t>(hourOfDay(p.time)) % 24].push_back(p.mgdl);
     ModalDay day;
-    day.hourly = std::all_of(hours.begin(), hours.end(), [](const auto& h) {
-        return h.empty() || static_cast<int>(h.size()) >= kMinPerHour;
-    });
+    day.hourly = std::all_of(hours.begin(), hours.end(),
+                             [](const auto& h) { return h.empty() || static_cast<int>(h.size()) >= kMinPerHour; });
     std::vector<std::pair<double, double>> spans;
     std::vector<std::vector<double>> values;
     if (day.hourly) {

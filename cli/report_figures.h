@@ -53,12 +53,12 @@ struct SlotMean {
 
 // The figures of the summary, from the glucose readings only.
 struct GlucoseSummary {
-    int count = 0;      // glucose readings with a value
-    int high = 0;       // of them, shown HI (counted at the meter's upper limit)
-    int low = 0;        // shown LO (counted at the lower limit)
-    int controls = 0;   // control-solution readings, left out of every figure
+    int count = 0;        // glucose readings with a value
+    int high = 0;         // of them, shown HI (counted at the meter's upper limit)
+    int low = 0;          // shown LO (counted at the lower limit)
+    int controls = 0;     // control-solution readings, left out of every figure
     int checkStrips = 0;  // check-strip readings, left out likewise
-    std::string first;  // date-times of the first and last reading
+    std::string first;    // date-times of the first and last reading
     std::string last;
     int days = 0;  // calendar days from the first reading's to the last one's, both counted
     double meanMgdl = 0;

@@ -63,8 +63,8 @@ std::string readingsCsv(const DatalogReadings& log, GlucoseUnit unit) {
         for (const std::string& c : readingNotes(r)) comments += (comments.empty() ? "" : "; ") + c;
         const auto line = [&](const std::string& quantity, const std::string& value, const std::string& valueUnit,
                               const std::string& range) {
-            return csvLine({r.time, r.kind, quantity, value, valueUnit, r.slot, comments, range, r.ord, log.serial,
-                            log.model});
+            return csvLine(
+                {r.time, r.kind, quantity, value, valueUnit, r.slot, comments, range, r.ord, log.serial, log.model});
         };
         if (r.values.empty()) csv += line("", "", "", "");
         for (const ReadingValue& v : r.values) csv += line(v.quantity, v.value, v.unit, v.range);

@@ -191,7 +191,6 @@ DatalogReadings readDatalog(const std::string& datalogXml) {
     return log;
 }
 
-
 bool isGlucoseKind(const std::string& kind) { return kind == "glucose" || kind == "control" || kind == "check_strip"; }
 
 std::optional<double> numberIn(const std::string& text) {

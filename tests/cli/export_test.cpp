@@ -8,8 +8,8 @@
 #include <set>
 
 #include "exports/csv.h"
-#include "varnel/readings.h"
 #include "support/varnel_command.h"
+#include "varnel/readings.h"
 
 namespace {
 
@@ -203,8 +203,8 @@ TEST(Numbers, OnlyPlainDecimalNumbersAreNumbers) {
     for (const char* text : {"12", "-2.5", "1e3", "9223372036854775807", "-9223372036854775808"})
         EXPECT_TRUE(varnel::numberIn(text)) << text;
     // JSON would write these as numbers a reader takes differently, or cannot hold.
-    for (const char* text : {"0x1A", "-0x1", " 12", "\t5", "12 ", "9223372036854775808", "-9223372036854775809",
-                             "inf", "nan", ""})
+    for (const char* text :
+         {"0x1A", "-0x1", " 12", "\t5", "12 ", "9223372036854775808", "-9223372036854775809", "inf", "nan", ""})
         EXPECT_FALSE(varnel::numberIn(text)) << text;
 }
 

@@ -146,7 +146,7 @@ varnel::Reading entry(const char* time, const char* kind, const char* quantity, 
 TEST(ReportFigures, LogbookTreatmentAndLowsCountEachDayOnce) {
     const std::vector<varnel::Reading> readings = {
         entry("2020-01-01T07:00:00", "glucose", "glucose", "53", {}, "Sleep"),  // the meter's slot over the time
-        entry("2020-01-01T07:05:00", "control", "control", "40"),  // not glucose: no cell, no low
+        entry("2020-01-01T07:05:00", "control", "control", "40"),               // not glucose: no cell, no low
         entry("2020-01-01T07:10:00", "insulin", "insulin", "4.5", {"Rapid"}),
         entry("2020-01-01T18:00:00", "insulin", "insulin", "6", {"Rapid"}),
         entry("2020-01-01T22:00:00", "insulin", "insulin", "12", {"LongAct"}),
