@@ -172,7 +172,11 @@ Plot startPlot(Html parent, const std::string& id, const std::string& title, dou
         Html g = svg.add("g");
         g.set("class", "limit").set("data-value", number(mgdl, unit));
         g.add("line").set("x1", kLeft).set("x2", kWidth - kRight).set("y1", y).set("y2", y);
-        g.add("text", number(mgdl, unit) + " " + unitName(unit)).set("x", kWidth - kRight + 4).set("y", y + 4);
+        // 54 and 180 under their line, 70 and 250 over it, so close lines keep their labels apart.
+        const bool under = mgdl == kVeryLowMgdl || mgdl == kHighMgdl;
+        g.add("text", number(mgdl, unit) + " " + unitName(unit))
+            .set("x", kWidth - kRight + 4)
+            .set("y", under ? y + 10 : y - 2);
     }
     Html xAxis = svg.add("g");
     xAxis.set("class", "axis x").set("data-min", xMinText).set("data-max", xMaxText);
@@ -374,9 +378,9 @@ void lowEventsTable(Html s, const std::vector<GlucosePoint>& points, GlucoseUnit
     }
     int serious = 0;
     for (const LowEvent& e : events) serious += e.serious;
-    s.add("p", std::to_string(events.size()) + " readings below " + number(kLowMgdl, unit) + " " + unitName(unit) +
-                   ", " + std::to_string(serious) + " of them below " + number(kVeryLowMgdl, unit) + " " +
-                   unitName(unit) + ".")
+    s.add("p", std::to_string(events.size()) + (events.size() == 1 ? " reading below " : " readings below ") +
+                   number(kLowMgdl, unit) + " " + unitName(unit) + ", " + std::to_string(serious) + " of them below " +
+                   number(kVeryLowMgdl, unit) + " " + unitName(unit) + ".")
         .set("class", "note");
     Html body = table(s, "low-events", {"Date", "Time", "Glucose", "Level", "Slot"});
     for (const LowEvent& e : events) {
@@ -478,7 +482,7 @@ std::string reportHtml(const DatalogReadings& log, GlucoseUnit unit, const Repor
         overTimeChart(section(body, "over-time", "Glucose over time"), points, s, unit);
         modalDayChart(section(body, "modal-day", "Modal day"), points, unit);
         slotChart(section(body, "slots-section", "Average by meal slot"), s, unit);
-        lowEventsTable(section(body, "low-events", "Low glucose"), points, unit);
+        lowEventsTable(section(body, "low-events", "Hypoglycaemia events"), points, unit);
     }
     const std::vector<LogbookDay> days = logbook(log.readings);
     treatmentTables(section(body, "treatment", "Treatment"), days);
