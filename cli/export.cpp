@@ -3,11 +3,13 @@
 #include <nlohmann/json.hpp>
 #include <pugixml.hpp>
 
-#include <cmath>
+#include <charconv>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <stdexcept>
+#include <system_error>
 
 namespace varnel::cli {
 
@@ -194,12 +196,32 @@ Datalog readDatalog(const std::string& datalogXml) {
 bool isGlucoseKind(const std::string& kind) { return kind == "glucose" || kind == "control" || kind == "check_strip"; }
 
 std::optional<double> numberIn(const std::string& text) {
-    if (text.empty()) return std::nullopt;
-    char* end = nullptr;
-    const double value = std::strtod(text.c_str(), &end);
-    if (*end != '\0' || !std::isfinite(value)) return std::nullopt;
-    return value;
+    // Plain decimals only: "0x1A", " 12", "1e3", "+5" and "inf" are what a meter never writes as a value.
+    const std::size_t start = text.starts_with('-') ? 1 : 0;
+    const std::size_t point = text.find_first_not_of("0123456789", start);
+    if (point == start || start == text.size()) return std::nullopt;
+    if (point != std::string::npos &&
+        (text[point] != '.' || point + 1 == text.size() ||
+         text.find_first_not_of("0123456789", point + 1) != std::string::npos))
+        return std::nullopt;
+    return std::strtod(text.c_str(), nullptr);
 }
+
+namespace {
+
+// A value as the JSON export carries it: a plain decimal as a number, anything else as its text.
+nlohmann::ordered_json jsonValue(const std::string& text) {
+    const auto number = numberIn(text);
+    if (!number) return text;
+    if (text.find('.') != std::string::npos) return *number;
+    // A whole number stays whole; one beyond 64 bits is kept exactly, as its text.
+    std::int64_t whole = 0;
+    const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), whole);
+    if (error != std::errc{} || end != text.data() + text.size()) return text;
+    return whole;
+}
+
+}  // namespace
 
 std::string mmolText(double mgdl) {
     char text[32];
@@ -272,12 +294,7 @@ std::string readingsJson(const Datalog& log, GlucoseUnit unit) {
         for (const ReadingValue& v : r.values) {
             nlohmann::ordered_json value{{"quantity", v.quantity}};
             // A number stays a number for the importing program; a level ("Trace", ">1000") stays text.
-            if (const auto number = numberIn(v.value); number && v.value.find_first_of(".eE") == std::string::npos)
-                value["value"] = std::strtoll(v.value.c_str(), nullptr, 10);
-            else if (number)
-                value["value"] = *number;
-            else
-                value["value"] = v.value;
+            value["value"] = jsonValue(v.value);
             if (!v.unit.empty()) value["unit"] = v.unit;
             if (!v.range.empty()) value["range"] = v.range;
             values.push_back(value);

@@ -39,7 +39,7 @@ Datalog readDatalog(const std::string& datalogXml);
 
 // True for the kinds whose values are blood glucose (glucose, control solution, check strip).
 bool isGlucoseKind(const std::string& kind);
-// A number's value, or nothing for text that is not wholly a number.
+// The value of a plain decimal number ("-12", "3.5"); nothing for any other text ("0x1A", " 12", "1e3", "Trace").
 std::optional<double> numberIn(const std::string& text);
 // mg/dL as mmol/L with one decimal.
 std::string mmolText(double mgdl);

@@ -117,7 +117,9 @@ void addSettingsCommands(CLI::App& app, int& status, ClockSetter setClock) {
         clock->add_option("--set", line->setTo, "First set the meter clock to this local time")
             ->type_name("\"YYYY-MM-DD hh:mm:ss\"")
             ->check([](const std::string& text) {
-                return parseLocalTime(text) ? std::string() : "expected \"YYYY-MM-DD hh:mm:ss\", got \"" + text + "\"";
+                std::string why;
+                parseLocalTime(text, &why);
+                return why;
             })
             ->excludes(sync);
     }

@@ -176,6 +176,28 @@ TEST_F(VarnelCommand, CsvInMmolConvertsGlucoseOnlyAndSaysSoInTheHeader) {
     EXPECT_EQ(varnel({"readings", "-q", "--unit", "mmol", "--sim-profile", kRecordLog}).status, 64);
 }
 
+TEST(ExportValues, OnlyPlainDecimalsBecomeNumbersAndWholeOnesKeepEveryDigit) {
+    // Text as a meter or a hand-edited profile may hold it, and what the JSON export makes of it.
+    const struct {
+        const char* text;
+        json value;
+    } cases[] = {
+        {"-7", -7},          {"2.5", 2.5},        {"0", 0},           {"0x1A", "0x1A"}, {" 12", " 12"},
+        {"12 ", "12 "},      {"1e3", "1e3"},      {"+5", "+5"},       {"inf", "inf"},   {"-", "-"},
+        {"1.", "1."},        {".5", ".5"},        {"9223372036854775807", INT64_MAX},
+        {"9223372036854775808", "9223372036854775808"},  // one past 64 bits: kept as written, not saturated
+    };
+    varnel::cli::Datalog log;
+    log.readings.push_back({"2008-02-15T07:05:09", "ketones", {}, "", {}});
+    for (const auto& c : cases) log.readings.back().values.push_back({"q", c.text, "", ""});
+    const json doc = json::parse(varnel::cli::readingsJson(log, varnel::cli::GlucoseUnit::meter));
+    const json& values = doc["readings"][0]["values"];
+    ASSERT_EQ(values.size(), std::size(cases));
+    for (std::size_t i = 0; i < std::size(cases); ++i) EXPECT_EQ(values[i]["value"], cases[i].value) << cases[i].text;
+    // Text that is no number keeps its formula guard in CSV.
+    EXPECT_EQ(varnel::cli::csvField("-0x1A"), "'-0x1A");
+}
+
 TEST(CsvField, QuotesWhatASpreadsheetWouldSplitAndDisarmsFormulas) {
     using varnel::cli::csvField;
     EXPECT_EQ(csvField("two\r\nlines"), "\"two\r\nlines\"");

@@ -23,13 +23,27 @@ TEST_F(VarnelCommand, InfoTellsTheMeterInPlainWordsAndWarnsOfAClockThatIsOff) {
     };
     for (const auto& c : cases) {
         Now now(c.now);
-        const Outcome r = varnel({"info", "-q", "--sim-profile", meter.string()});
+        // Only --records uploads to count them; the unit is told either way.
+        const bool count = &c == &cases[0];
+        std::vector<std::string> args{"info", "-q", "--sim-profile", meter.string()};
+        if (count) args.push_back("--records");
+        const Outcome r = varnel(args);
         ASSERT_EQ(r.status, 0) << r.err;
         EXPECT_EQ(r.err, c.warning) << c.now;
         const auto shown = lines(r.out);
         ASSERT_EQ(shown.size(), 11u) << r.out;
-        EXPECT_EQ(shown[5], "Records:        12 of 1000");
+        EXPECT_EQ(shown[5], count ? "Records:        12 of 1000"
+                                  : "Records:        not counted ('varnel info --records' counts them by an upload)");
+        EXPECT_EQ(shown[6], "Glucose unit:   mg/dL");
         EXPECT_EQ(shown[8], std::string("Computer clock: ") + c.now);
+    }
+    {
+        // A stand-in clock that is no time is said, not replaced by the real one.
+        Now bad("2008-02-30 10:00:00");
+        const Outcome r = varnel({"info", "-q", "--sim-profile", meter.string()});
+        EXPECT_EQ(r.status, 64);
+        EXPECT_NE(r.err.find("VARNEL_NOW stands in for the computer clock, but the date 2008-02-30 does not exist"),
+                  std::string::npos) << r.err;
     }
     // The same warning comes before an upload, and the upload goes on.
     Now now("2008-03-07 14:25:09");
