@@ -5,6 +5,7 @@
 #include <fstream>
 #include <iterator>
 #include <memory>
+#include <regex>
 #include <string>
 
 #include "document_check.h"
@@ -48,7 +49,11 @@ DocumentCheck checkFile(const std::string& file, XMLWrapper& doc) {
     DocumentCheck check;
     try {
         if (!doc.LoadFile(file)) {
-            check.problems.push_back(doc.LastLoadError());
+            // "what at line L, offset O" as every other problem reads: "line L: what, offset O".
+            const std::string why = doc.LastLoadError();
+            std::smatch part;
+            const bool placed = std::regex_match(why, part, std::regex("(.*) at line ([0-9]+), (offset [0-9]+)"));
+            check.problems.push_back(placed ? "line " + part[2].str() + ": " + part[1].str() + ", " + part[3].str() : why);
             return check;
         }
     } catch (const ComponentError& e) {
