@@ -67,7 +67,7 @@ std::vector<Refusal> refusalsIn(const std::string& report, const pugi::xml_node&
         std::istringstream words(pieces[i]);
         std::string first, word, next;
         words >> first >> word >> next;
-        if (first == "Too") words >> word >> next;  // "Too many FavoriteOralMed at index 3"
+        if (first == "Too") word = next;  // "Too many FavoriteOralMed at index 3"
         if (first != "Invalid" && first != "Too") word = first;  // "Beeper value is read only"
         std::string element = word;
         for (const auto& [said, name] : kRefusalWords)
