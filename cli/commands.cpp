@@ -1,5 +1,6 @@
 #include "commands.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <memory>
 
@@ -14,7 +15,10 @@
 namespace varnel::cli {
 
 void addMeterOptions(CLI::App* cmd, MeterOptions& o, const std::string& recordNames) {
-    cmd->add_option("--port", o.port, "Serial port to search for the meter")->capture_default_str();
+    // A port the component could not search is a wrong command line, found before the meter is touched.
+    cmd->add_option("--port", o.port, "Serial port to search for the meter (1-255)")
+        ->check(CLI::Range(1, 255))
+        ->capture_default_str();
     cmd->add_option("--transport", o.transport, "Transport library to load instead of the simulated one")
         ->type_name("PATH");
     auto* type = cmd->add_option("--sim-type", o.simType, "Attach the simulated meter of this type (1-8)")
@@ -117,21 +121,47 @@ CLI::Option* addUnitOption(CLI::App* cmd, std::string& unit) {
 
 GlucoseUnit glucoseUnit(const std::string& option) { return option == "mmol" ? GlucoseUnit::mmol : GlucoseUnit::meter; }
 
-std::string examplesHelp() {
-    return "Examples:\n"
-           "  varnel info                               the meter in plain words, and whether its clock is right\n"
-           "  varnel discover --sim-type 4              describe the simulated type-4 meter\n"
-           "  varnel readings --csv -o readings.csv     the readings, one CSV line each\n"
-           "  varnel readings --json --unit mmol        the readings as JSON, glucose in mmol/L\n"
-           "  varnel report -o report.html              a printable glucose report with charts\n"
-           "  varnel validate cfg.xml                   check a document against its schema\n"
-           "  varnel caps --item Clock --record Gluc    the clock range and glucose limits\n"
-           "  varnel settings --sim-type 3              the settings document of the simulated type-3 meter\n"
-           "  varnel settings --writable -o cfg.xml     only the settings 'varnel set' can write back\n"
-           "  varnel set cfg.xml                        write an edited settings document back to the meter\n"
-           "  varnel clock                              the meter clock beside the computer clock\n"
-           "  varnel clock --sync --sim-type 5          set the meter clock to the computer clock\n"
-           "  varnel clock --set \"2010-05-01 08:30:00\"  set the meter clock to that local time\n\n";
+namespace {
+
+// The examples `varnel --help` lists, each also under its own command's --help.
+const struct Example {
+    const char* command;
+    const char* line;
+    const char* says;
+} kExamples[] = {
+    {"info", "varnel info", "the meter in plain words, and whether its clock is right"},
+    {"info", "varnel info --records", "the same, with the records counted by an upload"},
+    {"discover", "varnel discover --sim-type 4", "describe the simulated type-4 meter"},
+    {"readings", "varnel readings --csv -o readings.csv", "the readings, one CSV line each"},
+    {"readings", "varnel readings --json --unit mmol", "the readings as JSON, glucose in mmol/L"},
+    {"readings", "varnel readings -o log.xml --clear-after", "save the datalog, then erase the meter"},
+    {"report", "varnel report -o report.html", "a printable glucose report with charts"},
+    {"summary", "varnel summary --unit mmol", "the report's summary table as text"},
+    {"validate", "varnel validate cfg.xml", "check a document against its schema and its own limits"},
+    {"caps", "varnel caps --sim-type 3", "what the meter can do: settings, limits, record kinds"},
+    {"caps", "varnel caps --item Clock --record Gluc", "the clock range and the range of the glucose field"},
+    {"settings", "varnel settings --sim-type 3", "the settings document of the simulated type-3 meter"},
+    {"settings", "varnel settings --writable -o cfg.xml", "only the settings 'varnel set' can write back"},
+    {"set", "varnel set cfg.xml", "write an edited settings document back to the meter"},
+    {"set", "varnel set --force cfg.xml", "write it even where it breaks its schema or its limits"},
+    {"clock", "varnel clock", "the meter clock beside the computer clock"},
+    {"clock", "varnel clock --sync --sim-type 5", "set the meter clock to the computer clock"},
+    {"clock", "varnel clock --set \"2010-05-01 08:30:00\"", "set the meter clock to that local time"},
+    {"clear", "varnel clear --yes", "erase every reading stored in the meter"},
+    {"codes", "varnel codes", "every return code with its text"},
+};
+
+}  // namespace
+
+std::string examplesHelp(const std::string& command) {
+    std::string text = "Examples:\n";
+    for (const Example& e : kExamples) {
+        if (!command.empty() && command != e.command) continue;
+        std::string line = std::string("  ") + e.line;
+        line.resize(std::max<std::size_t>(line.size() + 2, 44), ' ');
+        text += line + e.says + "\n";
+    }
+    return text + "\n";
 }
 
 std::string exitStatusHelp() {
@@ -141,12 +171,16 @@ std::string exitStatusHelp() {
            "          'varnel codes' lists the codes, and each status description is printed\n"
            "          on standard error as one line 'varnel: <text>'\n"
            "  63      a request failed with a code outside -1..-62\n"
-           "  64      a wrong command line, or 'clear' without --yes\n"
-           "  65      'set' was given a FILE that is not an XML document, or 'validate' a\n"
-           "          FILE that cannot be read, has no schema or does not keep to it\n"
+           "  64      a wrong command line (an unknown option, a --port outside 1-255, an\n"
+           "          invalid VARNEL_NOW), a --transport library that cannot be loaded, or\n"
+           "          'clear' without --yes; the meter is not touched\n"
+           "  65      'set' or 'validate' was given a FILE that cannot be read, is not an XML\n"
+           "          document varnel reads, has no schema or does not keep to it or to the\n"
+           "          Min and Max it gives an item ('set' also: not a DeviceSettings document)\n"
            "  70      the component failed unexpectedly (ComponentError: its number and\n"
            "          routine trace are printed)\n"
-           "  73      the -o file cannot be written (found before the meter is touched)\n"
+           "  73      the -o or --sim-save file cannot be written (found before the meter\n"
+           "          is touched)\n"
            "  74      varnel itself failed: the simulated meter could not be set up, or the\n"
            "          output could not be written (the meter is then not erased)\n"
            "  130     stopped by Ctrl-C (SIGINT), 143 by SIGTERM: the running step ends, the\n"

@@ -27,8 +27,8 @@ XMLWrapper uploadDatalog(MeterSession& s);
 CLI::Option* addUnitOption(CLI::App* cmd, std::string& unit);
 GlucoseUnit glucoseUnit(const std::string& option);
 
-// What `varnel --help` shows as examples.
-std::string examplesHelp();
+// The examples of one command's --help; of every command for "".
+std::string examplesHelp(const std::string& command = "");
 // What `varnel --help` says about exit statuses.
 std::string exitStatusHelp();
 

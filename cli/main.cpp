@@ -11,6 +11,7 @@
 #include "report_command.h"
 #include "info.h"
 #include "interrupt.h"
+#include "meter_clock.h"
 #include "session.h"
 #include "set_commands.h"
 #include "settings_commands.h"
@@ -66,6 +67,18 @@ int main(int argc, char** argv) {
     addSettingsCommands(app, status, setMeterClock);
     addValidateCommand(app, status);
     addReportCommands(app, status);
+    // Each command's --help shows its own examples, after what the command itself says.
+    for (CLI::App* sub : app.get_subcommands([](const CLI::App*) { return true; })) {
+        const std::string own = sub->get_footer() == app.get_footer() ? "" : sub->get_footer() + "\n\n";
+        sub->footer(own + examplesHelp(sub->get_name()) + "'varnel --help' lists the exit statuses.");
+    }
+    // A stand-in clock that is no time would silently give way to the real one.
+    app.parse_complete_callback([] {
+        const std::string why = badStandInClock();
+        if (why.empty()) return;
+        say(why);
+        throw RunEnd{exit_status::usage};
+    });
     catchInterruptions();
     try {
         app.parse(argc, argv);
@@ -80,7 +93,10 @@ int main(int argc, char** argv) {
                 return exit_status::usage;
             }
         }
-        app.exit(e);
+        // Said as every other message is, with the command whose options explain it.
+        std::string command = "varnel";
+        for (const CLI::App* sub : app.get_subcommands()) command += " " + sub->get_name();
+        say(std::string(e.what()) + " ('" + command + " --help' shows the options)");
         return exit_status::usage;
     } catch (const RunEnd& end) {
         return end.status;

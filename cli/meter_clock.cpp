@@ -1,5 +1,6 @@
 #include "meter_clock.h"
 
+#include <cctype>
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
@@ -36,18 +37,37 @@ std::string LocalTime::text() const {
     return buf;
 }
 
-std::optional<LocalTime> parseLocalTime(const std::string& text) {
-    LocalTime t;
-    int used = 0;
-    if (std::sscanf(text.c_str(), "%4d-%2d-%2d %2d:%2d:%2d%n", &t.year, &t.month, &t.day, &t.hour, &t.minute,
-                    &t.second, &used) != 6 ||
-        static_cast<std::size_t>(used) != text.size() || text.size() != 19)
+std::optional<LocalTime> parseLocalTime(const std::string& text, std::string* why) {
+    // The exports write a 'T' between date and time; both forms are read, digits exactly where shown.
+    static constexpr char kForm[] = "0000-00-00 00:00:00";
+    bool fits = text.size() == sizeof kForm - 1;
+    for (std::size_t i = 0; fits && i < text.size(); ++i)
+        fits = kForm[i] == '0' ? std::isdigit(static_cast<unsigned char>(text[i])) != 0
+                               : text[i] == kForm[i] || (i == 10 && text[i] == 'T');
+    if (!fits) {
+        if (why) *why = "expected \"YYYY-MM-DD hh:mm:ss\" or YYYY-MM-DDThh:mm:ss, got \"" + text + "\"";
         return std::nullopt;
+    }
+    auto number = [&](std::size_t at, std::size_t length) { return std::stoi(text.substr(at, length)); };
+    const LocalTime t{number(0, 4), number(5, 2), number(8, 2), number(11, 2), number(14, 2), number(17, 2)};
     const std::chrono::year_month_day date{std::chrono::year{t.year}, std::chrono::month(t.month),
                                            std::chrono::day(t.day)};
-    if (!date.ok() || t.hour > 23 || t.minute > 59 || t.second > 59 || t.hour < 0 || t.minute < 0 || t.second < 0)
+    if (!date.ok()) {
+        if (why) *why = "the date " + text.substr(0, 10) + " does not exist";
         return std::nullopt;
+    }
+    if (t.hour > 23 || t.minute > 59 || t.second > 59) {
+        if (why) *why = "the time " + text.substr(11) + " does not exist";
+        return std::nullopt;
+    }
     return t;
+}
+
+std::string badStandInClock() {
+    const char* fixed = std::getenv("VARNEL_NOW");
+    std::string why;
+    if (!fixed || parseLocalTime(fixed, &why)) return {};
+    return "VARNEL_NOW stands in for the computer clock, but " + why + "; unset it or give a real time";
 }
 
 LocalTime computerNow() {
@@ -59,11 +79,18 @@ LocalTime computerNow() {
     return {parts.tm_year + 1900, parts.tm_mon + 1, parts.tm_mday, parts.tm_hour, parts.tm_min, parts.tm_sec};
 }
 
+MeterClock meterClockIn(XMLWrapper& cfg) {
+    cfg.MoveToRoot();
+    cfg.SelectElement("Clock");
+    MeterClock clock{clockChild(cfg, "Val"), clockChild(cfg, "Min"), clockChild(cfg, "Max")};
+    cfg.MoveToRoot();
+    return clock;
+}
+
 MeterClock readMeterClock(MeterSession& s) {
     std::vector<std::string> notes;
     XMLWrapper cfg = readSettings(s, {"Clock"}, notes, "clock");
-    cfg.SelectElement("Clock");
-    return {clockChild(cfg, "Val"), clockChild(cfg, "Min"), clockChild(cfg, "Max")};
+    return meterClockIn(cfg);
 }
 
 std::string differenceText(std::int64_t meterAhead) {

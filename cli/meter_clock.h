@@ -20,18 +20,23 @@ struct LocalTime {
     std::string dateText() const { return text().substr(0, 10); }
 };
 
-// Reads "YYYY-MM-DD hh:mm:ss" exactly, a real date and time; nothing otherwise.
-std::optional<LocalTime> parseLocalTime(const std::string& text);
+// Reads "YYYY-MM-DD hh:mm:ss" or "YYYY-MM-DDThh:mm:ss" exactly, a real date and time;
+// nothing otherwise, with what is wrong in `why` (a wrong form, a date or time that does not exist).
+std::optional<LocalTime> parseLocalTime(const std::string& text, std::string* why = nullptr);
 
 // The computer's local time. VARNEL_NOW ("YYYY-MM-DD hh:mm:ss"), when set, stands in for
 // it, so that a run can be checked against a known "now".
 LocalTime computerNow();
+// What is wrong with VARNEL_NOW; "" when it is unset or a real time.
+std::string badStandInClock();
 
 // The meter clock and the range of times it can hold, as the meter reports them.
 struct MeterClock {
     LocalTime now, first, last;
 };
 
+// The Clock item of a settings document.
+MeterClock meterClockIn(XMLWrapper& cfg);
 // Reads the meter's Clock item (one settings request).
 MeterClock readMeterClock(MeterSession& s);
 

@@ -7,6 +7,7 @@
 #include "documents.h"
 #include "interrupt.h"
 #include "output.h"
+#include "shared_library.h"
 #include "varnel/component_error.h"
 #include "varnel/return_codes.h"
 
@@ -59,6 +60,7 @@ MeterSession::~MeterSession() = default;
 int MeterSession::run(const std::function<void(MeterSession&)>& work) {
     int status = exit_status::success;
     try {
+        checkBeforeTouching();
         attachSimulatedMeter();
         wrapper_ = std::make_unique<DllWrapper>(startCapture());
         wrapper_->setOnProgress([this](std::int16_t& percent) {
@@ -147,6 +149,25 @@ void MeterSession::noteRelease() {
     // The component releases the meter on some failures whatever the client asked; its
     // release leaves ME_QUIT in the record. Releasing again would cost the close's waits twice.
     if (found_ && record_.Error_code == ME_QUIT) released_ = true;
+}
+
+void MeterSession::checkBeforeTouching() const {
+    // Found now, a file that cannot be written would only fail once the meter was used.
+    if (!options_.simSave.empty())
+        if (const std::string why = unwritableReason(options_.simSave); !why.empty()) {
+            say("cannot write " + options_.simSave + ": " + why);
+            throw RunEnd{exit_status::cannot_create};
+        }
+    // The component would report a library it cannot load as an unexpected error, with its internals.
+    if (!options_.transport.empty()) {
+        const SharedLibrary library(options_.transport);
+        if (!library) {
+            std::string why = library.why();
+            if (why.starts_with(options_.transport + ": ")) why.erase(0, options_.transport.size() + 2);
+            say("cannot load the transport library " + options_.transport + ": " + why);
+            throw RunEnd{exit_status::usage};
+        }
+    }
 }
 
 void MeterSession::attachSimulatedMeter() {

@@ -90,6 +90,9 @@ public:
     const MeterOptions& options() const { return options_; }
 
 private:
+    // What the command line names and the run needs: a --sim-save file it can write, a
+    // --transport library that loads. Ends the run before anything is loaded or attached.
+    void checkBeforeTouching() const;
     void attachSimulatedMeter();
     // The transport library to load: the one asked for, or a capture library around or instead of it.
     std::string startCapture();

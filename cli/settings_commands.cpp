@@ -114,10 +114,12 @@ void addSettingsCommands(CLI::App& app, int& status, ClockSetter setClock) {
     addMeterOptions(clock, line->meter);
     if (setClock) {
         auto* sync = clock->add_flag("--sync", line->sync, "First set the meter clock to the computer clock");
-        clock->add_option("--set", line->setTo, "First set the meter clock to this local time")
+        clock->add_option("--set", line->setTo, "First set the meter clock to this local time (a T may stand for the blank)")
             ->type_name("\"YYYY-MM-DD hh:mm:ss\"")
             ->check([](const std::string& text) {
-                return parseLocalTime(text) ? std::string() : "expected \"YYYY-MM-DD hh:mm:ss\", got \"" + text + "\"";
+                std::string why;
+                parseLocalTime(text, &why);
+                return why;
             })
             ->excludes(sync);
     }

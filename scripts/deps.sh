@@ -7,6 +7,8 @@ packages=(cmake g++ make libpugixml-dev libgtest-dev libgmock-dev libbenchmark-d
 missing=()
 # pkg-config: the C example is built through it against the installed package.
 packages+=(pkg-config)
+# The Python package is installed by pip into a venv, offline, with Debian's setuptools and wheel.
+packages+=(python3-venv python3-setuptools python3-wheel)
 for p in "${packages[@]}"; do
   dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q "install ok installed" || missing+=("$p")
 done

@@ -8,10 +8,13 @@
 """
 import ctypes
 import os
+import sys
 import xml.etree.ElementTree as ET
 from pathlib import Path
 
 __all__ = ["Component", "RequestError", "ComponentError", "METER_REC", "library", "readings", "readings_frame"]
+
+__version__ = "0.1.0"
 
 _LIBRARY_NAME = "libvarnel.so.0"
 
@@ -57,15 +60,20 @@ assert ctypes.sizeof(METER_REC) == 2080
 
 
 def _candidates():
+    """Where libvarnel is looked for, in order; the first that loads is used."""
     explicit = os.environ.get("VARNEL_LIBRARY")
     if explicit:
         return [explicit]
     here = Path(__file__).resolve().parent
-    # Installed: beside the package, or in the lib directory above site-packages.
+    # Beside the package, or in the lib directory above it (cmake --install puts the
+    # package in PREFIX/lib/python3/dist-packages).
     found = [here / _LIBRARY_NAME] + [parent / _LIBRARY_NAME for parent in list(here.parents)[:4]]
+    # The prefix pip installed into.
+    found.append(Path(sys.prefix) / "lib" / _LIBRARY_NAME)
     # The build tree of a source checkout.
     found.append(here.parent.parent / "build" / "lib" / _LIBRARY_NAME)
-    return [str(p) for p in found if p.exists()] or [_LIBRARY_NAME]
+    # Last, the system loader's own search (ld.so.conf, LD_LIBRARY_PATH).
+    return [str(p) for p in found if p.exists()] + [_LIBRARY_NAME]
 
 
 _PROGRESS = ctypes.CFUNCTYPE(None, ctypes.POINTER(ctypes.c_int16), ctypes.c_void_p)
@@ -74,7 +82,8 @@ _lib = None
 
 
 def library():
-    """The loaded libvarnel (found through VARNEL_LIBRARY, beside the package, or in the build tree)."""
+    """The loaded libvarnel: VARNEL_LIBRARY when set, else beside the package, in the lib
+    directory above it, in the install prefix (sys.prefix/lib), the build tree, the system loader."""
     global _lib
     if _lib is not None:
         return _lib

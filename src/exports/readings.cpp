@@ -2,9 +2,7 @@
 
 #include <pugixml.hpp>
 
-#include <cctype>
 #include <cerrno>
-#include <cmath>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -194,20 +192,21 @@ DatalogReadings readDatalog(const std::string& datalogXml) {
 bool isGlucoseKind(const std::string& kind) { return kind == "glucose" || kind == "control" || kind == "check_strip"; }
 
 std::optional<double> numberIn(const std::string& text) {
-    // strtod alone would also take leading blanks and hexadecimal.
-    if (text.empty() || std::isspace(static_cast<unsigned char>(text.front())) ||
-        text.find_first_of("xX") != std::string::npos)
+    // Plain decimals only: "0x1A", " 12", "1e3", "+5" and "inf" are what a meter never writes as a value.
+    const std::size_t start = text.starts_with('-') ? 1 : 0;
+    const std::size_t point = text.find_first_not_of("0123456789", start);
+    if (point == start || start == text.size()) return std::nullopt;
+    if (point != std::string::npos &&
+        (text[point] != '.' || point + 1 == text.size() ||
+         text.find_first_not_of("0123456789", point + 1) != std::string::npos))
         return std::nullopt;
-    char* end = nullptr;
-    const double value = std::strtod(text.c_str(), &end);
-    if (*end != '\0' || !std::isfinite(value)) return std::nullopt;
     // An integer is written as one, so it must fit one.
-    if (text.find_first_of(".eE") == std::string::npos) {
+    if (point == std::string::npos) {
         errno = 0;
         std::strtoll(text.c_str(), nullptr, 10);
         if (errno == ERANGE) return std::nullopt;
     }
-    return value;
+    return std::strtod(text.c_str(), nullptr);
 }
 
 namespace {

@@ -56,6 +56,26 @@ TEST_F(VarnelCommand, FailuresSayWhyInOneLineAndExitWithTheCode) {
     const Outcome foreign = varnel({"discover", "-q", "--transport", VARNEL_LIBRARY_PATH, "--sim-type", "2"});
     EXPECT_EQ(foreign.status, 74);
     EXPECT_NE(foreign.err.find("vxsim_select_type"), std::string::npos) << foreign.err;
+
+    // Refused before any meter is touched, in one line that says what is wrong.
+    const struct {
+        std::vector<std::string> args;
+        int status;
+        std::string said;
+    } early[] = {
+        {{"discover", "--port", "300"}, 64, "--port: Value 300 not in range 1 to 255 ('varnel discover --help' shows"},
+        {{"discover", "--transport", "/nonexistent.so"}, 64,
+         "cannot load the transport library /nonexistent.so: cannot open shared object file: No such file or directory"},
+        {{"readings", "--sim-save", (dir / "missing" / "m.xml").string()}, 73, "cannot write " + dir.string()},
+        {{"clock", "--set", "2010-02-30 08:00:00"}, 64, "--set: the date 2010-02-30 does not exist"},
+        {{"readings", "--bogus"}, 64, "The following argument was not expected: --bogus"},
+    };
+    for (const auto& c : early) {
+        const Outcome r = varnel(c.args);
+        EXPECT_EQ(r.status, c.status) << c.said;
+        EXPECT_EQ(r.err.rfind("varnel: " + c.said, 0), 0u) << r.err;
+        EXPECT_EQ(lines(r.err).size(), 1u) << r.err;
+    }
 }
 
 }  // namespace

@@ -200,11 +200,12 @@ TEST(CsvField, QuotesWhatASpreadsheetWouldSplitAndDisarmsFormulas) {
 }
 
 TEST(Numbers, OnlyPlainDecimalNumbersAreNumbers) {
-    for (const char* text : {"12", "-2.5", "1e3", "9223372036854775807", "-9223372036854775808"})
+    for (const char* text : {"12", "-2.5", "0", "9223372036854775807", "-9223372036854775808"})
         EXPECT_TRUE(varnel::numberIn(text)) << text;
     // JSON would write these as numbers a reader takes differently, or cannot hold.
     for (const char* text :
-         {"0x1A", "-0x1", " 12", "\t5", "12 ", "9223372036854775808", "-9223372036854775809", "inf", "nan", ""})
+         {"0x1A", "-0x1", " 12", "\t5", "12 ", "1e3", "+5", "1.", ".5", "-", "9223372036854775808",
+          "-9223372036854775809", "inf", "nan", ""})
         EXPECT_FALSE(varnel::numberIn(text)) << text;
 }
 
