@@ -121,10 +121,13 @@ public:
     /// An empty document (kind doc_kind::empty).
     XMLWrapper();
     ~XMLWrapper();
-    /// A deep copy.
+    /// A deep copy: its own document, with the three positions at the same places.
     XMLWrapper(const XMLWrapper& other);
+    /// Replaces the document by a deep copy of other's.
     XMLWrapper& operator=(const XMLWrapper& other);
+    /// Takes other's document; other is left an empty document.
     XMLWrapper(XMLWrapper&& other) noexcept;
+    /// Takes other's document in place of this one; other is left an empty document.
     XMLWrapper& operator=(XMLWrapper&& other) noexcept;
 
     /// @name The sixteen operations, in their interface order
@@ -198,7 +201,7 @@ public:
     /// other than UTF-8 (every text is read as UTF-8).
     /// A DOCTYPE is accepted and dropped, and may name an external subset,
     /// which is never read: a reference to an entity it might declare stays in
-    /// the text as it is written, e.g. `&ext;`. A DOCTYPE with an internal
+    /// the text as it is written, e.g. <tt>\&ext;</tt>. A DOCTYPE with an internal
     /// subset ("[...]") is refused, so no entity is ever declared or expanded.
     /// Comments, processing instructions and the XML declaration are dropped.
     bool LoadXML(const std::string& text);
