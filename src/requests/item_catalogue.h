@@ -6,6 +6,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <iterator>
 #include <optional>
 #include <string_view>
 
@@ -99,6 +100,14 @@ inline constexpr CatalogueItem kItemCatalogue[] = {
 };
 
 inline constexpr std::size_t kCatalogueSize = std::size(kItemCatalogue);
+
+constexpr bool elementsDistinct() {
+    for (std::size_t i = 0; i < kCatalogueSize; ++i)
+        for (std::size_t j = i + 1; j < kCatalogueSize; ++j)
+            if (std::string_view(kItemCatalogue[i].element) == kItemCatalogue[j].element) return false;
+    return true;
+}
+static_assert(elementsDistinct(), "a second row with an element name would never be found");
 
 // Whether an element name names the item; type 7's "EvtAvgDurn" names the event-averaging item too.
 bool namesItem(const CatalogueItem& item, std::string_view element);
