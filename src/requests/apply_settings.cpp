@@ -133,8 +133,9 @@ bool identify(Request& req, METER_REC& udtMeterRec, const Claims& c) {
 }
 
 // Writes the "Settings" items the meter type accepts, in catalogue order with
-// the items written first ahead, and refuses the others into the outcome; false (reported) when the document
-// lacks an element a write needs or the meter has no model.
+// the rows marked writtenFirst ahead, and refuses the others into the outcome;
+// false (reported) when the document lacks an element a write needs or the
+// meter has no model.
 bool apply(Request& req, XMLWrapper& deviceCfg, XMLWrapper& status, WriteOutcome& outcome) {
     const auto invalidXml = [&](const std::string& context) {
         return stop(req, ME_FAIL, ME_INVALID_XMLWRAPPOBJ, context);
