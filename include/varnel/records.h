@@ -1,4 +1,5 @@
-/*
+/**
+ * @file records.h
  * Records shared byte for byte between the component, its clients and the
  * meter transport library, with the return codes and enumerations.
  *
@@ -22,7 +23,7 @@ extern "C" {
 
 #pragma pack(push, 4)
 
-/* Return codes of every request and of the transport library. */
+/** Return codes of every request and of the transport library. */
 typedef enum ReturnValues_Enum {
     ME_SUCCESS = 0,
     ME_CHKSUM_ERROR = -1,
@@ -60,7 +61,7 @@ typedef enum ReturnValues_Enum {
     ME_INVALID_HANDLE = -36
 } ReturnValues_Enum;
 
-/* The meter family member, as found in M_Type and in a document's TypeID. */
+/** The meter family member, as found in M_Type and in a document's TypeID. */
 typedef enum MeterType_Enum {
     eNoMeter = 0,
     eCVTarnConsumerMeter = 1,
@@ -73,7 +74,7 @@ typedef enum MeterType_Enum {
     eParvix = 8
 } MeterType_Enum;
 
-/* Index into the arrays of SETTINGS_REC and option number of the option calls. */
+/** Index into the arrays of SETTINGS_REC and option number of the option calls. */
 typedef enum MeterOptions_Enum {
     eStripCalCode = 0,
     eBeepStatus = 1,
@@ -96,30 +97,30 @@ typedef enum MeterOptions_Enum {
     eInsulinPumpUse = 18
 } MeterOptions_Enum;
 
-/* What one binary datalog record holds: the recType of RECORD_DATA. Other
+/** What one binary datalog record holds: the recType of RECORD_DATA. Other
    numbers carry only a time stamp and an ordinal. */
 typedef enum RecordType_Enum {
-    VX_REC_GLUCOSE = 0,           /* a blood or control-solution test */
-    VX_REC_ORAL_MEDICATION = 10,  /* oralMedType, oralMedDosage */
-    VX_REC_INSULIN = 11,          /* InsulinType, insulinDosage */
-    VX_REC_PUMP_BOLUS = 12,       /* bolusSetting */
-    VX_REC_PUMP_DAILY_TOTAL = 13, /* dailyTotalSetting */
-    VX_REC_CARBS_FATS = 20,       /* a meal's carbs and fats, or alcohol (mealSegment 4) */
-    VX_REC_CALORIES_PROTEIN = 21, /* a meal's calories and protein */
+    VX_REC_GLUCOSE = 0,           /**< a blood or control-solution test */
+    VX_REC_ORAL_MEDICATION = 10,  /**< oralMedType, oralMedDosage */
+    VX_REC_INSULIN = 11,          /**< InsulinType, insulinDosage */
+    VX_REC_PUMP_BOLUS = 12,       /**< bolusSetting */
+    VX_REC_PUMP_DAILY_TOTAL = 13, /**< dailyTotalSetting */
+    VX_REC_CARBS_FATS = 20,       /**< a meal's carbs and fats, or alcohol (mealSegment 4) */
+    VX_REC_CALORIES_PROTEIN = 21, /**< a meal's calories and protein */
     VX_REC_KETONES = 30,
     VX_REC_HBA1C = 31,
     VX_REC_MICROALBUMIN = 32,
     VX_REC_CHOLESTEROL_LDL_HDL = 33,
-    VX_REC_CHOLESTEROL_TOTAL_TRIG = 34, /* total cholesterol and triglycerides */
-    VX_REC_BLOOD_PRESSURE = 35,         /* systole, diastole */
+    VX_REC_CHOLESTEROL_TOTAL_TRIG = 34, /**< total cholesterol and triglycerides */
+    VX_REC_BLOOD_PRESSURE = 35,         /**< systole, diastole */
     VX_REC_WEIGHT_HEIGHT = 36,
-    VX_REC_HEALTH_NOTES = 37, /* stress, feeling hypo, illness, menses, vacation, other */
+    VX_REC_HEALTH_NOTES = 37, /**< stress, feeling hypo, illness, menses, vacation, other */
     VX_REC_LAST_VISIT = 38,
-    VX_REC_EXERCISE = 45, /* ExerciseLevel, exerciseDuration in minutes */
-    VX_REC_CAL_CODE = 52  /* a strip calibration code change */
+    VX_REC_EXERCISE = 45, /**< ExerciseLevel, exerciseDuration in minutes */
+    VX_REC_CAL_CODE = 52  /**< a strip calibration code change */
 } RecordType_Enum;
 
-/* Serial-port control block, in the layout of the Windows DCB. */
+/** Serial-port control block, in the layout of the Windows DCB. */
 typedef struct dcb {
     int32_t DCBlength;
     int32_t BaudRate;
@@ -138,19 +139,19 @@ typedef struct dcb {
     int16_t wReserved1;
 } dcb;
 
-/* The serial port in use. */
+/** The serial port in use. */
 typedef struct PORT_REC {
     int16_t portStatus;
-    int32_t Id; /* open port handle; 0 or less when none */
+    int32_t Id; /**< open port handle; 0 or less when none */
     int16_t com_number;
     int16_t baud_rate;
     struct dcb dcb;
 } PORT_REC;
 
-/* The meter's options, each array indexed by MeterOptions_Enum. */
+/** The meter's options, each array indexed by MeterOptions_Enum. */
 typedef struct SETTINGS_REC {
     int16_t Status[22];
-    int16_t Availability[22]; /* 0 no such option, 1 read-only, 2 writable */
+    int16_t Availability[22]; /**< 0 no such option, 1 read-only, 2 writable */
     int16_t nValue[22];
     int16_t nValue_min[22];
     int16_t nValue_max[22];
@@ -171,7 +172,7 @@ typedef struct INSULIN_MAP_TYPE {
     int16_t insulins[14];
 } INSULIN_MAP_TYPE;
 
-/* One meter session's record, passed to every transport call. */
+/** One meter session's record, passed to every transport call. */
 typedef struct METER_REC {
     int16_t M_Type;
     int16_t Error_code;
@@ -214,7 +215,7 @@ typedef struct METER_REC {
     uint8_t Raw_buff[1536];
 } METER_REC;
 
-/* One test inside a record-datalog entry. */
+/** One test inside a record-datalog entry. */
 typedef struct TEST_REC {
     int16_t Result;
     int16_t Sample_detected;
@@ -224,16 +225,16 @@ typedef struct TEST_REC {
     int16_t T_Type;
 } TEST_REC;
 
-/* One record-datalog entry. */
+/** One record-datalog entry. */
 typedef struct data_rec {
     int16_t D_Type;
     int16_t Valid;
     int16_t ResultApproximated;
-    int32_t D_Time; /* transport seconds */
+    int32_t D_Time; /**< transport seconds */
     TEST_REC Test;
 } data_rec;
 
-/* The record datalog of meter types 1-6 and 8. */
+/** The record datalog of meter types 1-6 and 8. */
 typedef struct METER_DATALOG {
     int16_t recordCount;
     int16_t ValidRecordCount;
@@ -241,7 +242,7 @@ typedef struct METER_DATALOG {
     data_rec DataLog[255];
 } METER_DATALOG;
 
-/* The binary datalog of meter type 7, decoded with GetMeterDatalogRecordData. */
+/** The binary datalog of meter type 7, decoded with GetMeterDatalogRecordData. */
 typedef struct METER_BIN_DATALOG {
     int16_t recordCount;
     int16_t corruptedCount;
@@ -249,9 +250,9 @@ typedef struct METER_BIN_DATALOG {
     uint8_t binBuf[30640];
 } METER_BIN_DATALOG;
 
-/* One decoded record of a binary datalog. */
+/** One decoded record of a binary datalog. */
 typedef struct RECORD_DATA {
-    int16_t recType; /* a RecordType_Enum value; kept 16 bits wide by the layout */
+    int16_t recType; /**< a RecordType_Enum value; kept 16 bits wide by the layout */
     int32_t timeStamp;
     int16_t Ordinal;
     int16_t reading;
@@ -294,7 +295,7 @@ typedef struct RECORD_DATA {
     int16_t newCalCode;
 } RECORD_DATA;
 
-/* One insulin or oral-medication name slot. */
+/** One insulin or oral-medication name slot. */
 typedef struct INSULIN_OR_ORAL_MED_NAME_TYPE {
     int16_t index;
     int16_t notChangeable;
@@ -309,12 +310,12 @@ typedef struct PREDEFINED_ORAL_MEDS_TYPE {
     int16_t oralMedType[5];
 } PREDEFINED_ORAL_MEDS_TYPE;
 
-/* Meal-segment start times in quarter hours. */
+/** Meal-segment start times in quarter hours. */
 typedef struct MEAL_SEGMENTS_TYPE {
     int16_t mealSegments[7];
 } MEAL_SEGMENTS_TYPE;
 
-/* The transport's time record; wday, yday and isdst are informative. */
+/** The transport's time record; wday, yday and isdst are informative. */
 typedef struct TIME_REC {
     int16_t sec;
     int16_t min;
@@ -329,7 +330,8 @@ typedef struct TIME_REC {
 
 #pragma pack(pop)
 
-/* The binary layout, checked at compile time. */
+/* The binary layout, checked at compile time (left out of the API reference). */
+/** @cond */
 VARNEL_STATIC_ASSERT(sizeof(dcb) == 28, "dcb size");
 VARNEL_STATIC_ASSERT(offsetof(dcb, BaudRate) == 4 && offsetof(dcb, fFlags) == 8 && offsetof(dcb, wReserved) == 12 &&
                          offsetof(dcb, XonLim) == 14 && offsetof(dcb, XoffLim) == 16 && offsetof(dcb, ByteSize) == 18 &&
@@ -421,6 +423,7 @@ VARNEL_STATIC_ASSERT(sizeof(PREDEFINED_INSULINS_TYPE) == 6, "PREDEFINED_INSULINS
 VARNEL_STATIC_ASSERT(sizeof(PREDEFINED_ORAL_MEDS_TYPE) == 10, "PREDEFINED_ORAL_MEDS_TYPE size");
 VARNEL_STATIC_ASSERT(sizeof(MEAL_SEGMENTS_TYPE) == 14, "MEAL_SEGMENTS_TYPE size");
 VARNEL_STATIC_ASSERT(sizeof(TIME_REC) == 18, "TIME_REC size");
+/** @endcond */
 
 #ifdef __cplusplus
 }

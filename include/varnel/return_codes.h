@@ -1,4 +1,7 @@
-// The texts of the return codes, as the component writes them into status documents.
+/**
+ * @file return_codes.h
+ * The texts of the return codes, as the component writes them into status documents.
+ */
 #pragma once
 
 #include <string>
@@ -7,7 +10,7 @@
 
 namespace varnel {
 
-// The text of a ReturnValues_Enum code; "Unknown status" for a code without one.
+/// The text of a ReturnValues_Enum code; "Unknown status" for a code without one.
 VARNEL_API std::string returnCodeText(long long code);
 
 }  // namespace varnel

@@ -1,4 +1,7 @@
-// A set of texts that tells whether a text was seen before, without regard to case.
+/**
+ * @file unique_checker.h
+ * A set of texts that tells whether a text was seen before, without regard to case.
+ */
 #pragma once
 
 #include <cstddef>
@@ -10,16 +13,17 @@
 
 namespace varnel {
 
-// Texts kept in the order they were added; A-Z and a-z compare equal, other bytes exactly.
+/// Texts kept in the order they were added; A-Z and a-z compare equal, other bytes exactly.
 class VARNEL_API UniqueChecker {
 public:
-    // Adds value unless an equal text is present; true when it was added.
+    /// Adds `value` unless an equal text is present; true when it was added.
     bool AddValue(const std::string& value);
-    // Removes every text.
+    /// Removes every text.
     void Clear();
 
+    /// The number of texts kept.
     std::size_t Count() const { return values_.size(); }
-    // The texts added, first added first.
+    /// The texts added, first added first.
     const std::vector<std::string>& Values() const { return values_; }
 
 private:

@@ -1,4 +1,5 @@
-/*
+/**
+ * @file varnel.h
  * The component as a C interface, for C programs and any language with a C
  * foreign-function interface. One varnel_component stands for one DllWrapper
  * and one varnel_doc for one XMLWrapper; the requests, their documents and
@@ -29,68 +30,70 @@
 extern "C" {
 #endif
 
-/* One XML document (an XMLWrapper). */
+/** One XML document (an XMLWrapper). */
 typedef struct varnel_doc varnel_doc;
-/* One component (a DllWrapper) with its transport library. */
+/** One component (a DllWrapper) with its transport library. */
 typedef struct varnel_component varnel_component;
 
-/* An empty document; NULL when out of memory. */
+/** An empty document; NULL when out of memory. */
 VARNEL_API varnel_doc* varnel_doc_new(void);
-/* A document of that kind (XMLWrapper::InitDocument); NULL for an unknown kind. */
+/** A document of that kind (XMLWrapper::InitDocument); NULL for an unknown kind. */
 VARNEL_API varnel_doc* varnel_doc_new_kind(int32_t kind);
-/* 0 loaded; non-zero when xml is not well-formed (or NULL), the document unchanged. */
+/** 0 loaded; non-zero when xml is not well-formed (or NULL), the document unchanged. */
 VARNEL_API int varnel_doc_load(varnel_doc* doc, const char* xml);
-/* The document as text, newly allocated ("" when empty); release with varnel_free.
+/** The document as text, newly allocated ("" when empty); release with varnel_free.
    NULL for a NULL document or when out of memory. */
 VARNEL_API char* varnel_doc_xml(const varnel_doc* doc);
-/* The readings of a datalog document as the JSON of `varnel readings --json`
+/** The readings of a datalog document as the JSON of `varnel readings --json`
    (docs/exports.md), newly allocated; glucose in mmol/L when glucose_mmol is
    non-zero, else in the meter's unit. Release with varnel_free. NULL when the
    document is not a datalog (or NULL), or when out of memory. */
 VARNEL_API char* varnel_doc_readings_json(const varnel_doc* datalog, int glucose_mmol);
-/* Releases a document; NULL does nothing. */
+/** Releases a document; NULL does nothing. */
 VARNEL_API void varnel_doc_free(varnel_doc* doc);
-/* Releases a text of varnel_doc_xml or varnel_doc_readings_json; NULL does nothing. */
+/** Releases a text of varnel_doc_xml or varnel_doc_readings_json; NULL does nothing. */
 VARNEL_API void varnel_free(void* text);
 
-/* A component over the transport library at that path (loaded on the first
+/** A component over the transport library at that path (loaded on the first
    request); NULL path: the simulated transport shipped with Varnel. NULL when out of memory. */
 VARNEL_API varnel_component* varnel_new(const char* transport_path);
-/* Releases a component; NULL does nothing. */
+/** Releases a component; NULL does nothing. */
 VARNEL_API void varnel_delete(varnel_component* c);
 
-/* Finds a meter on the ports of conn_info and describes it in device_info; fills
+/** Finds a meter on the ports of conn_info and describes it in device_info; fills
    rec, which every later request on that meter takes. */
 VARNEL_API int32_t varnel_discover_device(varnel_component* c, METER_REC* rec, varnel_doc* device_info,
                                           varnel_doc* conn_info, varnel_doc* status);
-/* Writes the settings of device_cfg (a device settings document) to the meter. */
+/** Writes the settings of device_cfg (a device settings document) to the meter. */
 VARNEL_API int32_t varnel_set_device_settings(varnel_component* c, METER_REC* rec, varnel_doc* device_info,
                                               varnel_doc* device_cfg, varnel_doc* status);
-/* Reads the meter's settings into device_cfg: all when fetch_all, else the items it lists. */
+/** Reads the meter's settings into device_cfg: all when fetch_all, else the items it lists. */
 VARNEL_API int32_t varnel_get_device_settings(varnel_component* c, METER_REC* rec, varnel_doc* device_info,
                                               varnel_doc* device_cfg, int fetch_all, varnel_doc* status,
                                               int* check_meter);
-/* Describes what the meter supports in device_caps: all when fetch_all, else the items it lists. */
+/** Describes what the meter supports in device_caps: all when fetch_all, else the items it lists. */
 VARNEL_API int32_t varnel_get_device_caps(varnel_component* c, METER_REC* rec, varnel_doc* device_info,
                                           varnel_doc* device_caps, int fetch_all, varnel_doc* status, int* check_meter);
-/* Uploads the meter's readings into datalog; filter may be NULL. */
+/** Uploads the meter's readings into datalog; filter may be NULL. */
 VARNEL_API int32_t varnel_get_readings(varnel_component* c, METER_REC* rec, varnel_doc* device_info,
                                        varnel_doc* datalog, varnel_doc* filter, varnel_doc* status, int* check_meter);
-/* Erases the meter's memory. */
+/** Erases the meter's memory. */
 VARNEL_API int32_t varnel_clear_meter(varnel_component* c, METER_REC* rec, varnel_doc* device_info, varnel_doc* status);
-/* Releases the meter. */
+/** Releases the meter. */
 VARNEL_API int32_t varnel_close_meter(varnel_component* c, METER_REC* rec);
 
-/* Progress of the running request (0-100) on the caller's thread; the handler
+/** Progress of the running request (0-100) on the caller's thread; the handler
    may change *percent. NULL fn removes the handler. */
 VARNEL_API void varnel_on_progress(varnel_component* c, void (*fn)(int16_t* percent, void* user), void* user);
-/* Raised at the end of most exits of a request (dll_wrapper.h lists which); closeMeter raises it only
+/** Raised at the end of most exits of a request (dll_wrapper.h lists which); closeMeter raises it only
    when it fails unexpectedly. NULL fn removes the handler. */
 VARNEL_API void varnel_on_complete(varnel_component* c, void (*fn)(void* user), void* user);
 
-/* After a request that raised an unexpected error (a ComponentError in C++): its number, and a text with
-   the description and the routine trace, valid until the next request on c. 0 and NULL otherwise. */
+/** After a request that raised an unexpected error (a ComponentError in C++): its number
+   (varnel::errc); 0 otherwise. */
 VARNEL_API int32_t varnel_error_number(const varnel_component* c);
+/** After a request that raised an unexpected error: a text with the description and the routine trace,
+   valid until the next request on c; NULL otherwise. */
 VARNEL_API const char* varnel_error_text(const varnel_component* c);
 
 #ifdef __cplusplus

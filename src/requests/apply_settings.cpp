@@ -2,15 +2,14 @@
 // edited it, to the meter it describes.
 #include "requests/apply_settings.h"
 
-#include <algorithm>
 #include <cmath>
 #include <initializer_list>
-#include <iterator>
 #include <optional>
 
 #include "errors/err_propagator.h"
 #include "errors/error_description.h"
 #include "requests/document_values.h"
+#include "requests/item_catalogue.h"
 #include "requests/option_tables.h"
 #include "requests/request_frame.h"
 #include "requests/settings_requests.h"
@@ -20,48 +19,6 @@
 namespace varnel::detail {
 
 namespace {
-
-// How an element of "Settings" is written.
-enum class Write { clock, option, devInit, insulins, pills, schedule, targets };
-
-struct SettingsItem {
-    const char* name;
-    const char* alias;  // a second element name for the same item, or null
-    TypeSet acceptedFor;
-    Write write;
-    MeterOptions_Enum option;  // for Write::option
-};
-
-constexpr SettingsItem item(const char* name, TypeSet acceptedFor, Write write) {
-    return {name, nullptr, acceptedFor, write, eStripCalCode};
-}
-
-constexpr SettingsItem option(MeterOptions_Enum o, TypeSet acceptedFor) {
-    // Type 7 calls its event averaging by another name; either sets the one item.
-    return {kOptionElements[o].element, o == eEvevtAveraging ? kEvtAvgDurnElement.element : nullptr, acceptedFor,
-            Write::option, o};
-}
-
-// The elements setDeviceSettings writes, in the order it writes them, with the
-// meter types that accept each.
-constexpr SettingsItem kItems[] = {
-    item("Clock", kAllTypes, Write::clock),      option(eStripCalCode, types({1, 2, 3, 5, 7})),
-    option(eBeepStatus, types({1, 2, 3, 5, 7})), option(eUnits, kAllTypes),
-    item("DevInit", types({7}), Write::devInit), option(eNumericSeparator, types({1, 2, 5})),
-    option(eDateFormat, types({1, 2, 3, 5, 7})), option(eTimeFormat, types({1, 2, 3, 5, 6, 7, 8})),
-    option(eLanguage, types({1, 2, 3, 5, 7})),   option(eCommunicationMode, types({1, 5})),
-    option(eCommunicationRate, types({1, 5})),   option(eTranslateNewLang, types({1, 5})),
-    option(eEvevtAveraging, types({2, 7})),      option(eInsulinPrompt, types({2})),
-    option(eDisplayLastTest, types({3})),        option(eDayAverage, types({3})),
-    option(eDisplayClock, types({5})),           option(eDaylightSavings, types({5})),
-    option(eWeekStartDay, types({7})),           option(eCholestrolUnits, types({7})),
-    option(eInsulinPumpUse, types({7})),         item("Insulins", types({7}), Write::insulins),
-    item("Pills", types({7}), Write::pills),     item("Schedule", types({7}), Write::schedule),
-    item("Targets", types({7}), Write::targets),
-};
-
-// Elements the client may send back as it read them, which are never written.
-constexpr const char* kReadOnlyItems[] = {"GlucErrRange", "GlucRange", "GlucCalib"};
 
 bool wholeNumber(double v) { return std::floor(v) == v; }
 
@@ -175,9 +132,10 @@ bool identify(Request& req, METER_REC& udtMeterRec, const Claims& c) {
            req.sameType(c.infoType, "Device Info XML") && req.sameSerial(c.infoSerial, "Device Info XML");
 }
 
-// Writes the "Settings" items the meter type accepts, in kItems order, and
-// refuses the others into the outcome; false (reported) when the document
-// lacks an element a write needs or the meter has no model.
+// Writes the "Settings" items the meter type accepts, in catalogue order with
+// the rows marked writtenFirst ahead, and refuses the others into the outcome;
+// false (reported) when the document lacks an element a write needs or the
+// meter has no model.
 bool apply(Request& req, XMLWrapper& deviceCfg, XMLWrapper& status, WriteOutcome& outcome) {
     const auto invalidXml = [&](const std::string& context) {
         return stop(req, ME_FAIL, ME_INVALID_XMLWRAPPOBJ, context);
@@ -190,17 +148,15 @@ bool apply(Request& req, XMLWrapper& deviceCfg, XMLWrapper& status, WriteOutcome
     const std::int32_t children = deviceCfg.GetChildCount();
     if (children == 0) return invalidXml("");
 
-    bool wanted[std::size(kItems)] = {};
+    bool wanted[kCatalogueSize] = {};
     int accepted = 0;
     for (std::int32_t i = 0; i < children; ++i) {
         const std::string name = deviceCfg.GetChildName(i);
-        const auto item = std::find_if(std::begin(kItems), std::end(kItems), [&](const SettingsItem& it) {
-            return name == it.name || (it.alias && name == it.alias);
-        });
-        if (item != std::end(kItems) && has(item->acceptedFor, meterType)) {
-            wanted[item - std::begin(kItems)] = true;
+        const std::optional<std::size_t> item = catalogueIndex(name);
+        if (item && has(kItemCatalogue[*item].written, meterType)) {
+            wanted[*item] = true;
             ++accepted;
-        } else if (std::find(std::begin(kReadOnlyItems), std::end(kReadOnlyItems), name) != std::end(kReadOnlyItems)) {
+        } else if (item && kItemCatalogue[*item].written == 0) {
             outcome.refuse(name + " value is read only;");
         } else {
             outcome.refuse(name + " is not supported;");
@@ -215,40 +171,47 @@ bool apply(Request& req, XMLWrapper& deviceCfg, XMLWrapper& status, WriteOutcome
     req.owner.resetPercentage();
     req.owner.PercentLimit(100);
     ApplyContext ctx{session, *meter, deviceCfg, outcome};
-    for (std::size_t i = 0; i < std::size(kItems); ++i) {
-        if (!wanted[i]) continue;
-        MissingElement missing;
-        bool written = true;
-        switch (kItems[i].write) {
-        case Write::clock:
-            written = false;
-            missing = applyClock(ctx, written);
-            break;
-        case Write::option:
-            writeOption(session, kItems[i].option, deviceCfg, status, outcome);
-            break;
-        case Write::devInit:
-            applyDevInit(ctx);
-            break;
-        case Write::insulins:
-            missing = applyInsulins(ctx);
-            break;
-        case Write::pills:
-            missing = applyOralMeds(ctx);
-            break;
-        case Write::schedule:
-            missing = applySchedule(ctx);
-            break;
-        case Write::targets:
-            missing = applyTargets(ctx);
-            break;
+    for (const bool first : {true, false}) {
+        for (std::size_t i = 0; i < kCatalogueSize; ++i) {
+            const CatalogueItem& item = kItemCatalogue[i];
+            if (!wanted[i] || item.writtenFirst != first) continue;
+            MissingElement missing;
+            bool written = true;
+            switch (item.kind) {
+            case ItemKind::clock:
+                written = false;
+                missing = applyClock(ctx, written);
+                break;
+            case ItemKind::option:
+                writeOption(session, item.option, deviceCfg, status, outcome);
+                break;
+            case ItemKind::devInit:
+                applyDevInit(ctx);
+                break;
+            case ItemKind::insulins:
+                missing = applyInsulins(ctx);
+                break;
+            case ItemKind::pills:
+                missing = applyOralMeds(ctx);
+                break;
+            case ItemKind::schedule:
+                missing = applySchedule(ctx);
+                break;
+            case ItemKind::targets:
+                missing = applyTargets(ctx);
+                break;
+            case ItemKind::glucRange:
+            case ItemKind::glucErrRange:
+            case ItemKind::glucCalib:
+                continue;  // read only: never wanted
+            }
+            // The writes made so far stay made; the refusals gathered so far are told too.
+            if (missing)
+                return invalidXml(" ;" + *missing + " missing in Device settings" +
+                                  (outcome.strError.empty() ? "" : ";" + outcome.strError));
+            if (!written) continue;
+            progress.advance(req.owner);
         }
-        // The writes made so far stay made; the refusals gathered so far are told too.
-        if (missing)
-            return invalidXml(" ;" + *missing + " missing in Device settings" +
-                              (outcome.strError.empty() ? "" : ";" + outcome.strError));
-        if (!written) continue;
-        progress.advance(req.owner);
     }
     return true;
 }

@@ -3,17 +3,16 @@
 // keeps. Either everything its type offers or the names a client lists.
 #include <algorithm>
 #include <array>
-#include <cstdio>
 #include <initializer_list>
 #include <memory>
 #include <optional>
 #include <string>
-#include <string_view>
 
 #include "errors/err_propagator.h"
 #include "errors/error_description.h"
 #include "requests/discovery.h"
 #include "requests/document_values.h"
+#include "requests/item_catalogue.h"
 #include "requests/option_tables.h"
 #include "requests/option_writers.h"
 #include "requests/request_frame.h"
@@ -24,66 +23,6 @@
 namespace varnel::detail {
 
 namespace {
-
-enum class Kind : std::uint8_t {
-    clock,
-    option,
-    insulins,
-    pills,
-    schedule,
-    targets,
-    glucRange,
-    glucErrRange,
-    glucCalib
-};
-
-struct SettingRow {
-    Kind kind;
-    const char* name;
-    TypeSet full;                              // types whose full description has it
-    TypeSet listed;                            // types that describe it when a listing asks for it
-    MeterOptions_Enum option = eStripCalCode;  // Kind::option only
-};
-
-constexpr SettingRow optionRow(MeterOptions_Enum option, TypeSet offered) {
-    return {Kind::option, kOptionElements[option].element, offered, offered, option};
-}
-
-constexpr TypeSet kConfigurable = types({1, 2, 3, 5, 7});
-
-// The settings, in the order they are described.
-constexpr SettingRow kSettings[] = {
-    {Kind::clock, "Clock", kAllTypes, kAllTypes},
-    optionRow(eStripCalCode, kConfigurable),
-    optionRow(eBeepStatus, kConfigurable),
-    optionRow(eUnits, kAllTypes),
-    optionRow(eNumericSeparator, types({1, 2, 5})),
-    optionRow(eDateFormat, kConfigurable),
-    optionRow(eTimeFormat, types({1, 2, 3, 5, 6, 7, 8})),
-    optionRow(eLanguage, kConfigurable),
-    optionRow(eCommunicationMode, types({1, 5})),
-    optionRow(eCommunicationRate, types({1, 5})),
-    optionRow(eTranslateNewLang, types({1, 5})),
-    optionRow(eEvevtAveraging, types({2, 7})),
-    optionRow(eInsulinPrompt, types({2})),
-    optionRow(eDisplayLastTest, types({3})),
-    optionRow(eDayAverage, types({3})),
-    optionRow(eDisplayClock, types({5})),
-    optionRow(eDaylightSavings, types({5})),
-    optionRow(eWeekStartDay, types({7})),
-    optionRow(eCholestrolUnits, types({7})),
-    optionRow(eInsulinPumpUse, types({7})),
-    {Kind::insulins, "Insulins", types({7}), types({7})},
-    {Kind::pills, "Pills", types({7}), types({7})},
-    {Kind::schedule, "Schedule", types({7}), types({7})},
-    {Kind::targets, "Targets", types({7}), types({7})},
-    {Kind::glucRange, "GlucRange", kAllTypes, kAllTypes},
-    {Kind::glucErrRange, "GlucErrRange", kAllTypes, kAllTypes},
-    // Type 7 reports no calibration of its own, but describes it when asked.
-    {Kind::glucCalib, "GlucCalib", types({1, 2, 3, 4, 5, 6, 8}), kAllTypes},
-};
-
-constexpr std::size_t kSettingCount = std::size(kSettings);
 
 struct Limits {
     const char* min = nullptr;  // null: no limits
@@ -146,12 +85,9 @@ constexpr MedicationCaps kInsulinCaps{"10", "11", "3"};
 constexpr MedicationCaps kPillCaps{"5", "10", "5"};
 constexpr const char* kCustomNameLength = "8";
 
-// The highest glucose a meter type reads; type 3 stops lower than the others.
-const char* glucoseCeiling(std::int16_t meterType) { return meterType == eDunmark ? "768" : "1023"; }
-
 // What one request describes.
 struct Wanted {
-    std::array<bool, kSettingCount> settings{};
+    std::array<bool, kCatalogueSize> settings{};
     std::array<bool, kRecordCount> records{};
     std::int32_t count = 0;  // sets the progress step
     bool failure = false;    // a listed name was refused
@@ -161,18 +97,12 @@ struct Wanted {
 
 Wanted fullDescription(std::int16_t meterType) {
     Wanted w;
-    for (std::size_t i = 0; i < kSettingCount; ++i) w.settings[i] = has(kSettings[i].full, meterType);
+    for (std::size_t i = 0; i < kCatalogueSize; ++i) w.settings[i] = has(kItemCatalogue[i].described, meterType);
     for (std::size_t i = 0; i < kRecordCount; ++i)
         w.records[i] = kRecords[i].described && has(kRecords[i].types, meterType);
     for (bool b : w.settings) w.count += b;
     for (bool b : w.records) w.count += b;
     return w;
-}
-
-bool settingNamed(const SettingRow& row, std::string_view name) {
-    if (name == row.name) return true;
-    // Type 7 calls its event averaging by another name; either is accepted.
-    return row.kind == Kind::option && row.option == eEvevtAveraging && name == kEvtAvgDurnElement.element;
 }
 
 // Walks the children of the current element, flagging the names the type
@@ -203,8 +133,8 @@ std::optional<std::string> readListing(XMLWrapper& caps, std::int16_t meterType,
     if (caps.GetRootName() != "DeviceCaps") return invalid + " ;";
     if (caps.CountElements("Settings") != 1) return invalid + " ;Settings node missing in Device capabilities";
     caps.MoveToChild("Settings");
-    walkListing(caps, kSettings, w.settings, w, [&](const SettingRow& row, const std::string& name) {
-        return has(row.listed, meterType) && settingNamed(row, name);
+    walkListing(caps, kItemCatalogue, w.settings, w, [&](const CatalogueItem& item, const std::string& name) {
+        return has(item.listed, meterType) && namesItem(item, name);
     });
     caps.MoveToRoot();
     if (caps.CountElements("Records") != 1) return invalid + " ;Records node missing in Device capabilities";
@@ -254,9 +184,9 @@ public:
     std::int16_t settings() {
         caps_.MoveToRoot();
         caps_.MoveToChild("Settings");
-        for (std::size_t i = 0; i < kSettingCount; ++i) {
+        for (std::size_t i = 0; i < kCatalogueSize; ++i) {
             if (!wanted_.settings[i]) continue;
-            if (std::int16_t c = setting(kSettings[i])) return c;
+            if (std::int16_t c = setting(kItemCatalogue[i])) return c;
         }
         return 0;
     }
@@ -279,42 +209,30 @@ public:
     }
 
 private:
-    std::int16_t setting(const SettingRow& row) {
-        switch (row.kind) {
-        case Kind::clock:
+    std::int16_t setting(const CatalogueItem& item) {
+        switch (item.kind) {
+        case ItemKind::clock:
             return clock();
-        case Kind::option:
-            return option(row.option);
-        case Kind::schedule:
+        case ItemKind::option:
+            return option(item.option);
+        case ItemKind::schedule:
             return schedule();
-        case Kind::insulins:
+        case ItemKind::insulins:
             medication("Insulins", kInsulinCaps);
             break;
-        case Kind::pills:
+        case ItemKind::pills:
             medication("Pills", kPillCaps);
             break;
-        case Kind::targets:
+        case ItemKind::targets:
             targets();
             break;
-        case Kind::glucRange:
-            caps_.AddElement("GlucRange");
-            caps_.SetAttribute("High", std::to_string(session_.GlucoseHigh()));
-            caps_.SetAttribute("Low", std::to_string(session_.GlucoseLow()));
-            caps_.SetAttribute("Mode", "0");
+        case ItemKind::glucRange:
+        case ItemKind::glucErrRange:
+        case ItemKind::glucCalib:
+            writeRangeItem(caps_, session_, item.kind, type_);
             break;
-        case Kind::glucErrRange:
-            caps_.AddElement("GlucErrRange");
-            caps_.SetAttribute("High", glucoseCeiling(type_));
-            caps_.SetAttribute("Low", "-1");
-            caps_.SetAttribute("Mode", "0");
-            break;
-        case Kind::glucCalib: {
-            const bool plasma = session_.Calibration() != 0;
-            caps_.AddElement("GlucCalib", plasma ? "1" : "0");
-            caps_.SetAttribute("Txt", plasma ? "Plasma" : "Whole Blood");
-            caps_.SetAttribute("Mode", "0");
-            break;
-        }
+        case ItemKind::devInit:
+            return 0;  // never described
         }
         advance();
         return 0;

@@ -1,18 +1,16 @@
 // The device settings request: reads the meter's settings into the device
 // configuration document, every item the meter type offers or the ones the
 // client lists under "Settings".
-#include <algorithm>
 #include <array>
-#include <cstdio>
 #include <memory>
 #include <optional>
 #include <string>
-#include <string_view>
 
 #include "errors/err_propagator.h"
 #include "errors/error_description.h"
 #include "requests/discovery.h"
 #include "requests/document_values.h"
+#include "requests/item_catalogue.h"
 #include "requests/option_elements.h"
 #include "requests/option_tables.h"
 #include "requests/request_frame.h"
@@ -26,109 +24,6 @@
 namespace varnel::detail {
 
 namespace {
-
-enum class Kind : std::uint8_t {
-    clock,
-    option,
-    devInit,
-    insulins,
-    pills,
-    schedule,
-    targets,
-    glucRange,
-    glucErrRange,
-    glucCalib
-};
-
-struct ItemRow {
-    Kind kind;
-    const char* name;
-    MeterOptions_Enum option = eStripCalCode;  // Kind::option only
-};
-
-constexpr ItemRow optionItem(MeterOptions_Enum option) {
-    return {Kind::option, kOptionElements[option].element, option};
-}
-
-// The items of a settings document, in the order they are written.
-constexpr ItemRow kItems[] = {
-    {Kind::clock, "Clock"},
-    optionItem(eStripCalCode),
-    optionItem(eBeepStatus),
-    {Kind::devInit, "DevInit"},
-    optionItem(eUnits),
-    optionItem(eNumericSeparator),
-    optionItem(eDateFormat),
-    optionItem(eTimeFormat),
-    optionItem(eLanguage),
-    optionItem(eCommunicationMode),
-    optionItem(eCommunicationRate),
-    optionItem(eTranslateNewLang),
-    optionItem(eEvevtAveraging),
-    optionItem(eInsulinPrompt),
-    optionItem(eDisplayLastTest),
-    optionItem(eDayAverage),
-    optionItem(eDisplayClock),
-    optionItem(eDaylightSavings),
-    optionItem(eWeekStartDay),
-    optionItem(eCholestrolUnits),
-    optionItem(eInsulinPumpUse),
-    {Kind::insulins, "Insulins"},
-    {Kind::pills, "Pills"},
-    {Kind::schedule, "Schedule"},
-    {Kind::targets, "Targets"},
-    {Kind::glucRange, "GlucRange"},
-    {Kind::glucErrRange, "GlucErrRange"},
-    {Kind::glucCalib, "GlucCalib"},
-};
-constexpr std::size_t kItemCount = std::size(kItems);
-
-// The items each meter type offers, in the order a full read wants them.
-struct TypeItems {
-    std::array<std::int16_t, 2> types;
-    std::array<const char*, 19> items;  // ends at the first null
-};
-
-constexpr TypeItems kTypeItems[] = {
-    {{1, 1},
-     {"Clock", "GlucRange", "GlucCalib", "GlucErrRange", "CC", "Beep", "GlucUnit", "Decimal", "DateFormat",
-      "TimeFormat", "Language", "CommMode", "Baud", "NewLang"}},
-    {{2, 2},
-     {"Clock", "GlucRange", "GlucErrRange", "GlucCalib", "CC", "Beep", "GlucUnit", "Decimal", "DateFormat",
-      "TimeFormat", "Language", "EvtAvg", "InsPrompt"}},
-    {{3, 3},
-     {"Clock", "GlucRange", "GlucErrRange", "GlucCalib", "CC", "Beep", "GlucUnit", "DateFormat", "TimeFormat",
-      "Language", "ShowLastResult", "DaysAveraged"}},
-    {{4, 4}, {"Clock", "GlucRange", "GlucCalib", "GlucErrRange", "GlucUnit"}},
-    {{5, 5},
-     {"Clock", "GlucRange", "GlucCalib", "GlucErrRange", "CC", "Beep", "GlucUnit", "Decimal", "DateFormat",
-      "TimeFormat", "Language", "CommMode", "Baud", "NewLang", "ShowClock", "DayLight"}},
-    {{6, 8}, {"Clock", "GlucRange", "GlucCalib", "GlucErrRange", "GlucUnit", "TimeFormat"}},
-    {{7, 7},
-     {"Clock", "Schedule", "Insulins", "DevInit", "Pills", "Targets", "GlucRange", "GlucCalib", "GlucErrRange", "CC",
-      "Beep", "GlucUnit", "DateFormat", "TimeFormat", "Language", "EvtAvg", "WeekBegin", "CholesUnit", "PumpUse"}},
-};
-
-// Position of an item name in kItems; "EvtAvgDurn" names the event-averaging item too.
-std::optional<std::size_t> itemIndex(std::string_view name) {
-    if (name == kEvtAvgDurnElement.element) name = kOptionElements[eEvevtAveraging].element;
-    for (std::size_t i = 0; i < kItemCount; ++i)
-        if (name == kItems[i].name) return i;
-    return std::nullopt;
-}
-
-const TypeItems* typeItems(std::int16_t meterType) {
-    for (const TypeItems& row : kTypeItems)
-        if (row.types[0] == meterType || row.types[1] == meterType) return &row;
-    return nullptr;
-}
-
-bool offers(const TypeItems* row, std::size_t item) {
-    if (!row) return false;
-    for (const char* name : row->items)
-        if (name && itemIndex(name) == item) return true;
-    return false;
-}
 
 // How one medication table appears in the document.
 template <class G>
@@ -219,14 +114,13 @@ private:
     void advance();
 
     Exit chooseItems();
-    Exit writeItem(const ItemRow& item);
+    Exit writeItem(const CatalogueItem& item);
     Exit writeClock();
     Exit writeDevInit();
     template <class G>
     Exit writeMedications(const MedicationItem<G>& item);
     Exit writeSchedule();
     Exit writeTargets();
-    void writeRanges(Kind kind);
     std::int32_t finish();
 
     Request& req_;
@@ -236,7 +130,7 @@ private:
     const bool fetchAll_;
     METER_REC record_{};
     std::shared_ptr<MeterModel> meter_;
-    std::array<bool, kItemCount> wanted_{};
+    std::array<bool, kCatalogueSize> wanted_{};
     std::int32_t listed_ = 0;  // children of the client's "Settings"
     ItemProgress progress_;
     std::string message_;
@@ -266,12 +160,13 @@ ISetupGroup* SettingsRequest::readGroup(std::int32_t number, const char* failure
 void SettingsRequest::advance() { progress_.advance(req_.owner); }
 
 SettingsRequest::Exit SettingsRequest::chooseItems() {
-    const TypeItems* offered = typeItems(record_.M_Type);
+    const std::int16_t type = record_.M_Type;
     std::int32_t count = 0;
     if (fetchAll_) {
-        for (std::size_t i = 0; i < kItemCount; ++i) wanted_[i] = offers(offered, i);
-        if (offered)
-            for (const char* name : offered->items) count += name != nullptr;
+        for (std::size_t i = 0; i < kCatalogueSize; ++i) {
+            wanted_[i] = has(kItemCatalogue[i].read, type);
+            count += wanted_[i];
+        }
     } else {
         cfg_.MoveToRoot();
         if (cfg_.GetRootName() != "DeviceSettings") {
@@ -286,8 +181,8 @@ SettingsRequest::Exit SettingsRequest::chooseItems() {
         }
         for (std::int32_t i = 0; i < listed_; ++i) {
             const std::string name = cfg_.GetChildName(i);
-            const std::optional<std::size_t> item = itemIndex(name);
-            if (item && offers(offered, *item)) {
+            const std::optional<std::size_t> item = catalogueIndex(name);
+            if (item && has(kItemCatalogue[*item].read, type)) {
                 wanted_[*item] = true;
                 ++count;
             } else {
@@ -401,7 +296,7 @@ SettingsRequest::Exit SettingsRequest::writeTargets() {
     cfg_.AddElement("Targets");
     cfg_.SetAttribute("Mode", "1");
     // The limits are in the meter's glucose unit, read here unless the unit element already was.
-    if (!wanted_[*itemIndex(kOptionElements[eUnits].element)]) {
+    if (!wanted_[*catalogueIndex(kOptionElements[eUnits].element)]) {
         if (const std::int16_t c = req_.session.transport().vb_Read_Meter_Option(record_, eUnits))
             return readFailed(c, " ; Target Units settings failed");
         read_ = true;
@@ -417,53 +312,33 @@ SettingsRequest::Exit SettingsRequest::writeTargets() {
     return std::nullopt;
 }
 
-void SettingsRequest::writeRanges(Kind kind) {
-    MeterDll& session = req_.session;
-    switch (kind) {
-    case Kind::glucRange:
-        cfg_.AddElement("GlucRange");
-        cfg_.SetAttribute("High", std::to_string(session.GlucoseHigh()));
-        cfg_.SetAttribute("Low", std::to_string(session.GlucoseLow()));
-        break;
-    case Kind::glucErrRange:
-        cfg_.AddElement("GlucErrRange");
-        cfg_.SetAttribute("High", session.storedRecord().M_Type == eDunmark ? "768" : "1023");
-        cfg_.SetAttribute("Low", "-1");
-        break;
-    default: {
-        const bool plasma = session.Calibration() != 0;
-        cfg_.AddElement("GlucCalib", plasma ? "1" : "0");
-        cfg_.SetAttribute("Txt", plasma ? "Plasma" : "Whole Blood");
-        break;
-    }
-    }
-    cfg_.SetAttribute("Mode", "0");
-    advance();
-}
-
-SettingsRequest::Exit SettingsRequest::writeItem(const ItemRow& item) {
+SettingsRequest::Exit SettingsRequest::writeItem(const CatalogueItem& item) {
     switch (item.kind) {
-    case Kind::clock:
+    case ItemKind::clock:
         return writeClock();
-    case Kind::option:
+    case ItemKind::option:
         if (const std::int16_t r = options_.write(cfg_, item.option, status_)) return closeAndEnd(r);
         if (!options_.bulk()) read_ = true;
         advance();
         return std::nullopt;
-    case Kind::devInit:
+    case ItemKind::devInit:
         return writeDevInit();
-    case Kind::insulins:
+    case ItemKind::insulins:
         return writeMedications(kInsulinItem);
-    case Kind::pills:
+    case ItemKind::pills:
         return writeMedications(kPillItem);
-    case Kind::schedule:
+    case ItemKind::schedule:
         return writeSchedule();
-    case Kind::targets:
+    case ItemKind::targets:
         return writeTargets();
-    default:
-        writeRanges(item.kind);
+    case ItemKind::glucRange:
+    case ItemKind::glucErrRange:
+    case ItemKind::glucCalib:
+        writeRangeItem(cfg_, req_.session, item.kind, req_.session.storedRecord().M_Type);
+        advance();
         return std::nullopt;
     }
+    return std::nullopt;
 }
 
 std::int32_t SettingsRequest::finish() {
@@ -483,14 +358,8 @@ std::int32_t SettingsRequest::finish() {
 std::int32_t SettingsRequest::run(bool& blnCheckMeter) {
     MeterDll& session = req_.session;
     req_.ensureSession();
-    deviceInfo_.SelectElement("PortInfo");
-    const double port = ToNumber(deviceInfo_.GetChildValue("PortID"));
-    if (port < 0) {
-        req_.report(ME_COM_ERROR, ME_BAD_PARAMETER,
-                    ErrorDescription(ME_BAD_PARAMETER) + " ; Port number from XML file is invalid");
+    if (!req_.usePort(Request::portText(deviceInfo_), ME_COM_ERROR, " ; Port number from XML file is invalid"))
         return end(ME_FAIL);
-    }
-    session.setCOMPort_Pref(roundToInt16(port));
     blnCheckMeter = true;
     session.initMeter(req_.rec);
     SetContinueFlag(true);
@@ -511,12 +380,13 @@ std::int32_t SettingsRequest::run(bool& blnCheckMeter) {
     cfg_.MoveToChild("Settings");
 
     bool optionWanted = false;
-    for (std::size_t i = 0; i < kItemCount; ++i) optionWanted |= wanted_[i] && kItems[i].kind == Kind::option;
-    for (std::size_t i = 0; i < kItemCount; ++i) {
+    for (std::size_t i = 0; i < kCatalogueSize; ++i)
+        optionWanted |= wanted_[i] && kItemCatalogue[i].kind == ItemKind::option;
+    for (std::size_t i = 0; i < kCatalogueSize; ++i) {
         if (!wanted_[i]) continue;
-        const ItemRow& item = kItems[i];
+        const CatalogueItem& item = kItemCatalogue[i];
         // Meters read in bulk give all their options at once, right after the clock.
-        if (item.kind != Kind::clock && optionWanted) {
+        if (item.kind != ItemKind::clock && optionWanted) {
             optionWanted = false;
             if (const std::int16_t g = options_.fetch(status_)) return closeAndEnd(g);
             if (options_.bulk()) read_ = true;
