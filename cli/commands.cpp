@@ -5,6 +5,7 @@
 
 #include "documents.h"
 #include "export.h"
+#include "interrupt.h"
 #include "output.h"
 #include "session.h"
 #include "settings_commands.h"
@@ -56,6 +57,7 @@ void emit(const std::string& path, const std::string& text) {
         writeOutput(path, text);
     } catch (const OutputError& e) {
         say(e.what());
+        if (const int signal = interruption()) throw RunEnd{interruptedStatus(signal)};
         throw RunEnd{exit_status::local_failure};
     }
 }
@@ -212,7 +214,7 @@ void addMeterCommands(CLI::App& app, int& status) {
         status = MeterSession(cl->meter).run([](MeterSession& s) {
             s.clearMeter();
             std::printf("Erased the readings of meter %s on port %s.\n",
-                        sectionValue(s.deviceInfo(), "DeviceInfo", "SN").c_str(),
+                        printable(sectionValue(s.deviceInfo(), "DeviceInfo", "SN")).c_str(),
                         sectionValue(s.deviceInfo(), "PortInfo", "PortID").c_str());
         });
     });

@@ -114,8 +114,8 @@ void addSetCommand(CLI::App& app, int& status) {
         }
         status = MeterSession(line->meter).run([&](MeterSession& s) {
             apply(s, cfg, "set");
-            std::printf("Wrote the settings of %s to meter %s on port %s.\n", line->file.c_str(),
-                        sectionValue(s.deviceInfo(), "DeviceInfo", "SN").c_str(),
+            std::printf("Wrote the settings of %s to meter %s on port %s.\n", printable(line->file).c_str(),
+                        printable(sectionValue(s.deviceInfo(), "DeviceInfo", "SN")).c_str(),
                         sectionValue(s.deviceInfo(), "PortInfo", "PortID").c_str());
         });
     });

@@ -6,7 +6,7 @@
 set -uo pipefail
 cd "$(dirname "$0")/.."
 seconds="${1:-600}"
-targets=(settings_document load_xml readings profile)
+targets=(settings_document load_xml readings profile replay)
 
 bash scripts/deps.sh >&2 || exit 1
 CC=clang CXX=clang++ cmake -S . -B build-fuzz -DCMAKE_BUILD_TYPE=RelWithDebInfo \
