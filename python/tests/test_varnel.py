@@ -61,7 +61,7 @@ def test_a_partial_outcome_raises_and_carries_what_was_read():
         with varnel.Component() as c:
             c.discover(port=1)
             with pytest.raises(varnel.RequestError) as partial:
-                c.get_settings(items=["Clock", "NoSuchItem"])
+                c.get_caps(items=["Clock", "NoSuchItem"])
             assert partial.value.code == -31
             assert partial.value.document.find("Settings/Clock") is not None
 

@@ -301,7 +301,7 @@ TEST(Capture, ReplayReadsAndWaitsWithinItsLimits) {
     bool finished = false;
     replay(file, steps, &finished, false);
     EXPECT_TRUE(finished) << replayError();
-    EXPECT_EQ(slept, 0u);
+    EXPECT_LT(slept, recorded);  // the component's own waits only
 
     Lines lines = fileLines(file);
     for (std::string& l : lines)
