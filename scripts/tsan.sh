@@ -7,9 +7,9 @@
 # Stops at the first report.
 set -euo pipefail
 cd "$(dirname "$0")/.."
-sessions="${VARNEL_THREAD_SESSIONS:-100}"
+sessions="${VARNEL_THREAD_SESSIONS:-150}"
 cmake -S . -B build-tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DVARNEL_WERROR=ON -DVARNEL_SANITIZE=thread >/dev/null
-cmake --build build-tsan -j"$(nproc)" --target test_component test_util test_platform >&2
+cmake --build build-tsan -j"$(nproc)" --target vantrix32 test_component test_util test_platform >&2
 export TSAN_OPTIONS="halt_on_error=1 second_deadlock_stack=1"
 VARNEL_THREAD_SESSIONS=$sessions build-tsan/bin/test_component --gtest_filter='Threads.*'
 build-tsan/bin/test_util --gtest_filter='ContinueFlag.*'

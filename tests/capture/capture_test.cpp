@@ -372,6 +372,10 @@ TEST_F(CaptureCommand, RecordedReadingsReplayThroughTheCommand) {
     const auto other = varnel({"settings", "-q", "--replay", capture});
     EXPECT_NE(other.status, 0);
     EXPECT_NE(other.err.find("varnel: replay of " + capture + ": call "), std::string::npos) << other.err;
+    // A text handed to the command reaches the terminal escaped, whichever message carries it.
+    const auto hostile = varnel({"readings", "--sim-profile", (dir / "no\x1b]0;x\x07.xml").string()});
+    EXPECT_NE(hostile.err.find("no\\x1b]0;x\\x07.xml"), std::string::npos) << hostile.err;
+    EXPECT_EQ(hostile.err.find('\x1b'), std::string::npos);
 }
 
 // Writes the kept sessions anew: run with --gtest_also_run_disabled_tests --gtest_filter='*WriteKeptSessions'.

@@ -117,7 +117,9 @@ void runTogether(const std::vector<Session>& clients) {
 struct Threads : ::testing::Test {
     void* library = dlopen(VARNEL_TEST_TRANSPORT_PATH, RTLD_NOW | RTLD_LOCAL);
     void select(int type) { reinterpret_cast<int (*)(int)>(dlsym(library, "vxsim_select_type"))(type); }
+    void SetUp() override { ASSERT_NE(library, nullptr) << dlerror(); }
     void TearDown() override {
+        if (!library) return;
         reinterpret_cast<int (*)()>(dlsym(library, "vxsim_reset"))();
         ::vxsim_reset();
         dlclose(library);
@@ -127,7 +129,6 @@ struct Threads : ::testing::Test {
 
 // Two meter types on two simulators: C++ over the statically linked one, C over the library.
 TEST_F(Threads, TwoMeterTypesOnTwoThreadsSeeWhatEachSeesAlone) {
-    ASSERT_NE(library, nullptr);
     ::vxsim_select_type(3);
     select(7);
     varnel::DllWrapper cpp = varnel::detail::wrapperOver(varnel::test::simTransport());
@@ -138,7 +139,6 @@ TEST_F(Threads, TwoMeterTypesOnTwoThreadsSeeWhatEachSeesAlone) {
 
 // Both components on the one simulated meter of the library, one through C++, one through C.
 TEST_F(Threads, TwoComponentsOnOneSimulatedMeterSeeWhatEachSeesAlone) {
-    ASSERT_NE(library, nullptr);
     select(5);
     varnel::DllWrapper cpp{std::string(VARNEL_TEST_TRANSPORT_PATH)};
     varnel_component* c = varnel_new(VARNEL_TEST_TRANSPORT_PATH);
