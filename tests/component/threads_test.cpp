@@ -12,8 +12,8 @@
 #include <thread>
 #include <vector>
 
-#include "support/sim_transport.h"
 #include "component/wrapper_access.h"
+#include "support/sim_transport.h"
 #include "varnel/clock.h"
 #include "varnel/dll_wrapper.h"
 #include "varnel/varnel.h"
