@@ -6,6 +6,7 @@
 
 #include "documents.h"
 #include "varnel/readings.h"
+#include "interrupt.h"
 #include "output.h"
 #include "session.h"
 #include "settings_commands.h"
@@ -60,6 +61,7 @@ void emit(const std::string& path, const std::string& text) {
         writeOutput(path, text);
     } catch (const OutputError& e) {
         say(e.what());
+        if (const int signal = interruption()) throw RunEnd{interruptedStatus(signal)};
         throw RunEnd{exit_status::local_failure};
     }
 }
@@ -246,7 +248,7 @@ void addMeterCommands(CLI::App& app, int& status) {
         status = MeterSession(cl->meter).run([](MeterSession& s) {
             s.clearMeter();
             std::printf("Erased the readings of meter %s on port %s.\n",
-                        sectionValue(s.deviceInfo(), "DeviceInfo", "SN").c_str(),
+                        printable(sectionValue(s.deviceInfo(), "DeviceInfo", "SN")).c_str(),
                         sectionValue(s.deviceInfo(), "PortInfo", "PortID").c_str());
         });
     });

@@ -48,7 +48,7 @@ std::string recordsText(XMLWrapper& datalog) {
 }
 
 void fact(const char* name, const std::string& value) {
-    std::printf("%-16s%s\n", (std::string(name) + ":").c_str(), value.c_str());
+    std::printf("%-16s%s\n", (std::string(name) + ":").c_str(), printable(value).c_str());
 }
 
 // Describes the meter. Counting its records takes an upload (half a minute on a real meter),

@@ -8,6 +8,7 @@
 #include "interrupt.h"
 #include "output.h"
 #include "shared_library.h"
+#include "printable.h"
 #include "varnel/component_error.h"
 #include "varnel/return_codes.h"
 
@@ -45,8 +46,11 @@ std::string unexpected(const ComponentError& e, const std::string& during = "") 
 
 }  // namespace
 
+std::string printable(const std::string& text) { return detail::printableText(text); }
+
 void say(const std::string& text) {
-    std::fprintf(stderr, "varnel: %s\n", text.c_str());
+    // Messages carry texts of captures, profiles and meters: none reaches the terminal raw.
+    std::fprintf(stderr, "varnel: %s\n", printable(text).c_str());
     std::fflush(stderr);
 }
 

@@ -52,7 +52,11 @@ struct MeterOptions {
     bool quiet = false;
 };
 
-// Prints "varnel: <text>" on standard error.
+// A text for the terminal: control characters and bytes that are not UTF-8 escaped (\xNN).
+// Every text of a capture, a profile or a meter the command shows goes through it.
+std::string printable(const std::string& text);
+
+// Prints "varnel: <text>" on standard error, printable.
 void say(const std::string& text);
 
 // Ends a run early with an exit status; the reason was already printed.

@@ -244,8 +244,8 @@ void addSetCommand(CLI::App& app, int& status) {
         status = MeterSession(line->meter).run([&](MeterSession& s) {
             const SetReport report = apply(s, cfg, "set");
             if (report.major != "0") sayRefusals(report, cfg);
-            std::printf("Wrote the settings of %s to meter %s on port %s.\n", line->file.c_str(),
-                        sectionValue(s.deviceInfo(), "DeviceInfo", "SN").c_str(),
+            std::printf("Wrote the settings of %s to meter %s on port %s.\n", printable(line->file).c_str(),
+                        printable(sectionValue(s.deviceInfo(), "DeviceInfo", "SN")).c_str(),
                         sectionValue(s.deviceInfo(), "PortInfo", "PortID").c_str());
         });
     });

@@ -5,7 +5,8 @@
 #
 # --all adds what CI runs: the benchmark program (run once by the suite), the
 # same suite built with AddressSanitizer and UndefinedBehaviorSanitizer
-# (build-asan/), each fuzz target for a minute (VARNEL_FUZZ_SECONDS) on its
+# (build-asan/), two components on two threads under ThreadSanitizer
+# (build-tsan/, scripts/tsan.sh), each fuzz target for a minute (VARNEL_FUZZ_SECONDS) on its
 # seed corpus (build-fuzz/), the API reference with every doxygen warning an
 # error, and every further stage found in scripts/ (the Windows cross build
 # under Wine). Every stage runs; the command fails when any
@@ -48,6 +49,7 @@ fi
 stage "test suite" suite build
 if [ $all = 1 ]; then
   stage "test suite under sanitizers" sanitized
+  stage "threads under ThreadSanitizer" bash scripts/tsan.sh
   stage "fuzzing" bash scripts/fuzz.sh "${VARNEL_FUZZ_SECONDS:-60}"
   stage "API reference" bash scripts/docs.sh
   [ -f scripts/windows.sh ] && stage "Windows" bash scripts/windows.sh

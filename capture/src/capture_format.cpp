@@ -6,6 +6,8 @@
 #include <ctime>
 #include <limits>
 
+#include "printable.h"
+
 namespace varnel::capture {
 
 namespace {
@@ -145,18 +147,14 @@ Json numbers(const ArgRef& a, const Bytes& b) {
 }
 
 bool putNumber(const ArgRef& a, const Json& v, Bytes& out, std::size_t i) {
-    if (!v.is_number_integer()) return false;
-    const auto n = v.get<std::int64_t>();
     if (a.type->size == 2) {
-        if (n < std::numeric_limits<std::int16_t>::min() || n > std::numeric_limits<std::int16_t>::max()) return false;
-        const auto x = static_cast<std::int16_t>(n);
-        std::memcpy(out.data() + i * 2, &x, 2);
-    } else {
-        if (n < std::numeric_limits<std::int32_t>::min() || n > std::numeric_limits<std::int32_t>::max()) return false;
-        const auto x = static_cast<std::int32_t>(n);
-        std::memcpy(out.data() + i * 4, &x, 4);
+        const auto x = integerAs<std::int16_t>(v);
+        if (x) std::memcpy(out.data() + i * 2, &*x, 2);
+        return x.has_value();
     }
-    return true;
+    const auto x = integerAs<std::int32_t>(v);
+    if (x) std::memcpy(out.data() + i * 4, &*x, 4);
+    return x.has_value();
 }
 
 std::optional<Bytes> decodeNumbers(const ArgRef& a, const Json& v, std::string& why) {
@@ -298,7 +296,8 @@ std::optional<Bytes> decodeIn(const ArgRef& a, const Json& value, const OutMemor
     if (a.type->number) return decodeNumbers(a, value, why);
     if (value.is_object() && value.contains("fromCall")) {
         const Json& from = value["fromCall"];
-        if (const Bytes* b = from.is_number_integer() ? memory.recall(from.get<int>(), a) : nullptr) return *b;
+        const auto call = integerAs<int>(from);
+        if (const Bytes* b = call ? memory.recall(*call, a) : nullptr) return *b;
         why = "argument " + std::string(a.name) + " refers to no earlier " + a.type->name + " of the capture";
         return std::nullopt;
     }
@@ -347,6 +346,42 @@ Json headerLine(const std::string& transportPath) {
     std::strftime(when, sizeof when, "%Y-%m-%dT%H:%M:%SZ", &utc);
     return Json{{"format", kFormatName}, {"version", kFormatVersion}, {"transport", transportPath}, {"recorded", when}};
 }
+
+std::optional<Json> parseLine(const std::string& text, std::string& why) {
+    // Refused while it is read: a deeper value would be copied and freed recursively later.
+    struct TooDeep {};
+    const auto bound = [](int depth, Json::parse_event_t event, Json&) {
+        if (depth >= kMaxDepth && (event == Json::parse_event_t::object_start ||
+                                   event == Json::parse_event_t::array_start))
+            throw TooDeep{};
+        return true;
+    };
+    try {
+        Json line = Json::parse(text, bound, false);
+        if (!line.is_discarded()) return line;
+        why = "is not valid JSON";
+    } catch (const TooDeep&) {
+        why = "nests deeper than " + std::to_string(kMaxDepth) + " levels";
+    }
+    return std::nullopt;
+}
+
+std::string checkCall(const Json& c) {
+    if (!c.is_object()) return "is no object";
+    for (const char* key : {"fn", "in", "out", "result", "ms"})
+        if (!c.contains(key)) return std::string("has no \"") + key + "\"";
+    if (!c["fn"].is_string() || !c["in"].is_object() || !c["out"].is_object()) return "has a field of the wrong type";
+    if (!integerAs<std::int32_t>(c["result"])) return "has a result that is no 32-bit integer";
+    if (!integerAs<std::uint32_t>(c["ms"])) return "has a time (ms) that is no 32-bit count of milliseconds";
+    if (!c.contains("yields")) return {};
+    if (!c["yields"].is_array()) return "has yields that are no list";
+    for (const Json& y : c["yields"])
+        if (!y.is_object() || !y.contains("at") || !integerAs<std::uint32_t>(y["at"]))
+            return "has a yield whose time (at) is no 32-bit count of milliseconds";
+    return {};
+}
+
+std::string printable(std::string_view text) { return detail::printableText(text); }
 
 std::string lineText(const Json& line) { return line.dump(-1, ' ', false, Json::error_handler_t::replace); }
 

@@ -4,10 +4,12 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <limits>
 #include <map>
 #include <optional>
 #include <span>
 #include <string>
+#include <string_view>
 #include <type_traits>
 #include <vector>
 
@@ -23,6 +25,16 @@ using Bytes = std::vector<std::uint8_t>;
 
 inline constexpr const char* kFormatName = "varnel-capture";
 inline constexpr int kFormatVersion = 1;
+
+// What a replay reads at most. The largest kept session is 175 KB with lines
+// of at most 19 KB nesting 5 levels; the largest object a call carries is a
+// binary datalog, 61 KB as hex, written at most a few times on one line. A
+// full meter's session is about 1.2 MB.
+inline constexpr std::size_t kMaxLineBytes = std::size_t(1) << 20;
+inline constexpr std::uintmax_t kMaxFileBytes = std::uintmax_t(16) << 20;
+inline constexpr int kMaxDepth = 16;
+// The longest a replay waits for one call when it keeps the recorded times.
+inline constexpr std::uint32_t kMaxReplayedWaitMs = 60'000;
 
 // How an argument crosses the boundary (the kinds of vantrix32_functions.h).
 enum class Kind { REC, VALUE, IN, OUT, INOUT, IN_LIST, OUT_LIST };
@@ -127,6 +139,28 @@ std::optional<Bytes> decodeOut(const ArgRef& a, const Json& value, const Bytes& 
 std::string firstDifference(const ArgRef& a, const Bytes& expected, const Bytes& came);
 // A value for a message: a number as it is, an object by its type.
 std::string describe(const ArgRef& a, const Bytes& bytes);
+
+// A line of a capture, or nullopt with `why` set: no JSON, or nested deeper than kMaxDepth.
+std::optional<Json> parseLine(const std::string& text, std::string& why);
+// Why a call line cannot be replayed ("" when it can): a field missing, of the
+// wrong type, or a number that does not fit its field.
+std::string checkCall(const Json& call);
+// A JSON integer that fits `T`, else nullopt (never narrowed, never wrapped).
+template <class T>
+std::optional<T> integerAs(const Json& value) {
+    if (value.is_number_unsigned()) {
+        const auto n = value.get<std::uint64_t>();
+        if (n <= static_cast<std::uint64_t>(std::numeric_limits<T>::max())) return static_cast<T>(n);
+    } else if (value.is_number_integer()) {
+        const auto n = value.get<std::int64_t>();
+        if constexpr (std::is_signed_v<T>)
+            if (n >= std::numeric_limits<T>::min() && n <= std::numeric_limits<T>::max()) return static_cast<T>(n);
+    }
+    return std::nullopt;
+}
+// Text taken from a capture, fit for a terminal: control characters and
+// bytes that are not UTF-8 written as \xNN.
+std::string printable(std::string_view text);
 
 Json headerLine(const std::string& transportPath);
 // A line as written: text that is not UTF-8 (a path) is replaced, never refused.

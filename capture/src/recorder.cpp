@@ -1,10 +1,14 @@
 // libvarnel_record: a transport library that forwards every call to another
 // one and appends each call, with all it carried both ways, to a capture file.
 #include <dlfcn.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include <array>
+#include <cerrno>
 #include <cstdlib>
-#include <fstream>
+#include <cstring>
 #include <functional>
 #include <mutex>
 #include <span>
@@ -32,12 +36,13 @@ struct Recorder {
     void* library = nullptr;
     Inner inner;
     std::string capturePath;
-    std::ofstream file;
+    int file = -1;
     int calls = 0;
     unsigned starts = 0;
     OutMemory memory;
-    // Why recording stopped; every later call fails with it.
+    // Why recording stopped; every later call fails with it, but the release of the meter.
     std::string error;
+    bool releasedUnrecorded = false;
 };
 
 Recorder& recorder() {
@@ -92,10 +97,44 @@ int fail(Recorder& r, std::string why) {
     return ME_FAIL;
 }
 
+// Appends one line; false when not all of it reached the file.
+bool writeLine(int fd, const std::string& text) {
+    const std::string line = text + '\n';
+    for (std::size_t done = 0; done < line.size();) {
+        const ssize_t n = ::write(fd, line.data() + done, line.size() - done);
+        if (n < 0 && errno == EINTR) continue;
+        if (n <= 0) return false;
+        done += static_cast<std::size_t>(n);
+    }
+    return true;
+}
+
+// A capture holds health data: only its owner reads it. A FIFO without a reader is
+// refused at once rather than waited on. Returns the descriptor, or -1 with errno.
+int openCapture(const std::string& path) {
+    const int fd = ::open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_NONBLOCK | O_CLOEXEC, 0600);
+    if (fd < 0) return -1;
+    struct stat st {};
+    if (::fstat(fd, &st) == 0 && S_ISREG(st.st_mode)) (void)::fchmod(fd, 0600);
+    ::fcntl(fd, F_SETFL, ::fcntl(fd, F_GETFL) & ~O_NONBLOCK);
+    return fd;
+}
+
+void closeCapture(Recorder& r) {
+    if (r.file >= 0) ::close(r.file);
+    r.file = -1;
+}
+
+// The capture libraries answer or record themselves; recording one would recurse.
+bool isCaptureLibrary(void* library) {
+    return dlsym(library, "vxcap_record_start") || dlsym(library, "vxcap_replay_start");
+}
+
 int start(Recorder& r, const std::string& transport, const std::string& capture) {
     r.configured = true;
     r.error.clear();
-    r.file.close();
+    r.releasedUnrecorded = false;
+    closeCapture(r);
     if (r.library) dlclose(r.library);
     r.library = nullptr;
     r.inner = {};
@@ -106,6 +145,11 @@ int start(Recorder& r, const std::string& transport, const std::string& capture)
     if (!library) {
         const char* why = dlerror();
         return fail(r, "cannot load the transport library " + transport + ": " + (why ? why : "unknown reason"));
+    }
+    if (isCaptureLibrary(library)) {
+        dlclose(library);
+        return fail(r, "the transport library " + transport +
+                           " is a capture library itself; name the transport library it should record");
     }
     Inner inner;
 #define VARNEL_CAP_RESOLVE(ret, name, ...) inner.name = reinterpret_cast<decltype(inner.name)>(dlsym(library, #name));
@@ -118,10 +162,13 @@ int start(Recorder& r, const std::string& transport, const std::string& capture)
     }
     VX_METER_FUNCTIONS(VARNEL_CAP_REQUIRE)
 #undef VARNEL_CAP_REQUIRE
-    r.file.open(capture, std::ios::out | std::ios::trunc);
-    if (!(r.file << lineText(headerLine(transport)) << '\n' << std::flush)) {
+    r.file = openCapture(capture);
+    const int error = errno;
+    if (r.file < 0 || !writeLine(r.file, lineText(headerLine(transport)))) {
+        const int why = r.file < 0 ? error : errno;
+        closeCapture(r);
         dlclose(library);
-        return fail(r, "cannot write the capture file " + capture);
+        return fail(r, "cannot write the capture file " + capture + ": " + std::strerror(why));
     }
     r.library = library;
     r.inner = inner;
@@ -160,7 +207,14 @@ std::int32_t recordCall(const char* function, const std::array<ArgRef, N>& args,
     Recorder& r = recorder();
     std::lock_guard lock(r.mutex);
     configure(r);
-    if (!r.error.empty()) return failCall(args);
+    if (!r.error.empty()) {
+        // Nothing more is recorded, but a meter that was found must still be released.
+        if (std::strcmp(function, "close_meter") != 0 || !r.library) return failCall(args);
+        handHooks(r);
+        if (!r.releasedUnrecorded) r.error += "; close_meter was passed on to release the meter, unrecorded";
+        r.releasedUnrecorded = true;
+        return forward(r.inner);
+    }
     const int call = r.calls + 1;
     Json line;
     std::array<Bytes, N> in;
@@ -192,8 +246,9 @@ std::int32_t recordCall(const char* function, const std::array<ArgRef, N>& args,
         line["result"] = result;
         line["ms"] = ms;
         if (!under.yields.empty()) line["yields"] = std::move(under.yields);
-        if (!(r.file << lineText(line) << '\n' << std::flush))
-            fail(r, "cannot write the capture file " + r.capturePath + " after call " + std::to_string(call));
+        if (!writeLine(r.file, lineText(line)))
+            fail(r, "cannot write the capture file " + r.capturePath + " after call " + std::to_string(call) + ": " +
+                        std::strerror(errno));
     } catch (const std::exception& e) {
         fail(r, "cannot record call " + std::to_string(call) + ": " + e.what());
     }

@@ -14,7 +14,9 @@
  * Required arguments: the component, the METER_REC and every document except
  * the readings filter. A call missing one returns ME_BAD_PARAMETER and touches
  * nothing. The filter may be NULL (it is never read), and so may check_meter
- * (it is only written).
+ * (it is only written, as the C++ flag is: set to 1 once the port is accepted,
+ * on every exit after that, an unexpected failure included; left as it was
+ * when the port is refused, so start it at 0).
  *
  * Like the component itself, a varnel_component is used by one thread at a time.
  */

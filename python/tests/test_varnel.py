@@ -84,3 +84,25 @@ def test_readings_as_python_values_with_or_without_pandas():
     frame = varnel.readings_frame(log)
     assert len(frame[frame["kind"] == "glucose"]) == sum(r["kind"] == "glucose" for r in got)
     assert frame["time"][0] == pandas.Timestamp(got[0]["time"])
+
+
+def test_a_partial_outcome_raises_and_carries_what_was_read():
+    from pathlib import Path
+    sim = ctypes.CDLL(str(Path(varnel.library()._name).parent / "libvantrix32.so.0"))
+    sim.vxsim_reset()  # the default meter, type 7, with its readings
+    try:
+        with varnel.Component() as c:
+            c.discover(port=1)
+            with pytest.raises(varnel.RequestError) as partial:
+                c.get_caps(items=["Clock", "NoSuchItem"])
+            assert partial.value.code == -31
+            assert partial.value.document.find("Settings/Clock") is not None
+
+            # Records 3 onwards cannot be decoded: the two read before are carried, the failure stands.
+            sim.vxsim_fail_call(b"GetMeterDatalogRecordData", 3, -2, 1)
+            with pytest.raises(varnel.RequestError) as lost:
+                c.get_readings()
+            assert lost.value.code < 0 and "records could not be read" in lost.value.descriptions[-1]
+            assert len(lost.value.document.find("Records")) == 2
+    finally:
+        sim.vxsim_reset()

@@ -27,11 +27,18 @@ _DEVICE_INFO, _DEVICE_SETTINGS, _CONNECTION_INFO, _DEVICE_CAPS, _DATALOG, _FILTE
 
 
 class RequestError(Exception):
-    """A request that failed: its result code and the status document's ErrDesc texts."""
+    """A request that failed: its result code and the status document's ErrDesc texts.
 
-    def __init__(self, request, code, descriptions):
+    ``document`` is what the request wrote all the same (an Element, or None): on a
+    partial outcome (-31, some settings items unknown to the meter; an upload with
+    unreadable records) it holds everything that was read. It is never a success:
+    a datalog carried here is not all the meter holds, so do not erase the meter.
+    """
+
+    def __init__(self, request, code, descriptions, document=None):
         self.code = code
         self.descriptions = list(descriptions)
+        self.document = document
         super().__init__(f"{request} failed with {code}: " + "; ".join(self.descriptions))
 
 
@@ -213,21 +220,21 @@ class Component:
         """Uploads the meter's readings; the datalog document as an Element."""
         datalog = _Doc(_DATALOG)
         self._run("get_readings", self._lib.varnel_get_readings, self.rec, self._found(), datalog.handle, None,
-                  check_meter=True)
+                  check_meter=True, document=datalog)
         return datalog.element()
 
     def get_settings(self, items=None):
         """The meter's settings (all, or the items named) as the settings document."""
         cfg = _Doc(_DEVICE_SETTINGS) if items is None else _Doc(text=_listing("DeviceSettings", items))
         self._run("get_settings", self._lib.varnel_get_device_settings, self.rec, self._found(), cfg.handle,
-                  int(items is None), check_meter=True)
+                  int(items is None), check_meter=True, document=cfg)
         return cfg.element()
 
     def get_caps(self, items=None):
         """What the meter supports (all, or the setting items named) as the capabilities document."""
         caps = _Doc(_DEVICE_CAPS) if items is None else _Doc(text=_listing("DeviceCaps", items, records=True))
         self._run("get_caps", self._lib.varnel_get_device_caps, self.rec, self._found(), caps.handle,
-                  int(items is None), check_meter=True)
+                  int(items is None), check_meter=True, document=caps)
         return caps.element()
 
     def set_settings(self, document):
@@ -273,15 +280,15 @@ class Component:
             raise RequestError("request", ME_BAD_PARAMETER, ["No meter found yet: call discover() first"])
         return self._device.handle
 
-    def _run(self, request, fn, *args, check_meter=False):
+    def _run(self, request, fn, *args, check_meter=False, document=None):
         if self._handle is None:
             raise ValueError("varnel: the component is closed")
         status = _Doc(_STATUS)
         call = list(args) + [status.handle] + ([None] if check_meter else [])
         code = fn(self._handle, *call)
-        self._raise_for(request, code, status)
+        self._raise_for(request, code, status, document)
 
-    def _raise_for(self, request, code, status):
+    def _raise_for(self, request, code, status, document=None):
         if code == ME_SUCCESS:
             return
         number = self._lib.varnel_error_number(self._handle)
@@ -289,7 +296,13 @@ class Component:
             text = self._lib.varnel_error_text(self._handle)
             raise ComponentError(number, text.decode("utf-8", "replace") if text else "")
         descriptions = [e.text or "" for e in status.element().iter("ErrDesc")] if status else []
-        raise RequestError(request, code, descriptions)
+        written = None
+        if document is not None:
+            try:
+                written = document.element()
+            except ET.ParseError:
+                written = None
+        raise RequestError(request, code, descriptions, written)
 
 
 from .readings import readings, readings_frame  # noqa: E402  (needs the names above)

@@ -79,13 +79,19 @@ R shielded(R failed, F&& body) noexcept {
 }
 
 // Runs a request that says whether the meter should be checked again, and hands that to the
-// caller when it asked (check_meter may be null).
+// caller when it asked (check_meter may be null) exactly as the C++ flag is left: written
+// (1) once the port is accepted, on every exit, an unexpected error included; untouched
+// when the port is refused.
 template <class F>
 std::int32_t reportingCheck(int* check_meter, F&& call) {
-    bool check = false;
-    const std::int32_t result = call(check);
-    if (check_meter) *check_meter = check;
-    return result;
+    struct HandOver {
+        int* to;
+        bool check = false;
+        ~HandOver() {
+            if (to && check) *to = 1;
+        }
+    } flag{check_meter};
+    return call(flag.check);
 }
 
 // A text the client releases with varnel_free; NULL when out of memory.

@@ -6,7 +6,7 @@
 
 namespace varnel::detail {
 
-// Steps taken since the program started; tests compare differences.
+// Steps this thread took since it started; tests compare differences.
 std::uint64_t& xmlIndexSteps();
 
 }  // namespace varnel::detail

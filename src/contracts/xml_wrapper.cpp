@@ -44,7 +44,8 @@ namespace varnel {
 
 namespace detail {
 std::uint64_t& xmlIndexSteps() {
-    static std::uint64_t steps = 0;
+    // Per thread: components on other threads count their own steps.
+    thread_local std::uint64_t steps = 0;
     return steps;
 }
 }  // namespace detail
@@ -210,7 +211,8 @@ std::size_t constantNameSize(const char* name) {
         const char* name = nullptr;
         std::size_t size = 0;
     };
-    static std::array<Seen, 1024> seen{};
+    // Per thread, so two components on two threads never share a slot.
+    thread_local std::array<Seen, 1024> seen{};
     // Constants lie a few bytes apart: every address bit goes into the slot.
     Seen& slot = seen[(reinterpret_cast<std::uintptr_t>(name) * 0x9E3779B97F4A7C15u) >> 54];
     if (slot.name == name) return slot.size;

@@ -9,6 +9,7 @@
 #include <new>
 #include <stdexcept>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "varnel/clock.h"
@@ -187,6 +188,36 @@ TEST_F(CInterface, UnexpectedErrorsReachTheClientUntilTheNextRequest) {
         EXPECT_EQ(varnel_error_number(c), varnel::errc::internal);
         const std::string said = varnel_error_text(c) ? varnel_error_text(c) : "(null)";
         EXPECT_TRUE(said.ends_with(r.reason)) << said;
+    }
+}
+
+// check_meter is left as the C++ flag is: untouched while the port is refused, 1 once it was
+// accepted, also when the request then fails unexpectedly.
+TEST_F(CInterface, CheckMeterIsWrittenAsInCppOnRefusalsAndUnexpectedErrors) {
+    using Request = int32_t (*)(varnel_component*, METER_REC*, varnel_doc*, varnel_doc*, varnel_doc*, int*);
+    const std::pair<int32_t, Request> requests[] = {
+        {2, [](varnel_component* c, METER_REC* r, varnel_doc* d, varnel_doc* out, varnel_doc* s, int* check) {
+            return varnel_get_device_settings(c, r, d, out, 1, s, check);
+        }},
+        {4, [](varnel_component* c, METER_REC* r, varnel_doc* d, varnel_doc* out, varnel_doc* s, int* check) {
+            return varnel_get_device_caps(c, r, d, out, 1, s, check);
+        }},
+        {5, [](varnel_component* c, METER_REC* r, varnel_doc* d, varnel_doc* out, varnel_doc* s, int* check) {
+            return varnel_get_readings(c, r, d, out, nullptr, s, check);
+        }},
+    };
+    std::string badPort = text(device.get());
+    badPort.replace(badPort.find("<PortID>") + 8, 1, "-1");
+    const DocPtr refused = loaded(badPort.c_str());
+    for (const auto& [kind, request] : requests) {
+        DocPtr out = doc(kind);
+        int check = -7;
+        varnel_on_complete(c, nullptr, nullptr);
+        EXPECT_NE(request(c, &rec, refused.get(), out.get(), status.get(), &check), ME_SUCCESS);
+        EXPECT_EQ(check, -7);
+        varnel_on_complete(c, [](void*) { throw std::runtime_error("handler failed"); }, nullptr);
+        EXPECT_EQ(request(c, &rec, device.get(), out.get(), status.get(), &check), ME_UNKNOWN);
+        EXPECT_EQ(check, 1);
     }
 }
 

@@ -2,6 +2,9 @@
 // answered by libvarnel_replay: the component must see the very same session.
 #include <dlfcn.h>
 #include <gtest/gtest.h>
+#include <sys/resource.h>
+
+#include <csignal>
 
 #include <cstring>
 #include <filesystem>
@@ -44,10 +47,21 @@ XMLWrapper doc(std::int32_t kind) {
     return d;
 }
 
+// A virtual clock that also adds up every wait, past the 32-bit wrap.
+std::uint64_t slept = 0;
+struct CountingClock : varnel::ManualClock {
+    using ManualClock::ManualClock;
+    void sleep(std::uint32_t ms) override {
+        slept += ms;
+        ManualClock::sleep(ms);
+    }
+};
+
 // Runs the steps as a client would, on a fresh virtual clock, and writes down
 // everything the client sees: codes, documents, status, progress, completions.
 Lines runSession(const std::string& transport, const Steps& steps) {
-    varnel::setThreadClock(std::make_shared<varnel::ManualClock>(1000));
+    slept = 0;
+    varnel::setThreadClock(std::make_shared<CountingClock>(1000));
     Lines seen;
     {
         varnel::DllWrapper w(transport);
@@ -122,8 +136,13 @@ Lines record(int type, const Steps& steps, const fs::path& file, const char* fau
     return seen;
 }
 
-// Replays a capture under the steps; `finished` tells whether every recorded call was asked for.
-Lines replay(const fs::path& file, const Steps& steps, bool* finished = nullptr) {
+// Replays a capture under the steps, keeping the recorded times unless `timed` is false;
+// `finished` tells whether every recorded call was asked for.
+Lines replay(const fs::path& file, const Steps& steps, bool* finished = nullptr, bool timed = true) {
+    if (timed)
+        ::setenv("VARNEL_REPLAY_TIMING", "recorded", 1);
+    else
+        ::unsetenv("VARNEL_REPLAY_TIMING");
     replayer.fn<decltype(vxcap_replay_start)>("vxcap_replay_start")(file.c_str());
     Lines seen = runSession(VARNEL_REPLAY_PATH, steps);
     const int end = replayer.fn<decltype(vxcap_replay_finish)>("vxcap_replay_finish")();
@@ -202,6 +221,23 @@ TEST(Capture, DivergenceIsReportedNotAnswered) {
         if (auto at = l.find("\"ports\":[1,"); at != std::string::npos) l.replace(at, 11, "\"ports\":[2,");
     Lines newer = lines;
     newer[0].replace(newer[0].find("\"version\":1"), 11, "\"version\":2");
+    // Hostile lines: each refused with its line, never crashing, narrowing or waiting.
+    auto edited = [&](const std::string& key, const std::string& value, bool anyLine = false) {
+        Lines out = lines;
+        for (std::size_t i = 1; i < out.size(); ++i) {
+            const auto at = out[i].find("\"" + key + "\":");
+            if (at == std::string::npos || (!anyLine && i != 3)) continue;
+            const auto from = at + key.size() + 3, to = out[i].find_first_of(",}]", from);
+            out[i].replace(from, to - from, value);
+            return out;
+        }
+        ADD_FAILURE() << "no " << key;
+        return out;
+    };
+    Lines deep = lines;
+    deep[3] = std::string(60000, '[') + std::string(60000, ']');
+    Lines longLine = lines;
+    longLine[3] = "{\"pad\":\"" + std::string(std::size_t(1) << 20, ' ') + "\"}";
     const struct {
         const char* name;
         Lines capture;
@@ -217,6 +253,14 @@ TEST(Capture, DivergenceIsReportedNotAnswered) {
          "find_meter: expected ports [2,0,0,0,0,0,0,0,0,0,0], came [1,"},
         {"corrupted line", corrupt, readings, "line 6 is not valid JSON"},
         {"newer format version", newer, readings, "format version 2, newer than this replayer reads (1)"},
+        {"60,000 nested arrays", deep, readings, "line 4 nests deeper than 16 levels"},
+        {"a line past the limit", longLine, readings, "line 4 is longer than 1 MiB"},
+        {"ms past 32 bits", edited("ms", "18446744073709551615"), readings, "line 4 has a time (ms) that is no 32-bit"},
+        {"yield time past 32 bits", edited("at", "4294967296", true), readings, "has a yield whose time (at) is no 32-bit"},
+        {"result past 32 bits", edited("result", "4294967296"), readings, "line 4 has a result that is no 32-bit"},
+        {"fromCall past 32 bits", edited("fromCall", "4294967298", true), readings, "refers to no earlier "},
+        {"escape sequences in a name", edited("fn", "\"\\u001b]0;owned\\u0007x\""), readings,
+         "expected \\x1b]0;owned\\x07x, came "},
     };
     for (const auto& c : cases) {
         SCOPED_TRACE(c.name);
@@ -225,11 +269,80 @@ TEST(Capture, DivergenceIsReportedNotAnswered) {
         const Lines seen = replay(file, c.steps);
         EXPECT_NE(replayError().find(c.says), std::string::npos) << replayError();
         EXPECT_NE(replayError().find(file.string()), std::string::npos);
+        EXPECT_EQ(replayError().find_first_of("\x1b\x07"), std::string::npos);
+        EXPECT_LT(slept, 1'000'000u);
         // The request that met the divergence failed.
         EXPECT_EQ(stepLine(seen, c.steps[c.steps.size() - 2]).find(" code 0 "), std::string::npos);
         fs::remove(file);
     }
     fs::remove(source);
+}
+
+// What a replay reads and waits is bounded: no device or oversized file is read,
+// recorded times are kept only when asked, and then at most a minute a call.
+TEST(Capture, ReplayReadsAndWaitsWithinItsLimits) {
+    const auto start = replayer.fn<decltype(vxcap_replay_start)>("vxcap_replay_start");
+    EXPECT_NE(start("/dev/zero"), 0);
+    EXPECT_NE(replayError().find("the capture is no regular file"), std::string::npos) << replayError();
+    const fs::path big = scratch("big");
+    std::ofstream(big) << "{}";
+    fs::resize_file(big, (std::uintmax_t(16) << 20) + 1);
+    EXPECT_NE(start(big.c_str()), 0);
+    EXPECT_NE(replayError().find("larger than 16 MiB"), std::string::npos) << replayError();
+    fs::remove(big);
+
+    const fs::path file = scratch("timing");
+    const Steps steps{Step::Discover, Step::Readings, Step::Close};
+    const Lines live = record(2, steps, file);
+    const std::uint64_t recorded = slept;
+    ASSERT_GT(recorded, 1000u);
+    EXPECT_EQ(replay(file, steps), live);
+    EXPECT_EQ(slept, recorded);
+    bool finished = false;
+    replay(file, steps, &finished, false);
+    EXPECT_TRUE(finished) << replayError();
+    EXPECT_LT(slept, recorded);  // the component's own waits only
+
+    Lines lines = fileLines(file);
+    for (std::string& l : lines)
+        if (auto at = l.find("\"ms\":"); at != std::string::npos && l.find("\"yields\"") == std::string::npos)
+            l.replace(at + 5, l.find_first_of(",}", at) - at - 5, "4294967295");
+    writeLines(file, lines);
+    replay(file, steps, &finished);
+    EXPECT_TRUE(finished) << replayError();
+    EXPECT_LE(slept, lines.size() * 60'000u);
+    fs::remove(file);
+}
+
+// The recorder refuses to record a capture library, writes captures for their owner
+// alone, and still releases the meter once the capture cannot be written.
+TEST(Capture, RecorderGuardsItsFileAndTheMeter) {
+    const auto start = recorder.fn<decltype(vxcap_record_start)>("vxcap_record_start");
+    const fs::path file = scratch("guarded");
+    for (const char* library : {VARNEL_RECORD_PATH, VARNEL_REPLAY_PATH}) {
+        EXPECT_NE(start(library, file.c_str()), 0);
+        EXPECT_NE(recordError().find("is a capture library itself"), std::string::npos) << recordError();
+    }
+    std::ofstream(file) << "an older capture";
+    fs::permissions(file, fs::perms(0644));
+    record(1, {Step::Discover, Step::Close}, file);
+    EXPECT_EQ(fs::status(file).permissions() & fs::perms::all, fs::perms::owner_read | fs::perms::owner_write);
+
+    // The disk fills after the header: nothing more is recorded, but close_meter still reaches the meter.
+    rlimit saved{};
+    ::getrlimit(RLIMIT_FSIZE, &saved);
+    const auto oldHandler = std::signal(SIGXFSZ, SIG_IGN);
+    rlimit small = saved;
+    small.rlim_cur = 600;
+    ::setrlimit(RLIMIT_FSIZE, &small);
+    ASSERT_EQ(start(VARNEL_TEST_TRANSPORT_PATH, file.c_str()), 0) << recordError();
+    const Lines seen = runSession(VARNEL_RECORD_PATH, {Step::Discover, Step::Close});
+    ::setrlimit(RLIMIT_FSIZE, &saved);
+    std::signal(SIGXFSZ, oldHandler);
+    EXPECT_NE(recordError().find("cannot write the capture file"), std::string::npos) << recordError();
+    EXPECT_NE(recordError().find("close_meter was passed on to release the meter, unrecorded"), std::string::npos);
+    EXPECT_EQ(stepLine(seen, Step::Close), "step 6 code 0 check 1");
+    fs::remove(file);
 }
 
 // The captured session of each type, kept in the tree: a change to what the
@@ -259,6 +372,10 @@ TEST_F(CaptureCommand, RecordedReadingsReplayThroughTheCommand) {
     const auto other = varnel({"settings", "-q", "--replay", capture});
     EXPECT_NE(other.status, 0);
     EXPECT_NE(other.err.find("varnel: replay of " + capture + ": call "), std::string::npos) << other.err;
+    // A text handed to the command reaches the terminal escaped, whichever message carries it.
+    const auto hostile = varnel({"readings", "--sim-profile", (dir / "no\x1b]0;x\x07.xml").string()});
+    EXPECT_NE(hostile.err.find("no\\x1b]0;x\\x07.xml"), std::string::npos) << hostile.err;
+    EXPECT_EQ(hostile.err.find('\x1b'), std::string::npos);
 }
 
 // Writes the kept sessions anew: run with --gtest_also_run_disabled_tests --gtest_filter='*WriteKeptSessions'.

@@ -2,7 +2,7 @@
 add_dependencies(${target} varnel_cli)
 # Its export, report and file-writing units are also tested directly.
 target_sources(${target} PRIVATE ${PROJECT_SOURCE_DIR}/cli/report.cpp ${PROJECT_SOURCE_DIR}/cli/report_figures.cpp
-  ${PROJECT_SOURCE_DIR}/cli/output.cpp)
+  ${PROJECT_SOURCE_DIR}/cli/output.cpp ${PROJECT_SOURCE_DIR}/cli/interrupt.cpp)
 target_link_libraries(${target} PRIVATE nlohmann_json::nlohmann_json)
 target_include_directories(${target} PRIVATE ${PROJECT_SOURCE_DIR}/cli)
 target_compile_definitions(${target} PRIVATE
