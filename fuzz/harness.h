@@ -8,6 +8,7 @@
 
 #include "component/wrapper_access.h"
 #include "simulator.h"
+#include "support/client_session.h"
 #include "util/helpers.h"
 #include "varnel/clock.h"
 #include "varnel/dll_wrapper.h"
@@ -43,11 +44,8 @@ struct Discovered {
         useVirtualClock();
         detail::SetContinueFlag(true);
         sim::loadProfile(sim::defaultProfile(type));
-        XMLWrapper conn = newDoc(doc_kind::connection_info);
-        conn.SelectElement("Ports");
-        conn.AddElement("COM");
-        conn.AddChildElement("PortsToSearch", "", std::to_string(sim::meter().port));
-        found = wrapper.discoverDevice(rec, device, conn, status) == ME_SUCCESS;
+        XMLWrapper out;
+        found = test::makeCall(wrapper, test::Call::discover, rec, device, status, out, sim::meter().port) == ME_SUCCESS;
         status = newDoc(doc_kind::status);
     }
 };

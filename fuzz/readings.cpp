@@ -77,10 +77,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     payload = {data + sizeof header, size - sizeof header};
     fuzz::Discovered meter(transport(), 1 + header.type % 8);
     if (!meter.found) __builtin_trap();
-    XMLWrapper datalog = fuzz::newDoc(doc_kind::datalog), filter = fuzz::newDoc(doc_kind::filter);
-    bool check = true;
+    XMLWrapper datalog;
     try {
-        meter.wrapper.getReadings(meter.rec, meter.device, datalog, filter, meter.status, check);
+        test::makeCall(meter.wrapper, test::Call::readings, meter.rec, meter.device, meter.status, datalog);
         (void)datalog.XML();
     } catch (const ComponentError&) {}
     return 0;

@@ -26,7 +26,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     fuzz::Discovered meter(test::simTransport(), type);
     if (!meter.found) __builtin_trap();
     try {
-        meter.wrapper.setDeviceSettings(meter.rec, meter.device, settings, meter.status);
+        test::makeCall(meter.wrapper, test::Call::setSettings, meter.rec, meter.device, meter.status, settings);
     } catch (const ComponentError&) {}
     return 0;
 }

@@ -101,32 +101,17 @@ TEST(CDocuments, KindsAndMalformedText) {
     varnel_delete(nullptr);
 }
 
-TEST_F(CInterface, EveryRequestOnTheSimulator) {
-    DocPtr settings = doc(2), caps = doc(4), datalog = doc(5), after = doc(5), filter = doc(6);
+// Every request through the interface: python/tests drives a whole session; here, what C alone shows.
+TEST_F(CInterface, FlagsAreCTruthValuesAndRemovedHandlersAreNotCalled) {
+    DocPtr settings = doc(2);
     int check = -1;
     fresh();
     EXPECT_EQ(varnel_get_device_settings(c, &rec, device.get(), settings.get(), 1, status.get(), &check), ME_SUCCESS);
-    EXPECT_TRUE(check == 0 || check == 1) << check;  // written, as a C truth value
+    EXPECT_TRUE(check == 0 || check == 1) << check;
     EXPECT_GT(children(settings.get(), "DeviceSettings/Settings"), 1u);
     EXPECT_EQ(events.completions, 1);
-    EXPECT_EQ(varnel_get_device_caps(c, &rec, device.get(), caps.get(), 1, status.get(), nullptr), ME_SUCCESS);
-    EXPECT_GT(children(caps.get(), "DeviceCaps/Records"), 0u);
-    // The settings as read go back unchanged.
-    EXPECT_EQ(varnel_set_device_settings(c, &rec, device.get(), settings.get(), status.get()), ME_SUCCESS)
-        << text(status.get());
+    EXPECT_FALSE(events.progress.empty());
 
-    fresh();
-    EXPECT_EQ(varnel_get_readings(c, &rec, device.get(), datalog.get(), nullptr, status.get(), &check), ME_SUCCESS);
-    EXPECT_GT(children(datalog.get(), "Datalog/Records"), 0u);
-    EXPECT_EQ(events.completions, 1);
-    ASSERT_FALSE(events.progress.empty());
-    EXPECT_TRUE(std::is_sorted(events.progress.begin(), events.progress.end()));
-
-    EXPECT_EQ(varnel_clear_meter(c, &rec, device.get(), status.get()), ME_SUCCESS) << text(status.get());
-    EXPECT_EQ(varnel_get_readings(c, &rec, device.get(), after.get(), filter.get(), status.get(), nullptr), ME_SUCCESS);
-    EXPECT_EQ(children(after.get(), "Datalog/Records"), 0u);
-
-    // Removed handlers are not called; closing raises no completion either way.
     varnel_on_progress(c, nullptr, nullptr);
     varnel_on_complete(c, nullptr, nullptr);
     fresh();

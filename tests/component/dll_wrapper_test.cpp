@@ -35,28 +35,16 @@ TEST(ProgressStage, StagesHalvesToEvenAndDroppedEvents) {
 }
 
 struct Requests : WrapperTest {
-    // clearMeter with the device information given; the meter's own serial number and type where left empty.
-    std::int32_t clear(const std::string& port = "1", std::string sn = "", std::string type = "") {
-        XMLWrapper doc = deviceDoc(port, sn.empty() ? sim::meter().serial : sn,
-                                   type.empty() ? std::to_string(sim::meter().type) : type);
+    // clearMeter on the meter as discovered.
+    std::int32_t clear() {
+        XMLWrapper doc = deviceDoc("1", sim::meter().serial, std::to_string(sim::meter().type));
         return wrapper->clearMeter(rec, doc, status);
     }
 };
 
-TEST_F(Requests, FailedEraseClosesUnlessToldToKeepTheMeterAndAnEraseReportsItsOwnStage) {
+// A failed erase: the fault sweep; keeping the meter open: device_info_test.
+TEST_F(Requests, AnEraseReportsItsOwnStage) {
     discover(eDunmark);
-    for (std::int16_t keep : {0, -50}) {
-        sim::injectFault("vb_Clear_Meter_Datalog", 1, ME_TIME_OUT, false);
-        fresh();
-        rec.Error_code = keep;
-        EXPECT_EQ(clear(), ME_TIME_OUT);
-        EXPECT_EQ(statusGroups(status), std::vector<std::string>{"-17/-2/Timeout error"});
-        EXPECT_EQ(completions, 1);
-        EXPECT_EQ(closed(), keep != -50);
-        EXPECT_FALSE(detail::frmTimer().tmrStatus().enabled());
-    }
-    EXPECT_FALSE(sim::meter().datalog.empty());
-
     fresh();
     EXPECT_EQ(clear(), ME_SUCCESS);
     EXPECT_TRUE(sim::meter().datalog.empty());
@@ -105,30 +93,9 @@ TEST_F(Requests, CloseReleasesThePortQuietly) {
     EXPECT_EQ(std::ranges::count(fake->names(), "close_meter"), 2);  // tried again by the handler
 }
 
-// The checks every request makes on the device information, through clearMeter.
-TEST_F(Requests, DeviceInformationChecksAndUnexpectedErrors) {
+// The device information checks themselves: requests/device_info_test.cpp.
+TEST_F(Requests, AMissingMeterAndUnexpectedErrors) {
     discover(eDunmark);
-    const std::string bad = "-17/-19/Bad parameter passed to the function ; ";
-    struct Case {
-        std::string port, sn, type;
-        std::int32_t result;
-        std::string group;
-    };  // group "" for none
-    for (const Case& c : {
-             Case{"abc", "dnm3001296", "3.0", 0, ""},  // a port that is no number is port 0; case is ignored
-             Case{"1", "", "0", ME_BAD_PARAMETER, bad + "Device Type from Device Info XML is invalid"},
-             // A type that is no whole number is compared as it is, not rounded.
-             Case{"1", "", "3.5", ME_FAIL,
-                  "-8/-8/Different device detected ; Device Type from Device Info XML - 3.5 "
-                  "Device Type from device - 3 do not match"},
-         }) {
-        SCOPED_TRACE(c.port + "|" + c.sn + "|" + c.type);
-        fresh();
-        EXPECT_EQ(clear(c.port, c.sn, c.type), c.result);
-        EXPECT_EQ(statusGroups(status), c.group.empty() ? std::vector<std::string>{} : std::vector{c.group});
-        EXPECT_EQ(completions, 1);
-        EXPECT_FALSE(closed());
-    }
     // A meter that does not answer ends the request without onComplete.
     sim::detach();
     fresh();

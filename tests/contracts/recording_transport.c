@@ -1,8 +1,6 @@
 /* A transport library for the loading tests, generated from the function list:
- * every function records its name and each argument (numbers by value, objects
- * and lists by address), fills what it is given to fill with 0x5A bytes and
- * returns its own code: -101 for the first function of the list, -102 for the
- * next, and so on. */
+ * every function returns its own code, -101 for the first function of the list,
+ * -102 for the next, and so on; the erase yields to the caller twice. */
 #include <string.h>
 
 #include "varnel/vantrix32.h"
@@ -13,11 +11,6 @@
 #ifdef RECORDING_TRANSPORT_NO_CHK4METER_VARIANT
 #define vb_Chk4Meter withheld_vb_Chk4Meter
 #endif
-
-/* What the last call recorded, for the tests to read. */
-EXPORT const char* last_name = "";
-EXPORT intptr_t last_args[6];
-EXPORT int last_count;
 
 static vx_yield_fn yield_hook = 0;
 static void* yield_context = 0;
@@ -31,17 +24,9 @@ static const char* const names[] = {
 #undef NAME
 };
 
-static void start(void) {
-    memset(last_args, 0, sizeof last_args);
-    last_count = 0;
-}
-
-static void keep(intptr_t arg) { last_args[last_count++] = arg; }
-
-static int16_t finish(const char* name) {
+static int16_t code_of(const char* name) {
     int16_t code = -101;
     while (strcmp(names[-101 - code], name) != 0) --code;
-    last_name = name;
     return code;
 }
 
@@ -53,22 +38,21 @@ static void long_operation(METER_REC* rec) {
     if (yield_hook) yield_hook(yield_context);
 }
 
-#define RECORD(kind, type, name) RECORD_##kind(type, name);
-#define RECORD_REC(type, name) keep((intptr_t)name), rec_seen = name
-#define RECORD_VALUE(type, name) keep((intptr_t)name)
-#define RECORD_IN(type, name) keep((intptr_t)name)
-#define RECORD_INOUT(type, name) keep((intptr_t)name)
-#define RECORD_OUT(type, name) keep((intptr_t)name), memset(name, 0x5A, sizeof *name)
-#define RECORD_IN_LIST(type, name) keep((intptr_t)name)
-#define RECORD_OUT_LIST(type, name) keep((intptr_t)name), memset(name, 0x5A, VX_LIST_LENGTH * sizeof *name)
+#define REC_ARG(kind, type, name) REC_ARG_##kind(name)
+#define REC_ARG_REC(name) rec_seen = name;
+#define REC_ARG_VALUE(name) (void)name;
+#define REC_ARG_IN(name) (void)name;
+#define REC_ARG_INOUT(name) (void)name;
+#define REC_ARG_OUT(name) (void)name;
+#define REC_ARG_IN_LIST(name) (void)name;
+#define REC_ARG_OUT_LIST(name) (void)name;
 
 #define DEFINE(ret, name, ...)                                                                  \
     EXPORT ret name(VX_C_PARAMS(__VA_ARGS__)) {                                                 \
         METER_REC* rec_seen = 0;                                                                \
-        start();                                                                                \
-        VX_EACH(RECORD, __VA_ARGS__)                                                            \
+        VX_EACH(REC_ARG, __VA_ARGS__)                                                           \
         if (rec_seen && strcmp(#name, "vb_Clear_Meter_Datalog") == 0) long_operation(rec_seen); \
-        return finish(#name);                                                                   \
+        return code_of(#name);                                                                  \
     }
 VX_METER_FUNCTIONS(DEFINE)
 

@@ -5,6 +5,7 @@
 
 #include <functional>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "contracts/xml_index_steps.h"
@@ -44,20 +45,17 @@ struct Refusal {
 }  // namespace
 
 TEST(XMLHostileText, LoadRefusesWithWhatAndWhereAndChangesNothing) {
+    // One of each kind of refusal; which texts are well-formed at all: the fuzz target, against libxml2.
     const Refusal refusals[] = {
         {"control", "<R>\n<A>ok</A>\n<B>\x0B</B></R>", "U+000B, which XML does not allow at line 3, offset 17"},
         {"NUL", "<R>ab"s + '\0' + "cd</R>", "U+0000, which XML does not allow at line 1, offset 5"},
         {"reference", "<R>AB&#0;C</R>", "character reference to U+0000, which XML does not allow at line 1, offset 5"},
         {"reference", "<R>&#xD800;</R>", "reference to U+D800"},
-        {"reference", "<R>&#x110000;</R>", "beyond U+10FFFF"},
         {"reference", "<R>&#X41;</R>", "malformed character reference"},
         {"entity", "<R>&nbsp;</R>", "undeclared entity nbsp at line 1, offset 3"},
-        {"entity", "<?xml version='1.0' standalone='yes'?><!DOCTYPE R SYSTEM 'r.dtd'><R>&x;</R>", "undeclared entity"},
         {"UTF-8", "<R>caf\xE9</R>", "invalid UTF-8 (byte 0xE9) at line 1, offset 6"},
         {"UTF-8", "<R a='\xC0\xAF'/>", "invalid UTF-8 (byte 0xC0)"},        // overlong "/"
         {"UTF-8", "<R>\xED\xA0\x80</R>", "invalid UTF-8 (byte 0xED)"},      // an encoded surrogate
-        {"UTF-8", "<R>\xF4\x90\x80\x80</R>", "invalid UTF-8 (byte 0xF4)"},  // beyond U+10FFFF
-        {"UTF-8", "<R\xFF/>", "invalid UTF-8 (byte 0xFF)"},
         {"UTF-8", "<R>\xEF\xBF\xBE</R>", "U+FFFE, which XML does not allow"},
         {"duplicate", "<R a='1' a='2'/>", "duplicate attribute a at line 1, offset 9"},
         {"duplicate",
@@ -66,12 +64,9 @@ TEST(XMLHostileText, LoadRefusesWithWhatAndWhereAndChangesNothing) {
          "duplicate attribute a3"},
         {"DTD", "<!DOCTYPE R [<!ENTITY e 'x'>]><R>&e;</R>", "internal subset"},
         {"DTD", "<!DOCTYPE R PUBLIC 'a{b}' 'c'><R/>", "public identifier"},
-        {"declaration", "<?xml?><R/>", "without a version"},
         {"declaration", "<?xml version='2.0'?><R/>", "unsupported XML version"},
-        {"declaration", "<?xml version='1.0' standalone='maybe'?><R/>", "standalone"},
         {"declaration", "<?xml version='1.0' encoding='8bit'?><R/>", "encoding name"},
         {"declaration", "<?xml version='1.0' encoding='ISO-8859-1'?><R>caf\xC3\xA9</R>", "documents are UTF-8"},
-        {"deep", nested(257), "nested deeper than 256 levels"},
         {"deep", nested(100'000), "nested deeper than 256 levels at line 1, offset 768"},
         {"huge", "<R>" + std::string(kXmlDocumentMaxBytes, 'x') + "</R>", "larger than the 64 MiB"},
     };
@@ -282,23 +277,17 @@ TEST(XMLHostileText, RunningOutOfMemoryIsAComponentError) {
         for (int i = 0; i < elements; ++i) x.AddElement("E", text);
     };
     // Building, writing, copying and loading with too little memory left.
-    EXPECT_EQ(underMemoryLimit(
-                  8 << 20, [] {}, [&] { fill(1 << 30); }),
-              0);
-    EXPECT_EQ(underMemoryLimit(
-                  4 << 20, [&] { fill(4000); }, [&] { (void)x.XML(); }),
-              0);
-    EXPECT_EQ(underMemoryLimit(
-                  4 << 20, [&] { fill(4000); }, [&] { XMLWrapper copy(x); }),
-              0);
     std::string big;
-    EXPECT_EQ(underMemoryLimit(
-                  4 << 20,
-                  [&] {
-                      fill(4000);
-                      big = x.XML();
-                  },
-                  [&] { (void)XMLWrapper().LoadXML(big); }),
-              0);
+    const std::function<void()> prepared = [&] {
+        fill(4000);
+        big = x.XML();
+    };
+    const std::tuple<std::size_t, std::function<void()>, std::function<void()>> shortages[] = {
+        {8 << 20, [] {}, [&] { fill(1 << 30); }},
+        {4 << 20, prepared, [&] { (void)x.XML(); }},
+        {4 << 20, prepared, [&] { XMLWrapper copy(x); }},
+        {4 << 20, prepared, [&] { (void)XMLWrapper().LoadXML(big); }},
+    };
+    for (const auto& [headroom, prepare, run] : shortages) EXPECT_EQ(underMemoryLimit(headroom, prepare, run), 0);
 }
 #endif

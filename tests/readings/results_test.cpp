@@ -39,13 +39,3 @@ TEST(CommentsCollection, OneCommentPerCodeAndKeysIgnoringCase) {
     EXPECT_THROW(c.Remove(2), ComponentError);
 }
 
-TEST(ResultCollection, OneBasedAndInOrder) {
-    ResultCollection results;
-    auto food = std::make_shared<Food>();
-    EXPECT_EQ(results.Add(food), food);
-    results.Add(std::make_shared<Alcohol>());
-    EXPECT_THROW(results.Add(nullptr), ComponentError);
-    EXPECT_EQ(results.Count(), 2);
-    EXPECT_EQ((std::vector{results.Item(0), results.Item(1), results.Item(3)}),
-              (std::vector<ResultPtr>{nullptr, food, nullptr}));
-}

@@ -45,14 +45,6 @@ TEST(DocumentNumber, PlainDecimalsOnly) {
         EXPECT_EQ(DocumentInt16(text), std::nullopt) << text;
 }
 
-TEST(Abbreviated, CutsLongTextsBetweenCharacters) {
-    EXPECT_EQ(Abbreviated("12"), "12");
-    std::string accents;
-    for (int i = 0; i < 41; ++i) accents += "\xC3\xA9";
-    EXPECT_EQ(Abbreviated(accents), accents.substr(0, 80) + "...");
-    EXPECT_EQ(Abbreviated(accents.substr(0, 80)), accents.substr(0, 80));
-}
-
 TEST(ByteTexts, ReadStopsAtZeroOrCountAndWritesStopTwoShortOfTheEnd) {
     const std::uint8_t abc[] = {'A', 'B', 0, 'C'};
     EXPECT_EQ(BytesToText(abc, 4), "AB");
@@ -89,16 +81,6 @@ TEST(ByteTexts, AreTheMetersCodePageAsUtf8CutByCharacters) {
     }
 }
 
-TEST(ToDateTime, JoinsDateAndTimeOfDay) {
-    auto date = *DateTime::fromParts(2004, 2, 29, 23, 59, 59);
-    auto time = *DateTime::fromParts(1999, 7, 1, 8, 5, 30);
-    EXPECT_EQ(ToDateTime(date, time), *DateTime::fromParts(2004, 2, 29, 8, 5, 30));
-    // Before day 0 the time of day still counts forward from midnight.
-    auto early = *DateTime::fromParts(1899, 12, 27, 18);
-    EXPECT_EQ(ToDateTime(early, time), *DateTime::fromParts(1899, 12, 27, 8, 5, 30));
-    EXPECT_EQ(ToDateTime(time, early), *DateTime::fromParts(1999, 7, 1, 18));
-}
-
 TEST(IsValidDate, NumericPattern) {
     const char* p = "dd/MM/yyyy";
     for (const char* ok : {"29/02/2000", "1/2/1601", "31/12/9998", ""})
@@ -117,18 +99,6 @@ TEST(ContinueFlag, IsPerThreadAndStartsTrue) {
     SetContinueFlag(true);
 }
 
-TEST(UniqueChecker, FoldsAsciiCaseKeepsOrderAndClears) {
-    varnel::UniqueChecker checker;
-    for (auto [text, added] :
-         {std::pair{"abc", true}, {"aBc", false}, {"abc ", true}, {"\xC3\xA9", true}, {"\xC3\x89", true}})
-        EXPECT_EQ(checker.AddValue(text), added) << text;  // bytes beyond ASCII compare exactly
-    EXPECT_EQ(checker.Values(), (std::vector<std::string>{"abc", "abc ", "\xC3\xA9", "\xC3\x89"}));
-
-    checker.Clear();
-    EXPECT_EQ(checker.Count(), 0u);
-    EXPECT_TRUE(checker.AddValue("ABC"));
-}
-
 // Serials, keys, port kinds and month names fold ASCII only: bytes of other characters must never
 // match across case, whatever locale the client process runs under.
 TEST(CaseFold, AsciiLettersOnly) {
@@ -141,10 +111,3 @@ TEST(CaseFold, AsciiLettersOnly) {
         EXPECT_EQ(EqualsNoCase(a, b), equal) << a << " / " << b;
 }
 
-// The type a document or a meter names: the family's eight members, a fraction among them only
-// for the identity check to refuse later, and nothing else.
-TEST(MeterType, FamilyRangeOnly) {
-    for (double type : {1.0, 8.0, 0.5}) EXPECT_TRUE(IsMeterType(type)) << type;
-    for (double type : {0.0, -1.0, 8.0001, std::numeric_limits<double>::quiet_NaN()})
-        EXPECT_FALSE(IsMeterType(type)) << type;
-}
