@@ -18,8 +18,6 @@ using namespace std::string_literals;
 
 namespace {
 
-constexpr std::size_t kMiB = std::size_t(1) << 20;
-
 // A document to load over, and what it looked like before.
 XMLWrapper kept() {
     XMLWrapper x;
@@ -36,43 +34,40 @@ std::string nested(int depth, const std::string& inner = "") {
     return open + inner + close;
 }
 
-struct Refusal {
-    const char* kind;
-    std::string text;
-    std::string reason;  // a part of LastLoadError()
-};
-
 }  // namespace
 
 TEST(XMLHostileText, LoadRefusesWithWhatAndWhereAndChangesNothing) {
-    // One of each kind of refusal; which texts are well-formed at all: the fuzz target, against libxml2.
-    const Refusal refusals[] = {
-        {"control", "<R>\n<A>ok</A>\n<B>\x0B</B></R>", "U+000B, which XML does not allow at line 3, offset 17"},
-        {"NUL", "<R>ab"s + '\0' + "cd</R>", "U+0000, which XML does not allow at line 1, offset 5"},
-        {"reference", "<R>AB&#0;C</R>", "character reference to U+0000, which XML does not allow at line 1, offset 5"},
-        {"reference", "<R>&#xD800;</R>", "reference to U+D800"},
-        {"reference", "<R>&#X41;</R>", "malformed character reference"},
-        {"entity", "<R>&nbsp;</R>", "undeclared entity nbsp at line 1, offset 3"},
-        {"UTF-8", "<R>caf\xE9</R>", "invalid UTF-8 (byte 0xE9) at line 1, offset 6"},
-        {"UTF-8", "<R a='\xC0\xAF'/>", "invalid UTF-8 (byte 0xC0)"},        // overlong "/"
-        {"UTF-8", "<R>\xED\xA0\x80</R>", "invalid UTF-8 (byte 0xED)"},      // an encoded surrogate
-        {"UTF-8", "<R>\xEF\xBF\xBE</R>", "U+FFFE, which XML does not allow"},
-        {"duplicate", "<R a='1' a='2'/>", "duplicate attribute a at line 1, offset 9"},
-        {"duplicate",
-         "<R a0='' a1='' a2='' a3='' a4='' a5='' a6='' a7='' a8='' a9='' b0='' b1='' b2='' b3='' "
+    // One of each kind of refusal, and a part of its LastLoadError(); which texts are
+    // well-formed at all: the fuzz target, against libxml2.
+    const std::pair<std::string, const char*> refusals[] = {
+        {"<R>\n<A>ok</A>\n<B>\x0B</B></R>", "U+000B, which XML does not allow at line 3, offset 17"},
+        {"<R>ab"s + '\0' + "cd</R>", "U+0000, which XML does not allow at line 1, offset 5"},
+        {"<R>AB&#0;C</R>", "character reference to U+0000, which XML does not allow at line 1, offset 5"},
+        {"<R>&#xD800;</R>", "reference to U+D800"},
+        {"<R>&#X41;</R>", "malformed character reference"},
+        {"<R>&nbsp;</R>", "undeclared entity nbsp at line 1, offset 3"},
+        {"<R>caf\xE9</R>", "invalid UTF-8 (byte 0xE9) at line 1, offset 6"},
+        {"<R a='\xC0\xAF'/>", "invalid UTF-8 (byte 0xC0)"},    // overlong "/"
+        {"<R>\xED\xA0\x80</R>", "invalid UTF-8 (byte 0xED)"},  // an encoded surrogate
+        {"<R>\xEF\xBF\xBE</R>", "U+FFFE, which XML does not allow"},
+        {"<R a='1' a='2'/>", "duplicate attribute a at line 1, offset 9"},
+        {"<R a0='' a1='' a2='' a3='' a4='' a5='' a6='' a7='' a8='' a9='' b0='' b1='' b2='' b3='' "
          "b4='' b5='' b6='' b7='' a3=''/>",
          "duplicate attribute a3"},
-        {"DTD", "<!DOCTYPE R [<!ENTITY e 'x'>]><R>&e;</R>", "internal subset"},
-        {"DTD", "<!DOCTYPE R PUBLIC 'a{b}' 'c'><R/>", "public identifier"},
-        {"declaration", "<?xml version='2.0'?><R/>", "unsupported XML version"},
-        {"declaration", "<?xml version='1.0' encoding='8bit'?><R/>", "encoding name"},
-        {"declaration", "<?xml version='1.0' encoding='ISO-8859-1'?><R>caf\xC3\xA9</R>", "documents are UTF-8"},
-        {"deep", nested(100'000), "nested deeper than 256 levels at line 1, offset 768"},
-        {"huge", "<R>" + std::string(kXmlDocumentMaxBytes, 'x') + "</R>", "larger than the 64 MiB"},
+        {"just text", "no document element at line 1, offset 0"},
+        {"<R/><S/>", "content after the document element"},
+        {"<R/>trailing", "text outside the document element"},
+        {"<!DOCTYPE R [<!ENTITY x SYSTEM 'file:///etc/passwd'>]><R>&x;</R>", "internal subset"},
+        {"<!DOCTYPE R PUBLIC 'a{b}' 'c'><R/>", "public identifier"},
+        {"<?xml version='2.0'?><R/>", "unsupported XML version"},
+        {"<?xml version='1.0' encoding='8bit'?><R/>", "encoding name"},
+        {"<?xml version='1.0' encoding='ISO-8859-1'?><R>caf\xC3\xA9</R>", "documents are UTF-8"},
+        {nested(100'000), "nested deeper than 256 levels at line 1, offset 768"},
+        {"<R>" + std::string(kXmlDocumentMaxBytes, 'x') + "</R>", "larger than the 64 MiB"},
     };
     XMLWrapper x = kept();
-    for (const auto& [kind, text, reason] : refusals) {
-        SCOPED_TRACE(std::string(kind) + ": " + text.substr(0, 80));
+    for (const auto& [text, reason] : refusals) {
+        SCOPED_TRACE(text.substr(0, 80));
         EXPECT_FALSE(x.LoadXML(text));
         EXPECT_NE(x.LastLoadError().find(reason), std::string::npos) << x.LastLoadError();
         EXPECT_EQ(x.GetRootName(), "Kept");  // unchanged, positions too
@@ -96,14 +91,12 @@ TEST(XMLHostileText, WritingRefusesTextsThatAreNotXmlCharacters) {
     x.AddChildElement("C", "", "c");
     const std::string before = x.XML();
     // One of each kind; every kind the check refuses is in the loading table above.
-    const std::pair<std::string, std::string> bad[] = {
-        {"ok\x1F", "character U+001F, which XML does not allow at byte 2"},
-        {"caf\xE9", "invalid UTF-8"},
-        {"x\xEF\xBF\xBE", "character U+FFFE"}};
-    for (const auto& [value, reason] : bad) {
+    for (const auto& [value, reason] : {std::pair{"ok\x1F", "character U+001F, which XML does not allow at byte 2"},
+                                        {"caf\xE9", "invalid UTF-8"},
+                                        {"x\xEF\xBF\xBE", "character U+FFFE"}}) {
         SCOPED_TRACE(value);
         expectError([&] { x.AddElement("N", value); }, errc::document_failure,
-                    "AddElement: the text for 'N' has " + reason);
+                    "AddElement: the text for 'N' has "s + reason);
         expectError([&] { x.AddChildElement("N", "", value); }, errc::document_failure, "AddChildElement: the text");
         expectError([&] { x.SetAttribute("a", value); }, errc::document_failure, "SetAttribute: the value for 'a' has");
         expectError([&] { x.SetChildAttribute("a", value); }, errc::document_failure, reason);
@@ -125,19 +118,20 @@ TEST(XMLHostileText, WritingRefusesTextsThatAreNotXmlCharacters) {
 TEST(XMLHostileText, BuildingStopsAtTheSameDepthAndSizeThatLoadingAccepts) {
     // Depth: 256 levels through the operations, the 257th refused, and the text loads back.
     XMLWrapper deep;
+    ASSERT_TRUE(deep.LoadXML(nested(255)));
+    auto down = [&](int levels) {
+        deep.MoveToRoot();
+        for (int level = 2; level <= levels; ++level) deep.MoveToChild("a");
+    };
+    down(255);
     deep.AddElement("a");
-    for (int level = 2; level <= 256; ++level) {
-        deep.AddElement("a");
-        deep.MoveToChild("a");
-    }
+    down(256);
     const std::string before = deep.XML();
     expectError([&] { deep.AddElement("b"); }, errc::document_failure, "'b' would be nested deeper than 256 levels");
     expectError([&] { deep.AddChildElement("b"); }, errc::document_failure, "deeper than 256");
     EXPECT_EQ(deep.XML(), before);
     XMLWrapper back;
-    ASSERT_TRUE(back.LoadXML(deep.XML())) << back.LastLoadError();
-    EXPECT_EQ(back.CountElements("a"), 255);
-
+    ASSERT_TRUE(back.LoadXML(before)) << back.LastLoadError();
     // Size: a caller's text past the limit is refused before it is copied in.
     expectError([&] { deep.SetAttribute("big", std::string(kXmlDocumentMaxBytes, 'x')); }, errc::document_failure,
                 "larger than the 64 MiB");
@@ -145,26 +139,21 @@ TEST(XMLHostileText, BuildingStopsAtTheSameDepthAndSizeThatLoadingAccepts) {
     // Size: indentation counts. Elements at the deepest level fill the limit
     // with little text; the one past it is refused, the document still writes
     // and loads back, and the same elements given as text are refused too.
-    XMLWrapper wide;
-    ASSERT_TRUE(wide.LoadXML(nested(255)));
-    for (int level = 2; level <= 255; ++level) wide.MoveToChild("a");
+    down(255);
     int added = 0;
     try {
-        for (;; ++added) wide.AddElement("b");
+        for (;; ++added) deep.AddElement("b");
     } catch (const ComponentError& e) {
-        EXPECT_EQ(e.number(), errc::document_failure);
         EXPECT_NE(e.description().find("AddElement: the document would be larger than the 64 MiB"), std::string::npos)
             << e.description();
     }
     EXPECT_GT(added, 50'000);
-    const std::string text = wide.XML();
-    EXPECT_LE(text.size(), kXmlDocumentMaxBytes);
-    ASSERT_TRUE(back.LoadXML(text)) << back.LastLoadError();
+    EXPECT_LE(deep.XML().size(), kXmlDocumentMaxBytes);
+    ASSERT_TRUE(back.LoadXML(deep.XML())) << back.LastLoadError();
     std::string bs;
     for (int i = 0; i <= added; ++i) bs += "<b/>";
-    EXPECT_FALSE(back.LoadXML(nested(255, bs)));  // some 260 KB of text, too large once written
+    EXPECT_FALSE(back.LoadXML(nested(255, "<a/>" + bs)));  // some 260 KB of text, too large once written
     EXPECT_NE(back.LastLoadError().find("larger than the 64 MiB"), std::string::npos) << back.LastLoadError();
-    EXPECT_EQ(back.CountElements("b"), added);
 }
 
 TEST(XMLIndexedAccess, ReadingEveryChildInOrderTakesStepsInProportionToTheChildren) {
@@ -178,32 +167,27 @@ TEST(XMLIndexedAccess, ReadingEveryChildInOrderTakesStepsInProportionToTheChildr
         }
         x.MoveToRoot();
         const std::uint64_t before = detail::xmlIndexSteps();
-        for (std::int32_t i = 0; i < x.GetChildCount(); ++i) {
-            EXPECT_EQ(x.GetChildName(i), "Insulin");
-            if (x.GetChildValueAt(i) != std::to_string(i) || x.GetChildAttributeAt(i, "Txt") != "n" + std::to_string(i))
+        for (std::int32_t i = 0; i < x.GetChildCount(); ++i)
+            if (x.GetChildName(i) != "Insulin" || x.GetChildAttributeAt(i, "Txt") != "n" + std::to_string(i))
                 ADD_FAILURE() << "child " << i;
-        }
         for (std::int32_t i = x.GetChildCount() - 1; i >= 0; --i)
             if (x.GetChildValueAt(i) != std::to_string(i)) ADD_FAILURE() << "child " << i << " backwards";
         EXPECT_EQ(x.GetChildValueAt(children / 2), std::to_string(children / 2));  // a jump
         return detail::xmlIndexSteps() - before;
     };
     const std::uint64_t small = stepsToReadAll(4'000);
-    const std::uint64_t large = stepsToReadAll(64'000);
     EXPECT_LE(small, 4u * 4'000);
-    EXPECT_LE(large, 16 * small + 64'000);  // 16 times the children, 16 times the steps
+    EXPECT_LE(stepsToReadAll(64'000), 16 * small + 64'000);  // 16 times the children, 16 times the steps
 }
 
 TEST(XMLIndexedAccess, RememberedPlacesFollowChangesAndNavigation) {
     XMLWrapper x;
     ASSERT_TRUE(x.LoadXML("<R>t<A/><!-- c --><B><X/><Y/></B>u<C/></R>"));
     EXPECT_EQ(x.GetChildName(2), "C");
-    EXPECT_EQ(x.GetChildCount(), 3);
     x.AddElement("D");  // appended under R: the count and the last index follow
     EXPECT_EQ(x.GetChildCount(), 4);
     EXPECT_EQ(x.GetChildName(3), "D");
     x.MoveToChild("B");  // another parent: indexes count its children
-    EXPECT_EQ(x.GetChildCount(), 2);
     EXPECT_EQ(x.GetChildName(1), "Y");
     expectError([&] { x.GetChildName(2); }, errc::subscript_out_of_range, "outside the 2 children of 'B'");
     x.MoveToRoot();
@@ -262,19 +246,16 @@ TEST(XMLHostileText, RunningOutOfMemoryIsAComponentError) {
     // In a fresh process: memory freed by earlier tests would be reused
     // without growing the address space, and hide the shortage.
     if (!std::getenv("VARNEL_XML_FRESH_PROCESS")) {
-        const std::string self =
-            "VARNEL_XML_FRESH_PROCESS=1 '" + std::filesystem::read_symlink("/proc/self/exe").string() +
-            "' --gtest_brief=1 --gtest_filter=" +
-            std::string(::testing::UnitTest::GetInstance()->current_test_info()->test_suite_name()) + "." +
-            ::testing::UnitTest::GetInstance()->current_test_info()->name();
+        const std::string self = "VARNEL_XML_FRESH_PROCESS=1 '" +
+                                 std::filesystem::read_symlink("/proc/self/exe").string() +
+                                 "' --gtest_brief=1 --gtest_filter=XMLHostileText.RunningOutOfMemoryIsAComponentError";
         EXPECT_EQ(std::system(self.c_str()), 0);
         return;
     }
     XMLWrapper x;
-    const std::string text(4096, 'x');
     auto fill = [&](int elements) {
         x.AddElement("R");
-        for (int i = 0; i < elements; ++i) x.AddElement("E", text);
+        for (int i = 0; i < elements; ++i) x.AddElement("E", std::string(4096, 'x'));
     };
     // Building, writing, copying and loading with too little memory left.
     std::string big;
