@@ -24,25 +24,16 @@ TEST(MeterText, EveryByteDecodesToACharacterADocumentCanCarry) {
         // Everything else comes back as the very byte, the code page's five gaps included.
         EXPECT_EQ(EncodeMeterText(decoded(std::uint8_t(b))), std::string(1, char(b)));
     }
-    for (auto [byte, text] : {std::pair{0x80, "\xE2\x82\xAC"},
-                              {0x81, "\xC2\x81"},
-                              {0x9F, "\xC5\xB8"},
-                              {0xFF, "\xC3\xBF"}})
+    for (auto [byte, text] :
+         {std::pair{0x80, "\xE2\x82\xAC"}, {0x81, "\xC2\x81"}, {0x9F, "\xC5\xB8"}, {0xFF, "\xC3\xBF"}})
         EXPECT_EQ(decoded(std::uint8_t(byte)), text) << byte;
 }
 
 TEST(MeterText, TextThatIsNotUtf8OrNotInTheCodePageIsRefused) {
-    for (const char* text : {
-             "\xC3",              // cut short
-             "\x80",              // a continuation byte alone
-             "\xC0\xAF",          // overlong
-             "\xED\xA0\x80",      // a surrogate
-             "\xF4\x90\x80\x80",  // beyond U+10FFFF
-             "\xF0\x9F\x92\x89",  // an emoji
-             "\xC2\x80",          // U+0080: 0x80 is the euro sign
-             "\xEF\xBF\xBD",      // what an unreadable byte became
-             "\x01",
-         })
+    // Cut short, a lone continuation byte, overlong, a surrogate, beyond U+10FFFF, an emoji, U+0080 (0x80 is
+    // the euro sign), what an unreadable byte became, a control character.
+    for (const char* text : {"\xC3", "\x80", "\xC0\xAF", "\xED\xA0\x80", "\xF4\x90\x80\x80", "\xF0\x9F\x92\x89",
+                             "\xC2\x80", "\xEF\xBF\xBD", "\x01"})
         EXPECT_EQ(EncodeMeterText(text), std::nullopt) << text;
     EXPECT_EQ(EncodeMeterText(std::string("a\0b", 3)), std::nullopt);
     EXPECT_EQ(EncodeMeterText("\xE2\x82\xAC 5\t\xC5\x93"), "\x80 5\t\x9C");
