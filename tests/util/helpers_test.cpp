@@ -1,16 +1,24 @@
 #include <gtest/gtest.h>
 
 #include <cstdint>
-#include <limits>
 #include <optional>
 #include <string>
 #include <thread>
 #include <tuple>
 
+#include "util/codepage.h"
 #include "util/helpers.h"
-#include "varnel/unique_checker.h"
 
 using namespace varnel::detail;
+
+namespace {
+
+std::string decoded(int b) {
+    const auto byte = std::uint8_t(b);
+    return DecodeMeterText(std::span<const std::uint8_t>(&byte, 1));
+}
+
+}  // namespace
 
 TEST(ToNumber, CDecimalSyntaxWithBlanksAroundAndNothingElse) {
     for (auto [text, value] : {std::pair{"  12 ", 12.0}, {"\t-3", -3.0}, {".5", 0.5}, {"25E-1", 2.5}}) {
@@ -98,4 +106,29 @@ TEST(CaseFold, AsciiLettersOnly) {
                                {"\xC3\xA9", "\xC3\x89", false},
                                {"I", "\xC4\xB1", false}})
         EXPECT_EQ(EqualsNoCase(a, b), equal) << a << " / " << b;
+}
+
+TEST(MeterText, EveryByteDecodesToACharacterADocumentCanCarry) {
+    for (int b = 1; b < 256; ++b) {
+        // Control characters become U+FFFD; everything else comes back as the very byte, the code page's five gaps
+        // included.
+        if (b < 0x20 && b != '\t' && b != '\n' && b != '\r')
+            EXPECT_EQ(decoded(b), "\xEF\xBF\xBD") << b;
+        else
+            EXPECT_EQ(EncodeMeterText(decoded(b)), std::string(1, char(b))) << b;
+    }
+    for (auto [byte, text] :
+         {std::pair{0x80, "\xE2\x82\xAC"}, {0x81, "\xC2\x81"}, {0x9F, "\xC5\xB8"}, {0xFF, "\xC3\xBF"}})
+        EXPECT_EQ(decoded(byte), text) << byte;
+}
+
+TEST(MeterText, TextThatIsNotUtf8OrNotInTheCodePageIsRefused) {
+    // Cut short, a lone continuation byte, overlong, a surrogate, beyond U+10FFFF, an emoji, U+0080 (0x80 is
+    // the euro sign), what an unreadable byte became, a control character.
+    for (const char* text : {"\xC3", "\x80", "\xC0\xAF", "\xED\xA0\x80", "\xF4\x90\x80\x80", "\xF0\x9F\x92\x89",
+                             "\xC2\x80", "\xEF\xBF\xBD", "\x01"})
+        EXPECT_EQ(EncodeMeterText(text), std::nullopt) << text;
+    EXPECT_EQ(EncodeMeterText(std::string("a\0b", 3)), std::nullopt);
+    EXPECT_EQ(EncodeMeterText("\xE2\x82\xAC 5\t\xC5\x93"), "\x80 5\t\x9C");
+    EXPECT_EQ(EncodeMeterText(""), "");
 }
