@@ -14,11 +14,9 @@
 
 #include "contracts/transport.h"
 #include "platform/message_pump.h"
-#include "simulator.h"
 #include "support/expect_error.h"
 #include "varnel/clock.h"
 #include "varnel/component_error.h"
-#include "varnel/dll_wrapper.h"
 
 using namespace varnel;
 using namespace varnel::detail;
@@ -52,13 +50,8 @@ struct TransportYield : ::testing::Test {
     METER_REC rec{};
     std::vector<int> seen;
     TimerConnection noting = frmTimer().tmrStatus().onTick([this] { seen.push_back(rec.Percent_done); });
-    void SetUp() override {
-        setThreadClock(clock);
-        varnel::sim::reset();
-    }
+    void SetUp() override { setThreadClock(clock); }
     void TearDown() override {
-        vx_set_yield_hook(nullptr, nullptr);  // the simulator's
-        varnel::sim::reset();
         frmTimer().disableTimer();
         setThreadClock(nullptr);
     }

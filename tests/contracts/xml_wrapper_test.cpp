@@ -308,9 +308,7 @@ TEST(XmlAppend, RefusesWhatThePublicOperationsRefuse) {
     expectError([&] { append.setAttribute("1V", "1"); }, errc::document_failure, "'1V' is not a valid XML");
     expectError([&] { append.setAttribute("V", "a\x01"); }, errc::document_failure, "U+0001");
     append.setAttribute("V", std::string_view("ab\0cd", 5));  // a value ends at its first zero byte, as everywhere
-    doc.SelectElement("E");
-    doc.MoveToRoot();
-    EXPECT_EQ(doc.GetChildAttribute("E", "V"), "ab");
+    EXPECT_EQ(flat(doc), "<Status><E V=\"ab\" /></Status>");
 }
 
 TEST(XMLHostileText, LoadRefusesWithWhatAndWhereAndChangesNothing) {
