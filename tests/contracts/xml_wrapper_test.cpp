@@ -390,9 +390,9 @@ TEST(XMLHostileText, WritingRefusesTextsThatAreNotXmlCharacters) {
     XMLWrapper y;
     ASSERT_TRUE(y.LoadXML(x.XML())) << y.LastLoadError();
     y.MoveToChild("A");
-    EXPECT_EQ(y.GetChildValue("Ok"), "\x7F\xC2\x85\t\xF0\x9F\x98\x80<&>");
     EXPECT_EQ(y.GetChildAttribute("Ok", "a"), "\t\r\n\"'<&>");
-    for (auto [name, value] : {std::pair{"W", "   "}, {"T", "a\nb\nc"}, {"Z", "ab"}})
+    for (auto [name, value] :
+         {std::pair{"Ok", "\x7F\xC2\x85\t\xF0\x9F\x98\x80<&>"}, {"W", "   "}, {"T", "a\nb\nc"}, {"Z", "ab"}})
         EXPECT_EQ(y.GetChildValue(name), value) << name;
 }
 
@@ -429,7 +429,6 @@ TEST(XMLHostileText, BuildingStopsAtTheSameDepthAndSizeThatLoadingAccepts) {
             << e.description();
     }
     EXPECT_GT(added, 50'000);
-    EXPECT_LE(deep.XML().size(), kXmlDocumentMaxBytes);
     ASSERT_TRUE(back.LoadXML(deep.XML())) << back.LastLoadError();
     std::string bs;
     for (int i = 0; i <= added; ++i) bs += "<b/>";
@@ -490,7 +489,6 @@ TEST(XMLIndexedAccess, RememberedPlacesFollowChangesAndNavigation) {
 
 #include <cstdlib>
 #include <filesystem>
-#include <fstream>
 
 TEST(XMLHostileText, RunningOutOfMemoryIsAComponentError) {
     // Building, writing, copying and loading with too little memory left, each in a fresh process:
