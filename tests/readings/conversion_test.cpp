@@ -109,20 +109,20 @@ TEST_F(Conversion, DamagedCountsAreNeverNegativeNorDoubled) {
               std::tuple(1, 2, std::int16_t{ME_COM_ERROR}));
 }
 
-TEST_F(Conversion, MedicationOutsideTheNamesRaisesWithEarlierResultsKept) {
+// A medication outside the names, a test type beyond the table, more records than the buffer holds.
+TEST_F(Conversion, NothingIsReadPastATableOrTheBufferAndEarlierResultsAreKept) {
     add(VX_REC_GLUCOSE, 1, [](auto& r) { r.reading = 100; });
     add(VX_REC_ORAL_MEDICATION, 1, [](auto& r) { r.oralMedType = 3; });
     EXPECT_THROW(convertBinary(), ComponentError);
-    EXPECT_EQ(errPropagator().error().ErrorNo, errc::subscript_out_of_range);
-    EXPECT_EQ(errPropagator().error().ErrorTrace, "Fastmeterupload --> ");
-    EXPECT_EQ(results.Count(), 1);
-}
+    const IError& e = errPropagator().error();
+    EXPECT_EQ(std::tuple(e.ErrorNo, e.ErrorTrace, results.Count()),
+              std::tuple(errc::subscript_out_of_range, "Fastmeterupload --> ", 1));
 
-TEST_F(Conversion, RecordDatalogNeverReadsPastItsBuffer) {
     METER_DATALOG& log = fns.recordDatalog();
     std::fill(std::begin(log.DataLog), std::end(log.DataLog), entry(1, 0));
-    log.DataLog[3] = entry(1, 16);  // a test type beyond the table
+    log.DataLog[3] = entry(1, 16);
     log.recordCount = 5;
+    results = {};
     EXPECT_THROW(fns.NonFastmeterUpload(results), ComponentError);
     EXPECT_EQ(results.Count(), 3);
 
@@ -131,14 +131,12 @@ TEST_F(Conversion, RecordDatalogNeverReadsPastItsBuffer) {
     log.recordCount = 300;
     errPropagator().reset();
     EXPECT_THROW(fns.NonFastmeterUpload(results), ComponentError);
-    EXPECT_EQ(errPropagator().error().ErrorTrace, "NonFastmeterUpload --> ");
-    EXPECT_EQ(results.Count(), 255);
+    EXPECT_EQ(std::tuple(e.ErrorTrace, results.Count()), std::tuple("NonFastmeterUpload --> ", 255));
 
     results = {};
     log.recordCount = -4;
     EXPECT_TRUE(fns.NonFastmeterUpload(results));
-    EXPECT_EQ(results.Count(), 0);
-    EXPECT_EQ(fns.corruptedCount(), 0);
+    EXPECT_EQ(std::tuple(results.Count(), fns.corruptedCount()), std::tuple(0, 0));
 }
 
 TEST_F(Conversion, TwoDigitYearWindow) {
