@@ -8,21 +8,19 @@
 #include <cstdlib>
 #include <functional>
 #include <memory>
+#include <regex>
 #include <string>
 #include <thread>
 #include <vector>
 
-#include "component/wrapper_access.h"
-#include "support/sim_transport.h"
-#include "varnel/clock.h"
-#include "varnel/dll_wrapper.h"
+#include "support/client_session.h"
+#include "support/wrapper_fixture.h"
 #include "varnel/varnel.h"
 #include "varnel/vxsim.h"
-#include "varnel/xml_wrapper.h"
 
 namespace {
 
-using varnel::XMLWrapper;
+using namespace varnel::test;
 using Seen = std::vector<std::string>;
 using Session = std::function<Seen()>;
 
@@ -31,21 +29,9 @@ int sessions() {
     return n && std::atoi(n) > 0 ? std::atoi(n) : 10;
 }
 
-XMLWrapper doc(std::int32_t kind) {
-    XMLWrapper d;
-    d.InitDocument(kind);
-    return d;
-}
-
 // A document without the meter clock's reading, which runs on from session to session.
-std::string withoutClock(std::string xml) {
-    for (std::size_t at = 0; (at = xml.find("<Clock", at)) != std::string::npos;) {
-        const std::size_t end = xml.find("</Clock>", at);
-        if (end == std::string::npos) break;
-        xml.erase(at, end - at);
-        at += 1;
-    }
-    return xml;
+std::string withoutClock(const std::string& xml) {
+    return std::regex_replace(xml, std::regex(R"(<Clock[\s\S]*?</Clock>)"), "");
 }
 
 // A whole session through C++ (discover, settings, capabilities, readings, release),
@@ -54,19 +40,12 @@ Seen cppSession(varnel::DllWrapper& w) {
     varnel::setThreadClock(std::make_shared<varnel::ManualClock>(1000));
     Seen seen;
     METER_REC rec{};
-    XMLWrapper device = doc(varnel::doc_kind::device_info), conn = doc(varnel::doc_kind::connection_info);
-    conn.SelectElement("Ports");
-    conn.AddElement("COM");
-    conn.AddChildElement("PortsToSearch", "", "1");
-    XMLWrapper status = doc(varnel::doc_kind::status), settings, caps = doc(varnel::doc_kind::device_caps),
-               datalog = doc(varnel::doc_kind::datalog), filter = doc(varnel::doc_kind::filter);
-    bool check = false;
-    seen.push_back(std::to_string(w.discoverDevice(rec, device, conn, status)));
-    seen.push_back(std::to_string(w.getDeviceSettings(rec, device, settings, true, status, check)));
-    seen.push_back(std::to_string(w.getDeviceCaps(rec, device, caps, true, status, check)));
-    seen.push_back(std::to_string(w.getReadings(rec, device, datalog, filter, status, check)));
-    seen.push_back(std::to_string(w.closeMeter(rec)));
-    for (const XMLWrapper* d : {&device, &settings, &caps, &datalog, &status}) seen.push_back(withoutClock(d->XML()));
+    varnel::XMLWrapper device = newDoc(varnel::doc_kind::device_info), status = newDoc(varnel::doc_kind::status), out;
+    for (Call c : {Call::discover, Call::settings, Call::caps, Call::readings, Call::close}) {
+        seen.push_back(std::to_string(makeCall(w, c, rec, device, status, out)));
+        seen.push_back(withoutClock(out.IsEmpty() ? "" : out.XML()));
+    }
+    seen.push_back(status.XML());
     return seen;
 }
 
@@ -75,18 +54,16 @@ Seen cSession(varnel_component* c) {
     varnel::setThreadClock(std::make_shared<varnel::ManualClock>(1000));
     using Doc = std::unique_ptr<varnel_doc, decltype(&varnel_doc_free)>;
     auto make = [](std::int32_t kind) { return Doc(varnel_doc_new_kind(kind), &varnel_doc_free); };
-    Doc device = make(1), conn = Doc(varnel_doc_new(), &varnel_doc_free), settings = make(2), caps = make(4),
-        datalog = make(5), status = make(7);
-    varnel_doc_load(conn.get(),
-                    "<ConnectionInfo><Ports><COM><PortsToSearch>1</PortsToSearch></COM></Ports></ConnectionInfo>");
+    Doc device = make(1), conn = make(3), settings = make(2), caps = make(4), datalog = make(5), status = make(7);
+    varnel_doc_load(conn.get(), connectionDoc("1").XML().c_str());
     METER_REC rec{};
     int check = 0;
-    Seen seen;
-    seen.push_back(std::to_string(varnel_discover_device(c, &rec, device.get(), conn.get(), status.get())));
-    seen.push_back(std::to_string(varnel_get_device_settings(c, &rec, device.get(), settings.get(), 1, status.get(), &check)));
-    seen.push_back(std::to_string(varnel_get_device_caps(c, &rec, device.get(), caps.get(), 1, status.get(), &check)));
-    seen.push_back(std::to_string(varnel_get_readings(c, &rec, device.get(), datalog.get(), nullptr, status.get(), &check)));
-    seen.push_back(std::to_string(varnel_close_meter(c, &rec)));
+    Seen seen{
+        std::to_string(varnel_discover_device(c, &rec, device.get(), conn.get(), status.get())),
+        std::to_string(varnel_get_device_settings(c, &rec, device.get(), settings.get(), 1, status.get(), &check)),
+        std::to_string(varnel_get_device_caps(c, &rec, device.get(), caps.get(), 1, status.get(), &check)),
+        std::to_string(varnel_get_readings(c, &rec, device.get(), datalog.get(), nullptr, status.get(), &check)),
+        std::to_string(varnel_close_meter(c, &rec))};
     for (const Doc* d : {&device, &settings, &caps, &datalog, &status}) {
         char* text = varnel_doc_xml(d->get());
         seen.push_back(withoutClock(text ? text : ""));
@@ -127,22 +104,18 @@ struct Threads : ::testing::Test {
     }
 };
 
-// Two meter types on two simulators: C++ over the statically linked one, C over the library.
-TEST_F(Threads, TwoMeterTypesOnTwoThreadsSeeWhatEachSeesAlone) {
+// Two meter types on two simulators (C++ over the statically linked one, C over the library),
+// then both components on the one simulated meter of the library.
+TEST_F(Threads, TwoComponentsOnTwoThreadsSeeWhatEachSeesAlone) {
     ::vxsim_select_type(3);
     select(7);
-    varnel::DllWrapper cpp = varnel::detail::wrapperOver(varnel::test::simTransport());
     varnel_component* c = varnel_new(VARNEL_TEST_TRANSPORT_PATH);
-    runTogether({[&] { return cppSession(cpp); }, [&] { return cSession(c); }});
-    varnel_delete(c);
-}
-
-// Both components on the one simulated meter of the library, one through C++, one through C.
-TEST_F(Threads, TwoComponentsOnOneSimulatedMeterSeeWhatEachSeesAlone) {
-    select(5);
-    varnel::DllWrapper cpp{std::string(VARNEL_TEST_TRANSPORT_PATH)};
-    varnel_component* c = varnel_new(VARNEL_TEST_TRANSPORT_PATH);
-    runTogether({[&] { return cppSession(cpp); }, [&] { return cSession(c); }});
+    for (bool oneMeter : {false, true}) {
+        if (oneMeter) select(5);
+        varnel::DllWrapper cpp = oneMeter ? varnel::DllWrapper{std::string(VARNEL_TEST_TRANSPORT_PATH)}
+                                          : varnel::detail::wrapperOver(simTransport());
+        runTogether({[&] { return cppSession(cpp); }, [&] { return cSession(c); }});
+    }
     varnel_delete(c);
 }
 

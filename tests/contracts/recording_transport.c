@@ -38,19 +38,13 @@ static void long_operation(METER_REC* rec) {
     if (yield_hook) yield_hook(yield_context);
 }
 
-#define REC_ARG(kind, type, name) REC_ARG_##kind(name)
-#define REC_ARG_REC(name) rec_seen = name;
-#define REC_ARG_VALUE(name) (void)name;
-#define REC_ARG_IN(name) (void)name;
-#define REC_ARG_INOUT(name) (void)name;
-#define REC_ARG_OUT(name) (void)name;
-#define REC_ARG_IN_LIST(name) (void)name;
-#define REC_ARG_OUT_LIST(name) (void)name;
+/* Notes the meter record among a function's arguments, and uses every argument. */
+#define NOTE_REC(kind, type, name) rec_seen = _Generic((name), METER_REC * : (name), default : rec_seen);
 
 #define DEFINE(ret, name, ...)                                                                  \
     EXPORT ret name(VX_C_PARAMS(__VA_ARGS__)) {                                                 \
         METER_REC* rec_seen = 0;                                                                \
-        VX_EACH(REC_ARG, __VA_ARGS__)                                                           \
+        VX_EACH(NOTE_REC, __VA_ARGS__)                                                          \
         if (rec_seen && strcmp(#name, "vb_Clear_Meter_Datalog") == 0) long_operation(rec_seen); \
         return code_of(#name);                                                                  \
     }

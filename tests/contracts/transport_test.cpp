@@ -14,39 +14,27 @@
 
 #include "contracts/transport.h"
 #include "platform/message_pump.h"
-#include "simulator.h"
+#include "support/expect_error.h"
 #include "varnel/clock.h"
 #include "varnel/component_error.h"
-#include "varnel/dll_wrapper.h"
 
 using namespace varnel;
 using namespace varnel::detail;
 
 namespace {
 
-// The recording library's own view of the caller's clock; the same loaded copy the transport uses.
-struct Recorder {
-    void* handle = dlopen(RECORDING_TRANSPORT_FULL, RTLD_NOW);
-    ~Recorder() { dlclose(handle); }
-};
-
 // Expects `call` to raise transport_unavailable with a description naming each of `mentions`.
 void expectUnavailable(const std::function<void()>& call, std::initializer_list<std::string> mentions) {
-    try {
-        call();
-        ADD_FAILURE() << "no error";
-    } catch (const ComponentError& e) {
-        EXPECT_EQ(e.number(), errc::transport_unavailable);
-        for (const std::string& m : mentions) EXPECT_NE(e.description().find(m), std::string::npos) << e.description();
-    }
+    for (const std::string& m : mentions) test::expectError(call, errc::transport_unavailable, m);
 }
 
-TEST(TransportLoading, WhatIsMissingIsNamedOnFirstUse) {
-    const std::string nowhere = "/nonexistent/libvantrix_nowhere.so";
-    auto absent = loadTransport(nowhere);  // nothing is opened yet
+TEST(TransportLoading, WhatIsMissingIsNamedOnFirstUseAndCandidatesAreTriedInOrder) {
     METER_REC rec{};
-    for (int attempt = 0; attempt < 2; ++attempt)  // a failed load is tried again
-        expectUnavailable([&] { absent->vb_Chk4Meter(rec); }, {nowhere, "No such file"});
+    const std::string first = "/nonexistent/a/libvantrix_nowhere.so", second = "/nonexistent/b/libvantrix_nowhere.so";
+    auto absent = loadTransport(first);  // nothing is opened yet; a failed load is tried again on every call
+    expectUnavailable([&] { absent->vb_Chk4Meter(rec); }, {first, "No such file"});
+    expectUnavailable([&] { loadTransport({first, second})->vb_Chk4Meter(rec); }, {first, second});
+    EXPECT_EQ(loadTransport({first, RECORDING_TRANSPORT_FULL})->vb_Clear_Meter_Datalog(rec), -108);
     auto partial = loadTransport(RECORDING_TRANSPORT_NO_CHK4METER);
     expectUnavailable([&] { partial->close_meter(rec); }, {RECORDING_TRANSPORT_NO_CHK4METER, "\"vb_Chk4Meter\""});
     TransportFunctions table{};
@@ -56,32 +44,20 @@ TEST(TransportLoading, WhatIsMissingIsNamedOnFirstUse) {
     EXPECT_EQ(hookless->vb_Clear_Meter_Datalog(rec), -108);
 }
 
-TEST(TransportLoading, CandidatesAreTriedInOrderAndAllNamedWhenNoneLoads) {
-    METER_REC rec{};
-    const std::string first = "/nonexistent/a/libvantrix_nowhere.so", second = "/nonexistent/b/libvantrix_nowhere.so";
-    expectUnavailable([&] { loadTransport({first, second})->vb_Chk4Meter(rec); }, {first, second});
-    EXPECT_EQ(loadTransport({first, RECORDING_TRANSPORT_FULL})->vb_Clear_Meter_Datalog(rec), -108);
-}
-
 // A virtual clock, and Percent_done as each tick of the progress timer saw it.
 struct TransportYield : ::testing::Test {
     std::shared_ptr<ManualClock> clock = std::make_shared<ManualClock>();
     METER_REC rec{};
     std::vector<int> seen;
     TimerConnection noting = frmTimer().tmrStatus().onTick([this] { seen.push_back(rec.Percent_done); });
-    void SetUp() override {
-        setThreadClock(clock);
-        varnel::sim::reset();
-    }
+    void SetUp() override { setThreadClock(clock); }
     void TearDown() override {
-        vx_set_yield_hook(nullptr, nullptr);  // the simulator's
-        varnel::sim::reset();
         frmTimer().disableTimer();
         setThreadClock(nullptr);
     }
 };
 
-TEST_F(TransportYield, DueTicksRunWhileTheLibraryYieldsAndTheirErrorsFollowTheCall) {
+TEST_F(TransportYield, DueTicksRunWhileTheLibraryYieldsItsErrorsFollowTheCallAndItUsesTheCallersClock) {
     auto t = loadTransport(RECORDING_TRANSPORT_FULL);
     frmTimer().enableTimer();
     clock->advance(500);
@@ -96,22 +72,19 @@ TEST_F(TransportYield, DueTicksRunWhileTheLibraryYieldsAndTheirErrorsFollowTheCa
     failing.disconnect();
     clock->advance(500);
     EXPECT_EQ(t->vb_Clear_Meter_Datalog(rec), -108);  // the error was reported once
-}
 
-// A library that exports a clock hook runs on the caller's thread clock once it is first used.
-TEST_F(TransportYield, ALoadedLibraryTakesTheCallersClock) {
-    auto t = loadTransport(RECORDING_TRANSPORT_FULL);
-    Recorder recorder;
-    auto now = reinterpret_cast<std::uint32_t (*)()>(dlsym(recorder.handle, "library_now"));
-    auto sleep = reinterpret_cast<void (*)(std::uint32_t)>(dlsym(recorder.handle, "library_sleep"));
-    clock->advance(4321);
-    t->vb_Tickle_Meter(rec);
-    EXPECT_EQ(now(), 4321u);
+    // A library that exports a clock hook runs on the caller's thread clock once it is first used:
+    // the recording library's own view of the caller's clock, in the same loaded copy the transport uses.
+    void* handle = dlopen(RECORDING_TRANSPORT_FULL, RTLD_NOW);
+    auto now = reinterpret_cast<std::uint32_t (*)()>(dlsym(handle, "library_now"));
+    auto sleep = reinterpret_cast<void (*)(std::uint32_t)>(dlsym(handle, "library_sleep"));
+    EXPECT_EQ(now(), 1500u);
     sleep(250);  // the library's wait is the caller's clock moving
-    EXPECT_EQ(clock->tickCount(), 4571u);
+    EXPECT_EQ(clock->tickCount(), 1750u);
     auto later = std::make_shared<ManualClock>(90000);
     setThreadClock(later);  // a clock set later is followed too
     EXPECT_EQ(now(), 90000u);
+    dlclose(handle);
 }
 
 }  // namespace

@@ -42,10 +42,8 @@ TEST_F(WaitTimerTest, SleepRunsItsFullTimeWithTicksDeliveredOnTheWay) {
     EXPECT_EQ(clock->tickCount(), 1100u);
     recordTicks();  // due at 1500, 1900
     clock->advance(350);
-    wait.SleepForSeconds(0.1);
-    EXPECT_EQ(clock->tickCount(), 1550u);
     wait.SleepForSeconds(1.0);  // a tick only restarts the wait with the time remaining
-    EXPECT_EQ(clock->tickCount(), 2550u);
+    EXPECT_EQ(clock->tickCount(), 2450u);
     EXPECT_EQ(ticks, (std::vector<std::uint32_t>{1500, 1900, 2300}));
 }
 

@@ -59,7 +59,9 @@ TEST_F(Conversion, MissingValuesSnacksAndRanges) {
     add(VX_REC_CALORIES_PROTEIN, 1, [](auto& r) { r.mealSegment = 3, r.calories = -1, r.protein = 4; });
     add(VX_REC_WEIGHT_HEIGHT, 1, [](auto& r) { r.weight = -1.0, r.height = 170.5; });
     add(VX_REC_CHOLESTEROL_TOTAL_TRIG, 1, [](auto& r) { r.cholesterolTotal = 1001, r.cholesterolTriglyceride = 3000; });
+    fns.binaryDatalog().corruptedCount = -3;  // from the transport: none damaged
     ASSERT_TRUE(convertBinary());
+    EXPECT_EQ(fns.corruptedCount(), 0);
     EXPECT_EQ(column(), (Types{50, 55, 57, 58, 101, 140, 150}));
     EXPECT_EQ(std::tuple(at<Food>(1).MealSlot(), at<Food>(2).MealSlot()), std::tuple(3, 0));
     EXPECT_EQ(at<BodyDimensions>(5).Value(), 170.5);
@@ -87,21 +89,14 @@ TEST_F(Conversion, MealsAndCholesterolOfOneDateShareAGroup) {
     EXPECT_EQ(fns.unmatchedCount(), 1);
 }
 
-// A negative damaged count from the transport is none; a record the meter marks invalid is not
-// dated at all, so it is never counted twice (losing one record alone: the readings request's test).
-TEST_F(Conversion, DamagedCountsAreNeverNegativeNorDoubled) {
-    add(VX_REC_GLUCOSE, 1, [](auto& r) { r.reading = 100; });
-    sim::encodeBinaryDatalog(records, fns.binaryDatalog());
-    fns.binaryDatalog().corruptedCount = -3;
-    EXPECT_TRUE(fns.Fastmeterupload(results, oralMeds, insulins));
-    EXPECT_EQ(fns.corruptedCount(), 0);
-
+// A record the meter marks invalid is not dated at all, so it is never counted twice (losing one
+// record alone: the readings request's test).
+TEST_F(Conversion, DamagedRecordsAreNeverCountedTwice) {
     METER_DATALOG& log = fns.recordDatalog();
     for (int i = 0; i < 3; ++i) log.DataLog[i] = entry(1, 0), log.DataLog[i].D_Time = sim::secondsOf(2005, 6, i + 1);
     log.DataLog[0].Valid = 1;
     log.recordCount = 3;
     log.ValidRecordCount = 2;
-    results = {};
     sim::injectFault("convert_from_seconds", 1, ME_COM_ERROR, true);
     EXPECT_FALSE(fns.NonFastmeterUpload(results));
     sim::clearFaults();
@@ -109,20 +104,20 @@ TEST_F(Conversion, DamagedCountsAreNeverNegativeNorDoubled) {
               std::tuple(1, 2, std::int16_t{ME_COM_ERROR}));
 }
 
-TEST_F(Conversion, MedicationOutsideTheNamesRaisesWithEarlierResultsKept) {
+// A medication outside the names, a test type beyond the table, more records than the buffer holds.
+TEST_F(Conversion, NothingIsReadPastATableOrTheBufferAndEarlierResultsAreKept) {
     add(VX_REC_GLUCOSE, 1, [](auto& r) { r.reading = 100; });
     add(VX_REC_ORAL_MEDICATION, 1, [](auto& r) { r.oralMedType = 3; });
     EXPECT_THROW(convertBinary(), ComponentError);
-    EXPECT_EQ(errPropagator().error().ErrorNo, errc::subscript_out_of_range);
-    EXPECT_EQ(errPropagator().error().ErrorTrace, "Fastmeterupload --> ");
-    EXPECT_EQ(results.Count(), 1);
-}
+    const IError& e = errPropagator().error();
+    EXPECT_EQ(std::tuple(e.ErrorNo, e.ErrorTrace, results.Count()),
+              std::tuple(errc::subscript_out_of_range, "Fastmeterupload --> ", 1));
 
-TEST_F(Conversion, RecordDatalogNeverReadsPastItsBuffer) {
     METER_DATALOG& log = fns.recordDatalog();
     std::fill(std::begin(log.DataLog), std::end(log.DataLog), entry(1, 0));
-    log.DataLog[3] = entry(1, 16);  // a test type beyond the table
+    log.DataLog[3] = entry(1, 16);
     log.recordCount = 5;
+    results = {};
     EXPECT_THROW(fns.NonFastmeterUpload(results), ComponentError);
     EXPECT_EQ(results.Count(), 3);
 
@@ -131,14 +126,12 @@ TEST_F(Conversion, RecordDatalogNeverReadsPastItsBuffer) {
     log.recordCount = 300;
     errPropagator().reset();
     EXPECT_THROW(fns.NonFastmeterUpload(results), ComponentError);
-    EXPECT_EQ(errPropagator().error().ErrorTrace, "NonFastmeterUpload --> ");
-    EXPECT_EQ(results.Count(), 255);
+    EXPECT_EQ(std::tuple(e.ErrorTrace, results.Count()), std::tuple("NonFastmeterUpload --> ", 255));
 
     results = {};
     log.recordCount = -4;
     EXPECT_TRUE(fns.NonFastmeterUpload(results));
-    EXPECT_EQ(results.Count(), 0);
-    EXPECT_EQ(fns.corruptedCount(), 0);
+    EXPECT_EQ(std::tuple(results.Count(), fns.corruptedCount()), std::tuple(0, 0));
 }
 
 TEST_F(Conversion, TwoDigitYearWindow) {
