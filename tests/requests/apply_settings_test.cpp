@@ -12,11 +12,10 @@ struct ApplySettings : WrapperTest {
     static XMLWrapper config(const std::string& settings) {
         return settingsDoc(sim::meter().serial, std::to_string(sim::meter().type), settings);
     }
-    std::int32_t apply(XMLWrapper cfg, XMLWrapper info) {
+    std::int32_t apply(XMLWrapper cfg) {
         fresh();
-        return wrapper->setDeviceSettings(rec, info, cfg, status);
+        return wrapper->setDeviceSettings(rec, device, cfg, status);
     }
-    std::int32_t apply(XMLWrapper cfg) { return apply(std::move(cfg), device); }
     std::int32_t apply(const std::string& settings) { return apply(config(settings)); }
     static std::int16_t option(MeterOptions_Enum o) { return sim::meter().options[o].value; }
     static std::vector<int> options(std::initializer_list<MeterOptions_Enum> list) {
@@ -71,27 +70,22 @@ TEST_F(ApplySettings, ChecksStopTheRequestBeforeAnyWrite) {
     const std::string beep = "<Beep>0</Beep>";
     const std::string bad = "-17/-19/Bad parameter passed to the function ; ";
     const std::string diff = "-8/-8/Different device detected ; ";
-    struct Case {
-        XMLWrapper cfg, info;
-        std::string expected;
-    };
-    Case cases[] = {
-        {settingsDoc(sn, "7", beep, "Other"), device, "-17/-33/Invalid XML ;"},
-        {settingsDoc(sn, "7", "</Settings><DeviceInfo/><Settings>"), device,
-         "-17/-33/Invalid XML ;DeviceInfo missing in Device settings"},
-        {settingsDoc(sn, "9", beep), device, bad + "Device Type from Device Info XML is invalid"},
-        {settingsDoc("", "7", beep), device, bad + "Device SN from Device settings XML is invalid"},
-        {settingsDoc("X1", "7", beep), device,
-         diff + "Device SN from Device settings XML - X1 Device SN from device - " + sn + " do not match"},
-        {settingsDoc(sn, "5", beep), device,
-         diff + "Device Type from Device settings XML - 5 Device Type from device - 7 do not match"},
-        {config(beep + "</Settings><Settings>"), device, "-17/-33/Invalid XML ;Settings missing in Device settings"},
-        {config(""), device, "-17/-33/Invalid XML"},
-    };
-    for (Case& c : cases) {
-        SCOPED_TRACE(c.expected);
+    for (auto [cfg, expected] : {
+             std::pair{settingsDoc(sn, "7", beep, "Other"), std::string("-17/-33/Invalid XML ;")},
+             {settingsDoc(sn, "7", "</Settings><DeviceInfo/><Settings>"),
+              "-17/-33/Invalid XML ;DeviceInfo missing in Device settings"},
+             {settingsDoc(sn, "9", beep), bad + "Device Type from Device Info XML is invalid"},
+             {settingsDoc("", "7", beep), bad + "Device SN from Device settings XML is invalid"},
+             {settingsDoc("X1", "7", beep),
+              diff + "Device SN from Device settings XML - X1 Device SN from device - " + sn + " do not match"},
+             {settingsDoc(sn, "5", beep),
+              diff + "Device Type from Device settings XML - 5 Device Type from device - 7 do not match"},
+             {config(beep + "</Settings><Settings>"), "-17/-33/Invalid XML ;Settings missing in Device settings"},
+             {config(""), "-17/-33/Invalid XML"},
+         }) {
+        SCOPED_TRACE(expected);
         const int before = sim::callCount("vb_Set_Meter_Option");
-        expectExit(apply(c.cfg, c.info), ME_FAIL, c.expected, false);
+        expectExit(apply(cfg), ME_FAIL, expected, false);
         EXPECT_EQ(sim::callCount("vb_Set_Meter_Option"), before);
     }
 }
