@@ -18,11 +18,6 @@ struct ApplySettings : WrapperTest {
     }
     std::int32_t apply(const std::string& settings) { return apply(config(settings)); }
     static std::int16_t option(MeterOptions_Enum o) { return sim::meter().options[o].value; }
-    static std::vector<int> options(std::initializer_list<MeterOptions_Enum> list) {
-        std::vector<int> values;
-        for (MeterOptions_Enum o : list) values.push_back(option(o));
-        return values;
-    }
     static std::string clockVal(const std::string& d, const std::string& mm, const std::string& y, const std::string& h,
                                 const std::string& m, const std::string& s) {
         return "<Clock><Val D=\"" + d + "\" MM=\"" + mm + "\" Y=\"" + y + "\" h=\"" + h + "\" m=\"" + m + "\" s=\"" +
@@ -32,7 +27,9 @@ struct ApplySettings : WrapperTest {
 
 TEST_F(ApplySettings, EachElementIsWrittenOrRefusedAndEveryRefusalIsGatheredInOrder) {
     discover(eCVTolvoMeter);
-    const std::vector<int> unchanged = options({eDateFormat, eDaylightSavings});
+    sim::MeterProfile expected = sim::meter();  // only what is valid changes
+    for (auto [o, value] : {std::pair{eStripCalCode, 2}, {eBeepStatus, 0}, {eLanguage, 3}, {eDisplayClock, 1}})
+        expected.options[o].value = static_cast<std::int16_t>(value);
     ASSERT_EQ(apply("<CC> 2 </CC><Beep>1</Beep><Decimal>  </Decimal><DateFormat>abc</DateFormat>"
                     "<Language Val=\"3\"/><Baud>0</Baud><CommMode>9</CommMode><ShowClock>0</ShowClock>"
                     "<DayLight>abc</DayLight>"),
@@ -42,8 +39,7 @@ TEST_F(ApplySettings, EachElementIsWrittenOrRefusedAndEveryRefusalIsGatheredInOr
               " Invalid DateMode value ;Operation failed;"
               " Invalid CommMode value ;Bad parameter passed to the function;"
               " BaudRate value is read only ; Invalid Daylight value ;Operation failed;");
-    EXPECT_EQ(options({eStripCalCode, eBeepStatus, eLanguage, eDisplayClock}), (std::vector<int>{2, 0, 3, 1}));
-    EXPECT_EQ(options({eDateFormat, eDaylightSavings}), unchanged);
+    EXPECT_TRUE(sim::meter() == expected);
     EXPECT_EQ(progress, (std::vector<int>{11, 22, 33, 44, 55, 66, 77, 88, 99}));
 
     discover(eCVTarnConsumerMeter);
@@ -90,13 +86,16 @@ TEST_F(ApplySettings, ChecksStopTheRequestBeforeAnyWrite) {
     }
 }
 
-TEST_F(ApplySettings, RefusedValuesLeaveTheMeterAsItWas) {
+// Values within the type's ranges are written and nothing else changes; a refused one leaves the meter as it was.
+TEST_F(ApplySettings, ValuesAreWrittenWithinTheMeterTypesRangesOnly) {
     const std::string clock = "-17/-17/Operation failed;Invalid DeviceClock value ; ";
     const std::string year = "-17/-17/Operation failed;Invalid DeviceClock year value ; ";
     const std::string devInit = "-17/-17/Operation failed;Invalid DevInit value ; ";
+    using Change = void (*)(sim::MeterProfile&);
     struct Case {
         int type;
         std::string settings, report;
+        Change change = nullptr;
         const char* fault = nullptr;  // fails the next call of this transport function
     } cases[] = {
         {eCVTarnConsumerMeter, "<Beep>2</Beep>",
@@ -104,43 +103,33 @@ TEST_F(ApplySettings, RefusedValuesLeaveTheMeterAsItWas) {
         // Type 7 has no language to set, and names its averaging EvtAvgDurn with other values.
         {eMorvex, "<Language Val=\"6\"/><EvtAvg>2</EvtAvg>",
          "-17/-17/Operation failed; Invalid Language value;  Invalid EventAveraging value ;Operation failed;"},
+        {eMorvex, clockVal("31", "12", "2020", "23", "59", "59") + "<DevInit> 0 </DevInit><EvtAvgDurn>3</EvtAvgDurn>",
+         kReportOk, [](sim::MeterProfile& m) {
+             m.clock = sim::secondsOf(2020, 12, 31, 23, 59, 59), m.initializedFlag = 0;
+             m.options[eEvevtAveraging].value = 3;
+         }},
+        {eCVPellis, "<Language Val=\"6\"/><EvtAvg>0</EvtAvg>", kReportOk,
+         [](sim::MeterProfile& m) { m.options[eLanguage].value = 6, m.options[eEvevtAveraging].value = 0; }},
+        // Type 5 keeps years to 2026; blanks around the parts are ignored.
+        {eCVTolvoMeter, clockVal(" 1", "01", "2021 ", "0", "0", ""), kReportOk,
+         [](sim::MeterProfile& m) { m.clock = sim::secondsOf(2021, 1, 1); }},
         {eMorvex, clockVal("6", "5", "2010", "24", "0", "0"), clock},
         {eMorvex, clockVal("30", "02", "2010", "7", "0", ""), clock},
         {eMorvex, clockVal("6", "5", "2021", "7", "0", ""), year},
         {eMorvex, clockVal("31", "12", "1999", "23", "59", "59"), year},
         {eMorvex, "<DevInit>2</DevInit>", devInit},
-        {eMorvex, "<DevInit>1</DevInit>", devInit + "Timeout error;", "SetInitializedFlag"},
+        {eMorvex, "<DevInit>1</DevInit>", devInit + "Timeout error;", nullptr, "SetInitializedFlag"},
     };
     for (const Case& c : cases) {
         SCOPED_TRACE(c.settings);
         discover(c.type);
         if (c.fault) sim::injectFault(c.fault, 1, ME_TIME_OUT, false);
-        const sim::MeterProfile before = sim::meter();
+        sim::MeterProfile expected = sim::meter();
+        if (c.change) c.change(expected);
         ASSERT_EQ(apply(c.settings), ME_SUCCESS);
         EXPECT_EQ(report(), c.report);
-        EXPECT_TRUE(sim::meter() == before);
+        EXPECT_TRUE(sim::meter() == expected);
     }
-}
-
-TEST_F(ApplySettings, ValuesWithinTheMeterTypesRangesAreWritten) {
-    discover(eMorvex);
-    ASSERT_EQ(apply(clockVal("31", "12", "2020", "23", "59", "59") + "<DevInit> 0 </DevInit>"
-                                                                     "<EvtAvgDurn>3</EvtAvgDurn>"),
-              ME_SUCCESS);
-    EXPECT_EQ(report(), kReportOk);
-    EXPECT_EQ(sim::meter().clock, sim::secondsOf(2020, 12, 31, 23, 59, 59));
-    EXPECT_EQ(sim::meter().initializedFlag, 0);
-    EXPECT_EQ(option(eEvevtAveraging), 3);
-
-    discover(eCVPellis);
-    ASSERT_EQ(apply("<Language Val=\"6\"/><EvtAvg>0</EvtAvg>"), ME_SUCCESS);
-    EXPECT_EQ(report(), kReportOk);
-    EXPECT_EQ(options({eLanguage, eEvevtAveraging}), (std::vector<int>{6, 0}));
-
-    discover(eCVTolvoMeter);  // type 5 keeps years to 2026; blanks around the parts are ignored
-    ASSERT_EQ(apply(clockVal(" 1", "01", "2021 ", "0", "0", "")), ME_SUCCESS);
-    EXPECT_EQ(report(), kReportOk);
-    EXPECT_EQ(sim::meter().clock, sim::secondsOf(2021, 1, 1));
 }
 
 TEST_F(ApplySettings, MedicationFavouritesMustNameFixedOrNewlyNamedEntries) {

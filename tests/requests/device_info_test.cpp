@@ -31,9 +31,7 @@ TEST_P(DeviceInfo, RefusedBeforeAnyMeterWorkAndAcceptedAsTheMeterSaysIt) {
     const std::string bad = "-17/-19/Bad parameter passed to the function ; ";
     const std::string other = "-8/-8/Different device detected ; Device ";
     // Only the settings requests name the port's own major code.
-    const std::string port = GetParam() == Call::settings      ? "-3/-19/"
-                             : GetParam() == Call::setSettings ? "-3/-19/"
-                                                               : "-17/-19/";
+    const std::string port = GetParam() == Call::settings || GetParam() == Call::setSettings ? "-3/-19/" : "-17/-19/";
     const std::string portText = GetParam() == Call::setSettings ? "XML" : "XML file";
     struct Case {
         std::string port, sn, type, report;
