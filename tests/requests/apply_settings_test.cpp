@@ -104,7 +104,8 @@ TEST_F(ApplySettings, ValuesAreWrittenWithinTheMeterTypesRangesOnly) {
         {eMorvex, "<Language Val=\"6\"/><EvtAvg>2</EvtAvg>",
          "-17/-17/Operation failed; Invalid Language value;  Invalid EventAveraging value ;Operation failed;"},
         {eMorvex, clockVal("31", "12", "2020", "23", "59", "59") + "<DevInit> 0 </DevInit><EvtAvgDurn>3</EvtAvgDurn>",
-         kReportOk, [](sim::MeterProfile& m) {
+         kReportOk,
+         [](sim::MeterProfile& m) {
              m.clock = sim::secondsOf(2020, 12, 31, 23, 59, 59), m.initializedFlag = 0;
              m.options[eEvevtAveraging].value = 3;
          }},

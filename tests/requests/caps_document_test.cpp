@@ -118,7 +118,8 @@ TEST_F(Caps, EveryExit) {
              std::pair{"<DeviceSettings><Settings><Clock/></Settings><Records/></DeviceSettings>", xml},
              {"<DeviceCaps><Records><Settings/></Records><Settings><Clock/></Settings></DeviceCaps>",
               xml + "Settings node missing in Device capabilities"},
-             {"<DeviceCaps><Settings><Clock/></Settings></DeviceCaps>", xml + "Records node missing in Device capabilities"},
+             {"<DeviceCaps><Settings><Clock/></Settings></DeviceCaps>",
+              xml + "Records node missing in Device capabilities"},
              {"<DeviceCaps><Settings><Decimal/></Settings><Records><Strip/></Records></DeviceCaps>",
               "-17/-33/Operation failed; Invalid XML;Decimal is not supported;Strip is not supported;"},
          }) {

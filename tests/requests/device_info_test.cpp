@@ -17,8 +17,8 @@ struct DeviceInfo : WrapperTest, ::testing::WithParamInterface<Call> {
     // Runs the request with this device information on the discovered type-7 meter.
     std::int32_t run(const std::string& port, const std::string& sn, const std::string& type) {
         XMLWrapper info = deviceDoc(port, sn, type);
-        XMLWrapper out = GetParam() == Call::setSettings ? settingsDoc(sim::meter().serial, "7", "<Beep>0</Beep>")
-                                                         : XMLWrapper();
+        XMLWrapper out =
+            GetParam() == Call::setSettings ? settingsDoc(sim::meter().serial, "7", "<Beep>0</Beep>") : XMLWrapper();
         fresh();
         return makeCall(*wrapper, GetParam(), rec, info, status, out);
     }
@@ -37,8 +37,8 @@ TEST_P(DeviceInfo, RefusedBeforeAnyMeterWorkAndAcceptedAsTheMeterSaysIt) {
         std::string port, sn, type, report;
     };
     for (const Case& c : {
-             Case{"-1", sn, "7", port + "Bad parameter passed to the function ; Port number from " + portText +
-                                     " is invalid"},
+             Case{"-1", sn, "7",
+                  port + "Bad parameter passed to the function ; Port number from " + portText + " is invalid"},
              Case{"1", "", "7", bad + "Device SN from Device Info XML is invalid"},
              Case{"1", sn, "9", bad + "Device Type from Device Info XML is invalid"},
              Case{"1", sn, "0", bad + "Device Type from Device Info XML is invalid"},

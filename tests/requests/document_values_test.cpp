@@ -10,8 +10,13 @@ namespace {
 
 TEST(DocumentValues, RealNumbersAndDatesBeforeDayZero) {
     const std::pair<double, const char*> numbers[] = {
-        {123.0, "123"}, {-5.0, "-5"}, {0.5, "0.5"}, {-0.0, "0"}, {123456789012345.0, "123456789012345"},
-        {1e15, "1000000000000000"}, {1.0 / 3, "0.333333333333333"},
+        {123.0, "123"},
+        {-5.0, "-5"},
+        {0.5, "0.5"},
+        {-0.0, "0"},
+        {123456789012345.0, "123456789012345"},
+        {1e15, "1000000000000000"},
+        {1.0 / 3, "0.333333333333333"},
     };
     for (auto [value, text] : numbers) EXPECT_EQ(NumberText(value), text) << value;
 

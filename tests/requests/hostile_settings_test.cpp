@@ -45,8 +45,15 @@ std::string with(std::string text, const std::string& value) {
 
 TEST_F(HostileSettings, NonNumbersAreRefusedByEveryReaderAndNeverWritten) {
     // One of each kind the number parser refuses (all of them: tests/util), and numbers beyond 16 bits.
-    const std::vector<std::string> values = {"abc",   "1e2",    "0x10", "\u0661\u0662", "99999999999999999999",
-                                             "40000", "-32769", "32767.5", std::string(10'000'000, '7')};
+    const std::vector<std::string> values = {"abc",
+                                             "1e2",
+                                             "0x10",
+                                             "\u0661\u0662",
+                                             "99999999999999999999",
+                                             "40000",
+                                             "-32769",
+                                             "32767.5",
+                                             std::string(10'000'000, '7')};
     const std::string option = "value ;Operation failed;", clock = kFailed + "Invalid DeviceClock value ; ";
     const std::string segments = R"(<PostB h="-1" m="0"/><PreL h="-1" m="0"/><PostL h="-1" m="0"/>)"
                                  R"(<PreD h="-1" m="0"/><PostD h="-1" m="0"/><Night h="-1" m="0"/>)";

@@ -16,14 +16,12 @@ struct Readings : WrapperTest {
     bool checked = false;
 
     // Reads into the datalog, keeps it parsed and gives the next read an empty one.
-    std::int32_t read(const std::string& port, const std::string& sn, const std::string& type) {
-        XMLWrapper doc = deviceDoc(port, sn, type);
-        const std::int32_t r = wrapper->getReadings(rec, doc, datalog, filter, status, checked);
+    std::int32_t read() {
+        const std::int32_t r = wrapper->getReadings(rec, device, datalog, filter, status, checked);
         tree = parsed(datalog);
         datalog = newDoc(doc_kind::datalog);
         return r;
     }
-    std::int32_t read() { return read("1", sim::meter().serial, std::to_string(sim::meter().type)); }
     // The transfer summary: the counts, then each unit as name=Txt.
     std::vector<std::string> summary() const {
         std::vector<std::string> out;
@@ -39,17 +37,20 @@ struct Readings : WrapperTest {
             if (!*name || std::string(n.name()) == name) out.push_back(n);
         return out;
     }
-    // Value and date of an entry (an error's value is its Txt), against the meter's value and time.
+    // Kind, value (an error's is its Txt), range, ordinal and date of an entry, against the meter's record.
     static std::string entry(pugi::xml_node n) {
-        std::string out = std::string(n.attribute("Val").value()) + n.child_value("Txt");
-        for (const char* a : {"Y", "MM", "D", "h", "m", "s"}) out += std::string(" ") + n.attribute(a).value();
+        std::string out = std::string(n.name()) + " " + n.attribute("Val").value() + n.child_value("Txt");
+        for (const char* a : {"Range", "Ord", "Y", "MM", "D", "h", "m", "s"})
+            out += " " + std::string(n.attribute(a).value());
         return out;
     }
-    static std::string expected(int value, std::int32_t seconds) {
+    static std::string expected(const char* kind, int value, const char* range, int ord, std::int32_t seconds) {
         TIME_REC t{};
         sim::fromSeconds(seconds, t);
-        char text[64];
-        std::snprintf(text, sizeof text, "%d %d %02d %d %d %d %d", value, t.year, t.mon, t.mday, t.hour, t.min, t.sec);
+        const std::string o = ord < 0 ? "" : std::to_string(ord);
+        char text[96];
+        std::snprintf(text, sizeof text, "%s %d %s %s %d %02d %d %d %d %d", kind, value, range, o.c_str(), t.year,
+                      t.mon, t.mday, t.hour, t.min, t.sec);
         return text;
     }
 };
@@ -70,16 +71,17 @@ TEST_F(Readings, RecordDatalogAsTheMeterHoldsIt) {
               (std::vector<std::string>{std::to_string(n), std::to_string(valid.size()), std::to_string(corrupted),
                                         "255", "GlucCalib=Whole Blood", "GlucUnit=mg/dL"}));
     EXPECT_EQ(tree->document_element().child("DeviceInfo").child_value("SN"), meter.serial);
-    // One entry per valid record, in order: meter errors as Error, every other test as Gluc.
+    // One entry per valid record, in order: meter errors as Error, every other test as Gluc; a HI or LO
+    // reading says so, a measured one carries no range.
     const auto written = entries();
     ASSERT_EQ(written.size(), valid.size());
     for (std::size_t i = 0; i < valid.size(); ++i) {
-        const bool error = valid[i].Test.Flags == 3;
-        EXPECT_STREQ(written[i].name(), error ? "Error" : "Gluc") << i;
-        EXPECT_EQ(entry(written[i]), expected(valid[i].Test.Result, valid[i].D_Time)) << i;
-        // A HI or LO reading says so; a measured one carries no range.
-        const std::int16_t flags = valid[i].Test.Flags;
-        EXPECT_STREQ(written[i].attribute("Range").value(), flags == 1 ? "High" : flags == 2 ? "Low" : "") << i;
+        const std::int16_t f = valid[i].Test.Flags;
+        EXPECT_EQ(entry(written[i]), expected(f == 3 ? "Error" : "Gluc", valid[i].Test.Result,
+                                              f == 1   ? "High"
+                                              : f == 2 ? "Low"
+                                                       : "",
+                                              -1, valid[i].D_Time));
     }
     EXPECT_TRUE(std::any_of(valid.begin(), valid.end(), [](const data_rec& e) { return e.Test.Flags == 1; }));
     EXPECT_TRUE(std::any_of(valid.begin(), valid.end(), [](const data_rec& e) { return e.Test.Flags == 2; }));
@@ -97,10 +99,8 @@ TEST_F(Readings, BinaryDatalogWithOrdinalsAndEveryUnit) {
                  [](const RECORD_DATA& r) { return r.recType == 0; });
     const auto gluc = entries("Gluc");
     ASSERT_EQ(gluc.size(), glucose.size());
-    for (std::size_t i = 0; i < glucose.size(); i += 5) {
-        EXPECT_EQ(entry(gluc[i]), expected(glucose[i].reading, glucose[i].timeStamp)) << i;
-        EXPECT_EQ(gluc[i].attribute("Ord").as_int(), glucose[i].Ordinal) << i;
-    }
+    for (std::size_t i = 0; i < glucose.size(); i += 5)
+        EXPECT_EQ(entry(gluc[i]), expected("Gluc", glucose[i].reading, "", glucose[i].Ordinal, glucose[i].timeStamp));
 
     // Records damaged in the meter are counted once, apart from the valid ones.
     sim::MeterProfile damaged = meter;

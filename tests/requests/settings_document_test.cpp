@@ -1,7 +1,5 @@
 #include <gtest/gtest.h>
 
-#include <algorithm>
-#include <cmath>
 #include <optional>
 
 #include "errors/error_description.h"
@@ -45,7 +43,6 @@ TEST_F(DeviceSettings, Type7ValuesWordsAndLimits) {
     p.favoriteInsulins = {2, 0, 12};
     p.favoriteOralMeds = {0, 0, 0, 0, 7};
     p.scheduleSelection = 1;
-    p.mealSegments = {28, 40, 48, 56, 72, 80, 92};
     p.targets = {70, 140, 90, 180, 60};
     p.initializedFlag = 1;
     discover(p);
