@@ -4,6 +4,7 @@
 #include <pugixml.hpp>
 #include <sstream>
 
+#include "requests/document_values.h"
 #include "requests/readings_entries.h"
 #include "varnel/component_error.h"
 
@@ -171,5 +172,20 @@ TEST(ReadingsEntries, GlucoseCommentsAndSlotsByMeterType) {
         Datalog quiet(type);
         quiet.glucose({13}).events()->Add(4, 1);
         EXPECT_THAT(quiet.write()[0], Not(HasSubstr("Comments"))) << type;
+    }
+}
+
+// Numbers and dates as every document writes them.
+TEST(DocumentValues, RealNumbersAndDatesBeforeDayZero) {
+    std::string numbers;
+    for (double v : {123.0, -5.0, 0.5, -0.0, 123456789012345.0, 1e15, 1.0 / 3}) numbers += NumberText(v) + " ";
+    EXPECT_EQ(numbers, "123 -5 0.5 0 123456789012345 1000000000000000 0.333333333333333 ");
+
+    // Before day 0 (30 December 1899) the day still starts at midnight; without the time, the date alone.
+    for (bool withTime : {true, false}) {
+        std::string text;
+        for (const auto& [name, value] : dateAttributes(*DateTime::fromParts(1899, 1, 9, 18, 4, 0), withTime))
+            text += std::string(name) + "=" + value + " ";
+        EXPECT_EQ(text, withTime ? "D=9 MM=01 Y=1899 h=18 m=4 s=0 " : "D=9 MM=01 Y=1899 ");
     }
 }
