@@ -142,11 +142,14 @@ TEST_F(DeviceSettings, EveryExitReportsOnceAndCompletes) {
 }
 
 // The capabilities document.
-struct Caps : WrapperTest {
+struct Caps : DeviceSettings {
     XMLWrapper caps = newDoc(doc_kind::device_caps);
-    bool checked = false;
 
-    std::int32_t describe(bool all = true) { return wrapper->getDeviceCaps(rec, device, caps, all, status, checked); }
+    std::int32_t describe(bool all = true) {
+        const std::int32_t r = wrapper->getDeviceCaps(rec, device, caps, all, status, checkMeter);
+        tree = parsed(caps);
+        return r;
+    }
     // A listing as a client writes it: the names under Settings, then those under Records.
     void list(const std::string& settings, const std::string& records) {
         ASSERT_TRUE(caps.LoadXML("<DeviceCaps><Settings>" + settings + "</Settings><Records>" + records +
@@ -158,9 +161,6 @@ struct Caps : WrapperTest {
         return childNames(doc->document_element().child("Settings")) + "| " +
                childNames(doc->document_element().child("Records")) + "| ";
     }
-    std::string at(const char* path) const {
-        return nodeText(parsed(caps)->document_element().first_element_by_path(path));
-    }
 };
 
 // The two requests and their two modes agree on every type: what the settings request reads
@@ -171,27 +171,28 @@ TEST_F(Caps, TheRequestsAndTheirModesAgreeOnEveryType) {
         SCOPED_TRACE(type);
         discover(type);
         const sim::MeterProfile m = sim::meter();
-        const auto full = readSettings();
-        const pugi::xml_node items = full->document_element().child("Settings");
-        const std::string names = childNames(items);
+        fresh();
+        ASSERT_EQ(get(), ME_SUCCESS);
+        const auto full = tree;
+        const pugi::xml_node settings = full->document_element().child("Settings");
+        const std::string names = childNames(settings);
         std::string listing;
-        for (pugi::xml_node n : items.children()) listing += "<" + std::string(n.name()) + "/>";
+        Names listed;
+        for (pugi::xml_node n : settings.children()) listed.push_back(n.name()), listing += "<" + listed.back() + "/>";
         // One even step per item, capped at 100.
-        const int count = static_cast<int>(std::distance(items.begin(), items.end()));
+        const int count = static_cast<int>(std::distance(settings.begin(), settings.end()));
         std::vector<int> steps;
         for (int i = 1; i <= count; ++i) steps.push_back(std::min(i * int(std::nearbyint(100.0 / count)), 100));
         EXPECT_EQ(progress, steps);
         EXPECT_EQ(full->document_element().child("DeviceInfo").child_value("TypeID"), std::to_string(type));
-        EXPECT_EQ(nodeText(items.child("GlucRange")) + "|" + nodeText(items.child("GlucErrRange")),
+        EXPECT_EQ(nodeText(settings.child("GlucRange")) + "|" + nodeText(settings.child("GlucErrRange")),
                   "High=" + std::to_string(m.glucoseHigh) + " Low=" + std::to_string(m.glucoseLow) + " Mode=0 |High=" +
                       std::to_string(m.glucoseErrorHigh) + " Low=" + std::to_string(m.glucoseErrorLow) + " Mode=0 ");
 
-        XMLWrapper listed = settingsDoc(m.serial, std::to_string(type), listing);
-        bool check = false;
         fresh();
-        ASSERT_EQ(wrapper->getDeviceSettings(rec, device, listed, false, status, check), ME_SUCCESS);
+        ASSERT_EQ(get(listed), ME_SUCCESS);
         EXPECT_EQ(report(), kReportOk);
-        EXPECT_EQ(childNames(parsed(listed)->document_element().child("Settings")), names);
+        EXPECT_EQ(items(), names);
 
         caps = XMLWrapper();
         fresh();
@@ -219,9 +220,9 @@ TEST_F(Caps, TheMetersOwnOptionsLanguagesAndLimits) {
     discover(tarn);
     ASSERT_EQ(describe(), ME_SUCCESS);
     EXPECT_EQ(described().find("Decimal"), std::string::npos);
-    EXPECT_EQ(childTexts(parsed(caps)->document_element().first_element_by_path("Settings/Language/ValidLang")),
-              (Names{"Txt=English 0", "Txt=British 19", "23"}));
-    EXPECT_EQ(at("Settings/GlucRange") + at("Records/Gluc"), "High=600 Low=25 Mode=0 Min=0 Max=1023 ");
+    EXPECT_EQ(children("Language/ValidLang"), (Names{"Txt=English 0", "Txt=British 19", "23"}));
+    EXPECT_EQ(at("GlucRange") + nodeText(tree->first_element_by_path("DeviceCaps/Records/Gluc")),
+              "High=600 Low=25 Mode=0 Min=0 Max=1023 ");
 }
 
 TEST_F(Caps, ListingDescribesWhatTheTypeHasAndNamesTheRest) {
