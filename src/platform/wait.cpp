@@ -77,7 +77,8 @@ std::int32_t clsWait::MsgWaitObj(std::int32_t interval, std::span<WaitEvent* con
         std::int32_t status;
         const auto tick = msUntilNextTick();
         if (system) {
-            if (!limited && !tick && !windowTickComing()) return waitTimeout;  // nothing could release it
+            // Another thread may pulse a kernel event; with none, nothing could release the wait.
+            if (!limited && objects.empty() && !tick && !windowTickComing()) return waitTimeout;
             status = systemRound(handles, remaining, limited, tick);
         } else if (tick && (!limited || *tick <= static_cast<std::uint32_t>(remaining))) {
             clock.sleep(*tick);

@@ -45,8 +45,9 @@ public:
     // Waits until one of the objects is pulsed (returns its index) or the
     // interval has passed (returns waitTimeout); ticks that arrive meanwhile run
     // and the wait goes on with the time that remains. A wait without a limit
-    // that no tick handler could end (no enabled timer with a handler) ends at
-    // once as a time-out instead of blocking the thread for good.
+    // that nothing could end (no enabled timer with a handler, and no kernel
+    // event another thread could pulse) ends at once as a time-out instead of
+    // blocking the thread for good.
     std::int32_t MsgWaitObj(std::int32_t interval, std::span<WaitEvent* const> objects = {});
 
 private:
