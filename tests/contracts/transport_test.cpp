@@ -129,7 +129,7 @@ TEST(TransportLoading, WhatIsMissingIsNamedOnFirstUse) {
     auto absent = loadTransport(nowhere);  // nothing is opened yet
     METER_REC rec{};
     for (int attempt = 0; attempt < 2; ++attempt)  // a failed load is tried again
-        expectUnavailable([&] { absent->vb_Chk4Meter(rec); }, {nowhere, "No such file"});
+        expectUnavailable([&] { absent->vb_Chk4Meter(rec); }, {nowhere, test::LoadedLibrary(nowhere.c_str()).error});
     auto partial = loadTransport(RECORDING_TRANSPORT_NO_CHK4METER);
     expectUnavailable([&] { partial->close_meter(rec); }, {RECORDING_TRANSPORT_NO_CHK4METER, "\"vb_Chk4Meter\""});
     TransportFunctions table{};
