@@ -2,6 +2,7 @@
 # Installs the Debian packages Varnel builds and tests with, when any is missing:
 # the compilers, the libraries, and clang's sanitizer and libFuzzer runtimes.
 # With the argument "docs", also doxygen for the API reference (scripts/docs.sh).
+# Other arguments name packages to install instead (scripts/windows.sh).
 set -euo pipefail
 packages=(cmake g++ make libpugixml-dev libgtest-dev libgmock-dev libbenchmark-dev libcli11-dev nlohmann-json3-dev
           clang libclang-rt-14-dev libxml2-dev python3 python3-pytest)
@@ -10,7 +11,11 @@ missing=()
 packages+=(pkg-config)
 # The Python package is installed by pip into a venv, offline, with Debian's setuptools and wheel.
 packages+=(python3-venv python3-setuptools python3-wheel)
-[ "${1:-}" = docs ] && packages+=(doxygen)
+if [ "${1:-}" = docs ]; then
+  packages+=(doxygen)
+elif [ $# -gt 0 ]; then
+  packages=("$@")
+fi
 for p in "${packages[@]}"; do
   dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q "install ok installed" || missing+=("$p")
 done

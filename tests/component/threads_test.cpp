@@ -2,7 +2,6 @@
 // threads, through C++ and through the C interface, see exactly what one of
 // them sees alone. scripts/tsan.sh runs this under ThreadSanitizer with more
 // sessions (VARNEL_THREAD_SESSIONS).
-#include <dlfcn.h>
 #include <gtest/gtest.h>
 
 #include <cstdlib>
@@ -14,6 +13,7 @@
 #include <vector>
 
 #include "support/client_session.h"
+#include "support/loaded_library.h"
 #include "support/wrapper_fixture.h"
 #include "varnel/varnel.h"
 #include "varnel/vxsim.h"
@@ -92,14 +92,13 @@ void runTogether(const std::vector<Session>& clients) {
 }
 
 struct Threads : ::testing::Test {
-    void* library = dlopen(VARNEL_TEST_TRANSPORT_PATH, RTLD_NOW | RTLD_LOCAL);
-    void select(int type) { reinterpret_cast<int (*)(int)>(dlsym(library, "vxsim_select_type"))(type); }
-    void SetUp() override { ASSERT_NE(library, nullptr) << dlerror(); }
+    varnel::test::LoadedLibrary library{VARNEL_TEST_TRANSPORT_PATH};
+    void select(int type) { library.function<int (*)(int)>("vxsim_select_type")(type); }
+    void SetUp() override { ASSERT_NE(library.handle, nullptr) << library.error; }
     void TearDown() override {
-        if (!library) return;
-        reinterpret_cast<int (*)()>(dlsym(library, "vxsim_reset"))();
+        if (!library.handle) return;
+        library.function<int (*)()>("vxsim_reset")();
         ::vxsim_reset();
-        dlclose(library);
         varnel::setThreadClock(nullptr);
     }
 };

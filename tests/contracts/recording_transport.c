@@ -5,7 +5,7 @@
 
 #include "varnel/vantrix32.h"
 
-#define EXPORT __attribute__((visibility("default")))
+#define EXPORT VX_API
 
 /* A library lacking a required function exports it under another name. */
 #ifdef RECORDING_TRANSPORT_NO_CHK4METER_VARIANT
@@ -42,7 +42,7 @@ static void long_operation(METER_REC* rec) {
 #define NOTE_REC(kind, type, name) rec_seen = _Generic((name), METER_REC * : (name), default : rec_seen);
 
 #define DEFINE(ret, name, ...)                                                                  \
-    EXPORT ret name(VX_C_PARAMS(__VA_ARGS__)) {                                                 \
+    EXPORT ret VX_CALL name(VX_C_PARAMS(__VA_ARGS__)) {                                         \
         METER_REC* rec_seen = 0;                                                                \
         VX_EACH(NOTE_REC, __VA_ARGS__)                                                          \
         if (rec_seen && strcmp(#name, "vb_Clear_Meter_Datalog") == 0) long_operation(rec_seen); \
@@ -51,12 +51,12 @@ static void long_operation(METER_REC* rec) {
 VX_METER_FUNCTIONS(DEFINE)
 
 #ifndef RECORDING_TRANSPORT_NO_HOOKS_VARIANT
-EXPORT void vx_set_yield_hook(vx_yield_fn hook, void* context) {
+EXPORT void VX_CALL vx_set_yield_hook(vx_yield_fn hook, void* context) {
     yield_hook = hook;
     yield_context = context;
 }
 
-EXPORT void vx_set_clock_hook(vx_tick_fn tick_count, vx_sleep_fn sleep, void* context) {
+EXPORT void VX_CALL vx_set_clock_hook(vx_tick_fn tick_count, vx_sleep_fn sleep, void* context) {
     tick_hook = tick_count;
     sleep_hook = sleep;
     clock_context = context;

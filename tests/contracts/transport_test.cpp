@@ -3,8 +3,6 @@
 // generated from the one function list, and every request runs through it.)
 #include <gtest/gtest.h>
 
-#include <dlfcn.h>
-
 #include <functional>
 #include <initializer_list>
 #include <memory>
@@ -15,6 +13,7 @@
 #include "contracts/transport.h"
 #include "platform/message_pump.h"
 #include "support/expect_error.h"
+#include "support/loaded_library.h"
 #include "varnel/clock.h"
 #include "varnel/component_error.h"
 
@@ -24,6 +23,9 @@ using namespace varnel::detail;
 namespace {
 
 // Expects `call` to raise transport_unavailable with a description naming each of `mentions`.
+// A table entry: the library's calling convention, which a lambda cannot have on 32-bit Windows.
+std::int16_t VX_CALL initializeNothing(METER_REC*) { return 0; }
+
 void expectUnavailable(const std::function<void()>& call, std::initializer_list<std::string> mentions) {
     for (const std::string& m : mentions) test::expectError(call, errc::transport_unavailable, m);
 }
@@ -32,13 +34,13 @@ TEST(TransportLoading, WhatIsMissingIsNamedOnFirstUseAndCandidatesAreTriedInOrde
     METER_REC rec{};
     const std::string first = "/nonexistent/a/libvantrix_nowhere.so", second = "/nonexistent/b/libvantrix_nowhere.so";
     auto absent = loadTransport(first);  // nothing is opened yet; a failed load is tried again on every call
-    expectUnavailable([&] { absent->vb_Chk4Meter(rec); }, {first, "No such file"});
+    expectUnavailable([&] { absent->vb_Chk4Meter(rec); }, {first, test::LoadedLibrary(first.c_str()).error});
     expectUnavailable([&] { loadTransport({first, second})->vb_Chk4Meter(rec); }, {first, second});
     EXPECT_EQ(loadTransport({first, RECORDING_TRANSPORT_FULL})->vb_Clear_Meter_Datalog(rec), -108);
     auto partial = loadTransport(RECORDING_TRANSPORT_NO_CHK4METER);
     expectUnavailable([&] { partial->close_meter(rec); }, {RECORDING_TRANSPORT_NO_CHK4METER, "\"vb_Chk4Meter\""});
     TransportFunctions table{};
-    table.initialize_meter_structure = [](METER_REC*) -> std::int16_t { return 0; };
+    table.initialize_meter_structure = &initializeNothing;
     expectUnavailable([&] { makeTransport(table)->initialize_meter_structure(rec); }, {"\"find_meter\""});
     auto hookless = loadTransport(RECORDING_TRANSPORT_NO_HOOKS);  // the hooks are optional
     EXPECT_EQ(hookless->vb_Clear_Meter_Datalog(rec), -108);
@@ -75,9 +77,9 @@ TEST_F(TransportYield, DueTicksRunWhileTheLibraryYieldsItsErrorsFollowTheCallAnd
 
     // A library that exports a clock hook runs on the caller's thread clock once it is first used:
     // the recording library's own view of the caller's clock, in the same loaded copy the transport uses.
-    void* handle = dlopen(RECORDING_TRANSPORT_FULL, RTLD_NOW);
-    auto now = reinterpret_cast<std::uint32_t (*)()>(dlsym(handle, "library_now"));
-    auto sleep = reinterpret_cast<void (*)(std::uint32_t)>(dlsym(handle, "library_sleep"));
+    const test::LoadedLibrary recorder{RECORDING_TRANSPORT_FULL};
+    auto now = recorder.function<std::uint32_t (*)()>("library_now");
+    auto sleep = recorder.function<void (*)(std::uint32_t)>("library_sleep");
     EXPECT_EQ(now(), 1500u);
     sleep(250);  // the library's wait is the caller's clock moving
     EXPECT_EQ(clock->tickCount(), 1750u);

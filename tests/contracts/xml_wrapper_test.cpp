@@ -246,7 +246,8 @@ TEST(XMLWrapperTest, SaveFileAndLoadFile) {
 
     const std::string before = x.XML();
     expectError([&] { x.LoadFile((dir.path / "missing.xml").string()); }, errc::document_failure, "missing.xml");
-    expectError([&] { x.LoadFile(dir.path.string()); }, errc::document_failure, "cannot read");
+    // A directory: opened but unreadable on POSIX, not even opened on Windows.
+    expectError([&] { x.LoadFile(dir.path.string()); }, errc::document_failure, "LoadFile: cannot ");
     EXPECT_FALSE(x.LoadFile(dir.file("utf16.xml", std::string("\xFF\xFE<\0R\0/\0>\0", 10))));
     EXPECT_NE(x.LastLoadError().find("UTF-16"), std::string::npos);
     EXPECT_EQ(x.XML(), before);
@@ -483,7 +484,8 @@ TEST(XMLIndexedAccess, RememberedPlacesFollowChangesAndNavigation) {
     EXPECT_EQ(x.GetChildCount(), 3);
 }
 
-#if !defined(__SANITIZE_ADDRESS__) && !defined(__SANITIZE_THREAD__)
+// Memory limits through setrlimit: POSIX, unsanitized.
+#if !defined(__SANITIZE_ADDRESS__) && !defined(__SANITIZE_THREAD__) && !defined(_WIN32)
 #include <sys/resource.h>
 #include <unistd.h>
 
