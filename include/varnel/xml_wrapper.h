@@ -14,6 +14,7 @@ namespace varnel {
 
 namespace detail {
 class XmlAppender;
+struct XmlDocumentAccess;
 }
 
 // Kinds of XMLWrapper::InitDocument. 2, 4 and 7 are fixed by the interface; the
@@ -199,6 +200,7 @@ public:
 
 private:
     friend class detail::XmlAppender;
+    friend struct detail::XmlDocumentAccess;
     struct Impl;
     std::unique_ptr<Impl> impl_;  // null only after a move: an empty document
     Impl& edit();                 // makes an Impl for a moved-from object
