@@ -26,9 +26,13 @@ if [ "$mode" = register ]; then
     exit $fail
 fi
 # Every identifier of both type libraries, and the ProgIDs: none may remain.
-for u in $(sed -n 's/.*uuid(\([0-9a-fA-F-]*\)).*/\1/p' "$idl"/*.idl); do
-    for hive in CLSID Interface TypeLib; do
-        if "$run" reg query "HKCR\\$hive\\{$u}" >/dev/null 2>&1; then echo "left behind: HKCR\\$hive\\{$u}"; fail=1; fi
+uuids=$(sed -n 's/.*uuid(\([0-9a-fA-F-]*\)).*/\1/p' "$idl"/*.idl)
+[ -n "$uuids" ] || { echo "no identifiers found in $idl"; exit 1; }
+for hive in CLSID Interface TypeLib; do
+    keys=$(query "HKCR\\$hive")
+    [ -n "$keys" ] || { echo "cannot list HKCR\\$hive"; fail=1; }
+    for u in $uuids; do
+        if printf '%s\n' "$keys" | grep -qi "\\{$u}\$"; then echo "left behind: HKCR\\$hive\\{$u}"; fail=1; fi
     done
 done
 for p in $progids; do
