@@ -8,9 +8,9 @@
  * are listed in vantrix32_functions.h; this header declares every one of them
  * from that list, for example
  *
- *   int16_t find_meter(METER_REC* rec, int32_t found[11], int16_t ports[11]);
- *   int16_t vb_Set_Meter_Option(METER_REC* rec, int16_t option, int16_t value);
- *   void vx_set_clock_hook(vx_tick_fn tick_count, vx_sleep_fn sleep, void* context);
+ *   int16_t VX_CALL find_meter(METER_REC* rec, int32_t found[11], int16_t ports[11]);
+ *   int16_t VX_CALL vb_Set_Meter_Option(METER_REC* rec, int16_t option, int16_t value);
+ *   void VX_CALL vx_set_clock_hook(vx_tick_fn tick_count, vx_sleep_fn sleep, void* context);
  *
  * Each meter function returns 0 for success or a negative ReturnValues_Enum
  * code, and then also sets Error_code in the record it was passed
@@ -25,17 +25,27 @@
 #include "records.h"
 #include "vantrix32_functions.h"
 
-#if defined(VANTRIX32_BUILDING)
+#if defined(VANTRIX32_BUILDING) && defined(_WIN32)
+#define VX_API __declspec(dllexport)
+#elif defined(VANTRIX32_BUILDING)
 #define VX_API __attribute__((visibility("default")))
 #else
 #define VX_API
+#endif
+
+/* 32-bit Windows transports use the standard-call convention, exported by
+ * their undecorated names; elsewhere the platform's only C convention. */
+#if defined(_WIN32) && defined(__i386__)
+#define VX_CALL __stdcall
+#else
+#define VX_CALL
 #endif
 
 #ifdef __cplusplus
 extern "C" {
 #endif
 
-#define VX_DECLARE_(ret, name, ...) VX_API ret name(VX_C_PARAMS(__VA_ARGS__));
+#define VX_DECLARE_(ret, name, ...) VX_API ret VX_CALL name(VX_C_PARAMS(__VA_ARGS__));
 VX_TRANSPORT_FUNCTIONS(VX_DECLARE_)
 #undef VX_DECLARE_
 

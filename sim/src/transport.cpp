@@ -208,14 +208,14 @@ std::int16_t setFavorites(State& s, METER_REC& rec, const std::int16_t* values,
 
 extern "C" {
 
-VX_API std::int16_t initialize_meter_structure(METER_REC* rec) {
+VX_API std::int16_t VX_CALL initialize_meter_structure(METER_REC* rec) {
     return call("initialize_meter_structure", rec, [](State&, METER_REC& r) {
         std::memset(&r, 0, sizeof r);
         return ME_SUCCESS;
     });
 }
 
-VX_API std::int16_t find_meter(METER_REC* rec, std::int32_t found[11], std::int16_t ports[11]) {
+VX_API std::int16_t VX_CALL find_meter(METER_REC* rec, std::int32_t found[11], std::int16_t ports[11]) {
     return call("find_meter", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (!ports) return ME_BAD_PARAMETER;
         if (found) std::fill_n(found, 11, 0);
@@ -233,7 +233,7 @@ VX_API std::int16_t find_meter(METER_REC* rec, std::int32_t found[11], std::int1
     });
 }
 
-VX_API std::int16_t initialize_meter_type_structure(METER_REC* rec, std::int16_t type) {
+VX_API std::int16_t VX_CALL initialize_meter_type_structure(METER_REC* rec, std::int16_t type) {
     return call("initialize_meter_type_structure", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (type < 1 || type > 8) return ME_BAD_PARAMETER;
         prepareType(s, r, type);
@@ -249,7 +249,7 @@ VX_API std::int16_t vb_Chk4Meter(METER_REC* rec) {
     });
 }
 
-VX_API std::int16_t vb_Get_Meter_Firmware(METER_REC* rec) {
+VX_API std::int16_t VX_CALL vb_Get_Meter_Firmware(METER_REC* rec) {
     return call("vb_Get_Meter_Firmware", rec, [](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reach(s, r)) return c;
         putText(r.Firmware_number, s.meter().firmware);
@@ -257,11 +257,11 @@ VX_API std::int16_t vb_Get_Meter_Firmware(METER_REC* rec) {
     });
 }
 
-VX_API std::int16_t vb_Tickle_Meter(METER_REC* rec) {
+VX_API std::int16_t VX_CALL vb_Tickle_Meter(METER_REC* rec) {
     return call("vb_Tickle_Meter", rec, [](State& s, METER_REC& r) { return reach(s, r); });
 }
 
-VX_API std::int16_t close_meter(METER_REC* rec) {
+VX_API std::int16_t VX_CALL close_meter(METER_REC* rec) {
     return call("close_meter", rec, [](State& s, METER_REC& r) {
         if (r.port.com_number == s.meter().port) s.portOpen = false;
         r.port.Id = 0;
@@ -270,7 +270,7 @@ VX_API std::int16_t close_meter(METER_REC* rec) {
     });
 }
 
-VX_API std::int16_t vb_Clear_Meter_Datalog(METER_REC* rec) {
+VX_API std::int16_t VX_CALL vb_Clear_Meter_Datalog(METER_REC* rec) {
     return call("vb_Clear_Meter_Datalog", rec, [](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reach(s, r)) return c;
         s.transfer(r, kFrameBytes, kEraseMs, [](double) {});
@@ -282,7 +282,7 @@ VX_API std::int16_t vb_Clear_Meter_Datalog(METER_REC* rec) {
     });
 }
 
-VX_API std::int16_t vb_Read_Meter_Options(METER_REC* rec) {
+VX_API std::int16_t VX_CALL vb_Read_Meter_Options(METER_REC* rec) {
     return call("vb_Read_Meter_Options", rec, [](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reach(s, r)) return c;
         putOptions(r.Setting, s.meter());
@@ -290,7 +290,7 @@ VX_API std::int16_t vb_Read_Meter_Options(METER_REC* rec) {
     });
 }
 
-VX_API std::int16_t vb_Read_Meter_Option(METER_REC* rec, std::int16_t option) {
+VX_API std::int16_t VX_CALL vb_Read_Meter_Option(METER_REC* rec, std::int16_t option) {
     return call("vb_Read_Meter_Option", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (option < 0 || option >= kOptionCount) return ME_BAD_PARAMETER;
         if (std::int16_t c = reach(s, r)) return c;
@@ -301,7 +301,7 @@ VX_API std::int16_t vb_Read_Meter_Option(METER_REC* rec, std::int16_t option) {
     });
 }
 
-VX_API std::int16_t vb_Set_Meter_Option(METER_REC* rec, std::int16_t option, std::int16_t value) {
+VX_API std::int16_t VX_CALL vb_Set_Meter_Option(METER_REC* rec, std::int16_t option, std::int16_t value) {
     return call("vb_Set_Meter_Option", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (option < 0 || option >= kOptionCount) return ME_BAD_PARAMETER;
         if (std::int16_t c = reach(s, r)) return c;
@@ -315,7 +315,7 @@ VX_API std::int16_t vb_Set_Meter_Option(METER_REC* rec, std::int16_t option, std
     });
 }
 
-VX_API std::int16_t vb_Set_Meter_Options(METER_REC* rec, SETTINGS_REC* settings) {
+VX_API std::int16_t VX_CALL vb_Set_Meter_Options(METER_REC* rec, SETTINGS_REC* settings) {
     return call("vb_Set_Meter_Options", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (!settings) return ME_BAD_PARAMETER;
         if (std::int16_t c = reach(s, r)) return c;
@@ -335,7 +335,7 @@ VX_API std::int16_t vb_Set_Meter_Options(METER_REC* rec, SETTINGS_REC* settings)
     });
 }
 
-VX_API std::int16_t vb_Read_Meter_Clock(METER_REC* rec, std::int32_t* seconds) {
+VX_API std::int16_t VX_CALL vb_Read_Meter_Clock(METER_REC* rec, std::int32_t* seconds) {
     return call("vb_Read_Meter_Clock", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (!seconds) return ME_BAD_PARAMETER;
         if (std::int16_t c = reach(s, r)) return c;
@@ -344,7 +344,7 @@ VX_API std::int16_t vb_Read_Meter_Clock(METER_REC* rec, std::int32_t* seconds) {
     });
 }
 
-VX_API std::int16_t vb_Set_Meter_Clock(METER_REC* rec, std::int32_t seconds) {
+VX_API std::int16_t VX_CALL vb_Set_Meter_Clock(METER_REC* rec, std::int32_t seconds) {
     return call("vb_Set_Meter_Clock", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reach(s, r)) return c;
         const int type = s.meter().type;
@@ -354,20 +354,20 @@ VX_API std::int16_t vb_Set_Meter_Clock(METER_REC* rec, std::int32_t seconds) {
     });
 }
 
-VX_API std::int32_t convert_to_seconds(TIME_REC* time) {
+VX_API std::int32_t VX_CALL convert_to_seconds(TIME_REC* time) {
     State& s = state();
     std::lock_guard lock(s.mutex);
     s.countCall("convert_to_seconds");
     return time ? toSeconds(*time) : -1;
 }
 
-VX_API std::int16_t convert_from_seconds(std::int32_t seconds, TIME_REC* time) {
+VX_API std::int16_t VX_CALL convert_from_seconds(std::int32_t seconds, TIME_REC* time) {
     return callWithoutRecord("convert_from_seconds", [&](State&) -> std::int16_t {
         return time && fromSeconds(seconds, *time) ? ME_SUCCESS : ME_BAD_PARAMETER;
     });
 }
 
-VX_API std::int16_t GetInitializedFlag(METER_REC* rec, std::int16_t* flag) {
+VX_API std::int16_t VX_CALL GetInitializedFlag(METER_REC* rec, std::int16_t* flag) {
     return call("GetInitializedFlag", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
         if (!flag) return ME_BAD_PARAMETER;
@@ -376,7 +376,7 @@ VX_API std::int16_t GetInitializedFlag(METER_REC* rec, std::int16_t* flag) {
     });
 }
 
-VX_API std::int16_t SetInitializedFlag(METER_REC* rec, std::int16_t flag) {
+VX_API std::int16_t VX_CALL SetInitializedFlag(METER_REC* rec, std::int16_t flag) {
     return call("SetInitializedFlag", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
         if (flag != 0 && flag != 1) return ME_BAD_PARAMETER;
@@ -385,23 +385,23 @@ VX_API std::int16_t SetInitializedFlag(METER_REC* rec, std::int16_t flag) {
     });
 }
 
-VX_API std::int16_t GetInsulinName(METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name) {
+VX_API std::int16_t VX_CALL GetInsulinName(METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name) {
     return call("GetInsulinName", rec, [&](State& s, METER_REC& r) { return getName(s, r, name, kInsulins); });
 }
 
-VX_API std::int16_t SetInsulinName(METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name) {
+VX_API std::int16_t VX_CALL SetInsulinName(METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name) {
     return call("SetInsulinName", rec, [&](State& s, METER_REC& r) { return setName(s, r, name, kInsulins); });
 }
 
-VX_API std::int16_t GetOralMedicationName(METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name) {
+VX_API std::int16_t VX_CALL GetOralMedicationName(METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name) {
     return call("GetOralMedicationName", rec, [&](State& s, METER_REC& r) { return getName(s, r, name, kOralMeds); });
 }
 
-VX_API std::int16_t SetOralMedicationName(METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name) {
+VX_API std::int16_t VX_CALL SetOralMedicationName(METER_REC* rec, INSULIN_OR_ORAL_MED_NAME_TYPE* name) {
     return call("SetOralMedicationName", rec, [&](State& s, METER_REC& r) { return setName(s, r, name, kOralMeds); });
 }
 
-VX_API std::int16_t GetPredefinedInsulins(METER_REC* rec, PREDEFINED_INSULINS_TYPE* insulins) {
+VX_API std::int16_t VX_CALL GetPredefinedInsulins(METER_REC* rec, PREDEFINED_INSULINS_TYPE* insulins) {
     return call("GetPredefinedInsulins", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
         if (!insulins) return ME_BAD_PARAMETER;
@@ -410,14 +410,14 @@ VX_API std::int16_t GetPredefinedInsulins(METER_REC* rec, PREDEFINED_INSULINS_TY
     });
 }
 
-VX_API std::int16_t SetPredefinedInsulins(METER_REC* rec, PREDEFINED_INSULINS_TYPE* insulins) {
+VX_API std::int16_t VX_CALL SetPredefinedInsulins(METER_REC* rec, PREDEFINED_INSULINS_TYPE* insulins) {
     return call("SetPredefinedInsulins", rec, [&](State& s, METER_REC& r) {
         return setFavorites(s, r, insulins ? insulins->InsulinType : nullptr, &MeterProfile::favoriteInsulins,
                             kInsulinSlots);
     });
 }
 
-VX_API std::int16_t GetPredefinedOralMeds(METER_REC* rec, PREDEFINED_ORAL_MEDS_TYPE* meds) {
+VX_API std::int16_t VX_CALL GetPredefinedOralMeds(METER_REC* rec, PREDEFINED_ORAL_MEDS_TYPE* meds) {
     return call("GetPredefinedOralMeds", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
         if (!meds) return ME_BAD_PARAMETER;
@@ -426,13 +426,13 @@ VX_API std::int16_t GetPredefinedOralMeds(METER_REC* rec, PREDEFINED_ORAL_MEDS_T
     });
 }
 
-VX_API std::int16_t SetPredefinedOralMeds(METER_REC* rec, PREDEFINED_ORAL_MEDS_TYPE* meds) {
+VX_API std::int16_t VX_CALL SetPredefinedOralMeds(METER_REC* rec, PREDEFINED_ORAL_MEDS_TYPE* meds) {
     return call("SetPredefinedOralMeds", rec, [&](State& s, METER_REC& r) {
         return setFavorites(s, r, meds ? meds->oralMedType : nullptr, &MeterProfile::favoriteOralMeds, kOralMedSlots);
     });
 }
 
-VX_API std::int16_t GetMealSegments(METER_REC* rec, MEAL_SEGMENTS_TYPE* segments) {
+VX_API std::int16_t VX_CALL GetMealSegments(METER_REC* rec, MEAL_SEGMENTS_TYPE* segments) {
     return call("GetMealSegments", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
         if (!segments) return ME_BAD_PARAMETER;
@@ -442,7 +442,7 @@ VX_API std::int16_t GetMealSegments(METER_REC* rec, MEAL_SEGMENTS_TYPE* segments
 }
 
 // An entry of 0 keeps that segment's start: callers send only the segments they changed.
-VX_API std::int16_t SetMealSegments(METER_REC* rec, MEAL_SEGMENTS_TYPE* segments) {
+VX_API std::int16_t VX_CALL SetMealSegments(METER_REC* rec, MEAL_SEGMENTS_TYPE* segments) {
     return call("SetMealSegments", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
         if (!segments) return ME_BAD_PARAMETER;
@@ -455,7 +455,7 @@ VX_API std::int16_t SetMealSegments(METER_REC* rec, MEAL_SEGMENTS_TYPE* segments
     });
 }
 
-VX_API std::int16_t GetScheduleSelection(METER_REC* rec, std::int16_t* selection) {
+VX_API std::int16_t VX_CALL GetScheduleSelection(METER_REC* rec, std::int16_t* selection) {
     return call("GetScheduleSelection", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
         if (!selection) return ME_BAD_PARAMETER;
@@ -464,7 +464,7 @@ VX_API std::int16_t GetScheduleSelection(METER_REC* rec, std::int16_t* selection
     });
 }
 
-VX_API std::int16_t SetScheduleSelection(METER_REC* rec, std::int16_t selection) {
+VX_API std::int16_t VX_CALL SetScheduleSelection(METER_REC* rec, std::int16_t selection) {
     return call("SetScheduleSelection", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
         if (selection != 0 && selection != 1) return ME_BAD_PARAMETER;
@@ -473,7 +473,7 @@ VX_API std::int16_t SetScheduleSelection(METER_REC* rec, std::int16_t selection)
     });
 }
 
-VX_API std::int16_t GetTargetRange(METER_REC* rec, std::int16_t* befLow, std::int16_t* befHigh, std::int16_t* aftLow,
+VX_API std::int16_t VX_CALL GetTargetRange(METER_REC* rec, std::int16_t* befLow, std::int16_t* befHigh, std::int16_t* aftLow,
                                    std::int16_t* aftHigh, std::int16_t* hypo) {
     return call("GetTargetRange", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
@@ -488,7 +488,7 @@ VX_API std::int16_t GetTargetRange(METER_REC* rec, std::int16_t* befLow, std::in
     });
 }
 
-VX_API std::int16_t SetTargetRange(METER_REC* rec, std::int16_t befLow, std::int16_t befHigh, std::int16_t aftLow,
+VX_API std::int16_t VX_CALL SetTargetRange(METER_REC* rec, std::int16_t befLow, std::int16_t befHigh, std::int16_t aftLow,
                                    std::int16_t aftHigh, std::int16_t hypo) {
     return call("SetTargetRange", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (std::int16_t c = reachMorvex(s, r)) return c;
@@ -499,7 +499,7 @@ VX_API std::int16_t SetTargetRange(METER_REC* rec, std::int16_t befLow, std::int
     });
 }
 
-VX_API std::int16_t GetMeterDatalog(METER_REC* rec, METER_BIN_DATALOG* datalog, std::int32_t startSeconds) {
+VX_API std::int16_t VX_CALL GetMeterDatalog(METER_REC* rec, METER_BIN_DATALOG* datalog, std::int32_t startSeconds) {
     return call("GetMeterDatalog", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (!datalog) return ME_BAD_PARAMETER;
         if (std::int16_t c = reach(s, r)) return c;
@@ -543,14 +543,14 @@ VX_API std::int16_t GetMeterDatalog(METER_REC* rec, METER_BIN_DATALOG* datalog, 
     });
 }
 
-VX_API std::int16_t GetMeterDatalogRecordData(METER_BIN_DATALOG* datalog, std::int16_t index, RECORD_DATA* record) {
+VX_API std::int16_t VX_CALL GetMeterDatalogRecordData(METER_BIN_DATALOG* datalog, std::int16_t index, RECORD_DATA* record) {
     return callWithoutRecord("GetMeterDatalogRecordData", [&](State&) -> std::int16_t {
         if (!datalog || !record) return ME_BAD_PARAMETER;
         return decodeBinaryRecord(*datalog, index, *record);
     });
 }
 
-VX_API std::int16_t vb_Upload_Meter_Datalog(METER_REC* rec, METER_DATALOG* datalog) {
+VX_API std::int16_t VX_CALL vb_Upload_Meter_Datalog(METER_REC* rec, METER_DATALOG* datalog) {
     return call("vb_Upload_Meter_Datalog", rec, [&](State& s, METER_REC& r) -> std::int16_t {
         if (!datalog) return ME_BAD_PARAMETER;
         if (std::int16_t c = reach(s, r)) return c;

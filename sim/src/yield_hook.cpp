@@ -16,13 +16,13 @@ thread_local vx_sleep_fn t_sleep = nullptr;
 thread_local void* t_clockContext = nullptr;
 }  // namespace
 
-extern "C" void vx_set_yield_hook(vx_yield_fn hook, void* context) {
+extern "C" void VX_CALL vx_set_yield_hook(vx_yield_fn hook, void* context) {
     t_hook = hook;
     t_context = context;
 }
 
 // Both functions or neither: a clock that can tell the time but not wait (or the reverse) is refused.
-extern "C" void vx_set_clock_hook(vx_tick_fn tick_count, vx_sleep_fn sleep, void* context) {
+extern "C" void VX_CALL vx_set_clock_hook(vx_tick_fn tick_count, vx_sleep_fn sleep, void* context) {
     const bool whole = tick_count && sleep;
     t_tick = whole ? tick_count : nullptr;
     t_sleep = whole ? sleep : nullptr;

@@ -1,39 +1,34 @@
 #include "varnel/dll_wrapper.h"
 
-#include <dlfcn.h>
-
-#include <filesystem>
 #include <string>
 #include <vector>
 
 #include "component/wrapper_access.h"
+#include "platform/native.h"
 #include "requests/discovery.h"
 #include "requests/meter_actions.h"
 #include "requests/readings_document.h"
 #include "requests/request_context.h"
 #include "requests/settings_requests.h"
-#include "varnel/clock.h"
 
 namespace varnel {
 
 namespace {
 
-// Where the shipped transport library may be: beside libvarnel, in a varnel/
-// directory beside it (install layouts), then wherever the loader's own search
-// finds it. The library locates itself through one of its own symbols (the clock
-// slot), so sanitizer runtimes that stand in for the loader's caller do not move
-// the search; a program linking the units statically looks beside itself.
+// Where the shipped transport library may be: beside the module holding the
+// component (libvarnel, the COM server, or a program linking the units
+// statically), in a varnel/ directory beside it where the installed layout has
+// one, then wherever the system's own search finds it.
 std::vector<std::string> transportCandidates() {
     std::vector<std::string> candidates;
-    Dl_info info{};
-    if (dladdr(reinterpret_cast<void*>(&threadClock), &info) && info.dli_fname) {
-        std::error_code ec;
-        std::filesystem::path dir = std::filesystem::path(info.dli_fname).parent_path();
-        const std::filesystem::path absolute = std::filesystem::absolute(dir, ec);
-        if (!ec) dir = absolute;
-        candidates.push_back((dir / VARNEL_TRANSPORT_NAME).string());
-        candidates.push_back((dir / "varnel" / VARNEL_TRANSPORT_NAME).string());
-    }
+    const std::string dir = detail::native::ownModuleDirectory();
+    const auto beside = [&](const std::string& name) {
+        return dir.empty() ? name : dir + detail::native::pathSeparator() + name;
+    };
+    candidates.push_back(beside(VARNEL_TRANSPORT_NAME));
+    if (*VARNEL_TRANSPORT_SUBDIR)
+        candidates.push_back(beside(std::string(VARNEL_TRANSPORT_SUBDIR) + detail::native::pathSeparator() +
+                                    VARNEL_TRANSPORT_NAME));
     candidates.push_back(VARNEL_TRANSPORT_NAME);
     return candidates;
 }
@@ -112,10 +107,8 @@ void DllWrapper::setOnComplete(std::function<void()> handler) { impl_->context.o
 
 std::string DllWrapper::defaultTransportPath() {
     const std::vector<std::string> candidates = transportCandidates();
-    for (const std::string& path : candidates) {
-        std::error_code ec;
-        if (std::filesystem::is_regular_file(path, ec)) return path;
-    }
+    for (const std::string& path : candidates)
+        if (detail::native::isFile(path)) return path;
     return candidates.back();
 }
 

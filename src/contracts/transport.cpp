@@ -1,16 +1,16 @@
 #include "contracts/transport.h"
 
-#include <dlfcn.h>
-
 #include <exception>
 #include <functional>
 #include <optional>
 #include <thread>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
 #include "errors/err_propagator.h"
 #include "platform/message_pump.h"
+#include "platform/native.h"
 #include "varnel/clock.h"
 
 namespace varnel::detail {
@@ -54,9 +54,10 @@ public:
 
 private:
     // Runs one function; an error of a tick handler that ran while it yielded follows its return.
-    template <class R, class... P, class... A>
-    R call(R (*TransportFunctions::*member)(P...), A... args) {
-        const R result = (functions().*member)(args...);
+    // The member's type carries the library's calling convention (standard-call on 32-bit Windows).
+    template <class F, class... A>
+    std::invoke_result_t<F, A...> call(F TransportFunctions::*member, A... args) {
+        const auto result = (functions().*member)(args...);
         if (auto error = takeYieldError()) std::rethrow_exception(error);
         return result;
     }
@@ -93,13 +94,13 @@ public:
     TransportFunctions open() {
         std::string tried;
         for (const std::string& path : paths_) {
-            dlerror();
-            handle_ = dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL);
+            std::string reason;
+            handle_ = native::openLibrary(path, reason);
             if (handle_) {
                 path_ = path;
                 break;
             }
-            tried += (tried.empty() ? "\"" : "; \"") + path + "\": " + lastError();
+            tried += (tried.empty() ? "\"" : "; \"") + path + "\": " + reason;
         }
         if (!handle_) {
             // One path reads as before; several name each place looked at.
@@ -119,10 +120,9 @@ public:
 
 private:
     void* symbol(const char* name, bool required) {
-        dlerror();
-        void* address = dlsym(handle_, name);
+        std::string reason;
+        void* address = native::librarySymbol(handle_, name, reason);
         if (!address && required) {
-            const std::string reason = lastError();
             close();
             raise(errc::transport_unavailable,
                   "The transport library \"" + path_ + "\" has no function \"" + name + "\": " + reason);
@@ -131,13 +131,8 @@ private:
     }
 
     void close() {
-        if (handle_) dlclose(handle_);
+        native::closeLibrary(handle_);
         handle_ = nullptr;
-    }
-
-    static std::string lastError() {
-        const char* text = dlerror();
-        return text ? text : "unknown reason";
     }
 
     std::vector<std::string> paths_;

@@ -2,8 +2,8 @@
 // clock through its clock hook, never by linking the component.
 #include "varnel/clock.h"
 
-#include <chrono>
-#include <thread>
+#include "platform/message_pump.h"
+#include "platform/native.h"
 
 namespace varnel {
 
@@ -11,25 +11,26 @@ Clock::~Clock() = default;
 
 namespace {
 
-class SteadyClock final : public Clock {
+// The system's tick count and sleep (GetTickCount on Windows).
+class SystemClock final : public Clock {
 public:
-    std::uint32_t tickCount() override {
-        using namespace std::chrono;
-        auto ms = duration_cast<milliseconds>(steady_clock::now().time_since_epoch()).count();
-        return static_cast<std::uint32_t>(ms);
-    }
-    void sleep(std::uint32_t ms) override { std::this_thread::sleep_for(std::chrono::milliseconds(ms)); }
+    std::uint32_t tickCount() override { return detail::native::tickCount(); }
+    void sleep(std::uint32_t ms) override { detail::native::sleep(ms); }
 };
 
 thread_local std::shared_ptr<Clock> t_clock;
+
+SystemClock& systemClock() {
+    static SystemClock clock;
+    return clock;
+}
 
 }  // namespace
 
 void setThreadClock(std::shared_ptr<Clock> clock) { t_clock = std::move(clock); }
 
-Clock& threadClock() {
-    static SteadyClock steady;
-    return t_clock ? *t_clock : steady;
-}
+Clock& threadClock() { return t_clock ? *t_clock : systemClock(); }
+
+bool detail::onSystemQueue() { return !t_clock && native::hasMessageQueue(); }
 
 }  // namespace varnel

@@ -4,6 +4,7 @@
 #include <utility>
 #include <vector>
 
+#include "platform/native.h"
 #include "varnel/clock.h"
 
 namespace varnel::detail {
@@ -16,7 +17,8 @@ struct TimerSlot {
 struct TimerState {
     std::uint32_t interval = 0;
     bool enabled = false;
-    bool firing = false;  // a tick never re-enters its own handlers
+    bool firing = false;    // a tick never re-enters its own handlers
+    bool windowed = false;  // a window timer of the system delivers the ticks
     std::uint32_t due = 0;
     std::vector<std::shared_ptr<TimerSlot>> slots;
 
@@ -25,6 +27,9 @@ struct TimerState {
         return std::any_of(slots.begin(), slots.end(), [](const auto& s) { return s->live; });
     }
     void restart() { due = threadClock().tickCount() + interval; }
+    // Scheduled on the thread clock, not by the system's window timer.
+    bool byClock() const { return !windowed || !onSystemQueue(); }
+    std::uintptr_t id() const { return reinterpret_cast<std::uintptr_t>(this); }
 };
 
 namespace {
@@ -53,36 +58,58 @@ thread_local std::exception_ptr t_yieldError;
 
 namespace {
 
-// True when some timer of the thread is due now.
+// True when some clock-scheduled timer of the thread is due now.
 bool anyDue() {
     const std::uint32_t now = threadClock().tickCount();
     for (const auto& t : threadTimers())
-        if (auto timer = t.lock(); timer && timer->canTick() && since(timer->due, now) >= 0) return true;
+        if (auto timer = t.lock(); timer && timer->canTick() && timer->byClock() && since(timer->due, now) >= 0)
+            return true;
     return false;
+}
+
+// One tick: every live handler runs; the first error is kept in `first`.
+void fire(TimerState& timer, std::exception_ptr& first) {
+    timer.due = threadClock().tickCount() + timer.interval;
+    timer.firing = true;
+    // Handlers may connect or disconnect while the tick runs.
+    const auto slots = timer.slots;
+    for (const auto& slot : slots) {
+        if (!slot->live) continue;
+        try {
+            slot->handler();
+        } catch (...) {
+            if (!first) first = std::current_exception();
+        }
+    }
+    timer.firing = false;
 }
 
 }  // namespace
 
-void doEvents() {
-    // A transport yields often and mostly finds nothing due: look before copying the timer list.
-    if (!anyDue()) return;
-    std::exception_ptr first;
-    for (const auto& timer : liveTimers()) {
-        const std::uint32_t now = threadClock().tickCount();
-        if (!timer->canTick() || since(timer->due, now) < 0) continue;
-        timer->due = now + timer->interval;
-        timer->firing = true;
-        // Handlers may connect or disconnect while the tick runs.
-        const auto slots = timer->slots;
-        for (const auto& slot : slots) {
-            if (!slot->live) continue;
+void tickWindowTimer(std::uintptr_t id) noexcept {
+    if (!onSystemQueue()) return;  // the thread clock schedules the ticks meanwhile
+    for (const auto& timer : liveTimers())
+        if (timer->id() == id && timer->windowed && timer->canTick()) {
+            // The error cannot cross the system's message dispatch: it waits for the pump or the transport call.
             try {
-                slot->handler();
+                std::exception_ptr first;
+                fire(*timer, first);
+                if (first && !t_yieldError) t_yieldError = first;
             } catch (...) {
-                if (!first) first = std::current_exception();
+                if (!t_yieldError) t_yieldError = std::current_exception();
             }
         }
-        timer->firing = false;
+}
+
+void doEvents() {
+    native::runPendingMessages();
+    std::exception_ptr first = takeYieldError();
+    // A transport yields often and mostly finds nothing due: look before copying the timer list.
+    if (anyDue()) {
+        for (const auto& timer : liveTimers()) {
+            if (!timer->canTick() || !timer->byClock() || since(timer->due, threadClock().tickCount()) < 0) continue;
+            fire(*timer, first);
+        }
     }
     if (first) std::rethrow_exception(first);
 }
@@ -91,12 +118,18 @@ std::optional<std::uint32_t> msUntilNextTick() {
     std::optional<std::uint32_t> next;
     const std::uint32_t now = threadClock().tickCount();
     for (const auto& timer : liveTimers()) {
-        if (!timer->canTick() || !timer->hasHandlers()) continue;
+        if (!timer->canTick() || !timer->byClock() || !timer->hasHandlers()) continue;
         const std::int32_t late = since(timer->due, now);
         const std::uint32_t wait = late >= 0 ? 0 : static_cast<std::uint32_t>(-static_cast<std::int64_t>(late));
         next = next ? std::min(*next, wait) : wait;
     }
     return next;
+}
+
+bool windowTickComing() {
+    for (const auto& timer : liveTimers())
+        if (timer->canTick() && !timer->byClock() && timer->hasHandlers()) return true;
+    return false;
 }
 
 void pumpFromTransport(void*) noexcept {
@@ -142,6 +175,7 @@ TimerControl::TimerControl(std::uint32_t interval) : state_(std::make_shared<Tim
 }
 
 TimerControl::~TimerControl() {
+    if (state_->windowed) native::stopWindowTimer(state_->id());
     // Connections that outlive the control see it gone; handlers never run again.
     for (const auto& slot : state_->slots) slot->live = false;
 }
@@ -149,8 +183,15 @@ TimerControl::~TimerControl() {
 bool TimerControl::enabled() const { return state_->enabled; }
 
 void TimerControl::setEnabled(bool on) {
-    if (on && !state_->enabled) state_->restart();
-    state_->enabled = on;
+    TimerState& s = *state_;
+    if (on && !s.enabled) {
+        s.restart();
+        s.windowed = s.interval > 0 && onSystemQueue() && native::startWindowTimer(s.id(), s.interval);
+    } else if (!on && s.windowed) {
+        native::stopWindowTimer(s.id());
+        s.windowed = false;
+    }
+    s.enabled = on;
 }
 
 TimerConnection TimerControl::onTick(std::function<void()> handler) {

@@ -14,14 +14,22 @@ namespace varnel::detail {
 struct TimerState;
 struct TimerSlot;
 
-// Lets pending window messages run once: fires every timer of this thread
-// that is due on the thread clock, at most one tick per timer. A handler's
-// error is raised again after the other due handlers have run.
+// True when this thread's waits and timers run on the system's message queue
+// and window timers (Windows, on the real clock); otherwise on the thread clock.
+bool onSystemQueue();
+
+// Lets pending window messages run once: the thread's window messages (window
+// timers among them), then every timer that is due on the thread clock, at
+// most one tick per timer. A handler's error is raised again after the other
+// due handlers have run.
 void doEvents();
 
-// Milliseconds until the next tick that has a handler to run (0 when one is
-// overdue); empty when no tick will come, so nothing can end a wait.
+// Milliseconds until the next tick scheduled on the thread clock that has a
+// handler to run (0 when one is overdue); empty when none will come.
 std::optional<std::uint32_t> msUntilNextTick();
+
+// True when a window timer of the system will deliver a tick with a handler to run.
+bool windowTickComing();
 
 // The pump in the shape of a transport yield hook. Errors cannot cross the
 // library's C frames, so they are kept until takeYieldError.
@@ -53,7 +61,9 @@ private:
 
 // A window timer: while enabled, ticks every interval milliseconds (coalesced
 // like window timers: a late pump gives one tick, and the next is one interval
-// after it). An interval of 0 never ticks.
+// after it). An interval of 0 never ticks. Enabled on the system's message
+// queue it is a window timer of the system, ticking in whatever message loop
+// the thread runs; otherwise it is scheduled on the thread clock.
 class TimerControl {
 public:
     explicit TimerControl(std::uint32_t interval = 0);

@@ -1,6 +1,5 @@
 // The C interface on the shipped simulated transport library, loaded the way
 // a C client loads it (varnel_new(NULL)), on a virtual clock.
-#include <dlfcn.h>
 #include <gtest/gtest.h>
 
 #include <pugixml.hpp>
@@ -11,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "support/loaded_library.h"
 #include "varnel/clock.h"
 #include "varnel/component_error.h"
 #include "varnel/dll_wrapper.h"
@@ -50,28 +50,27 @@ struct Events {
 
 struct CInterface : ::testing::Test {
     // The transport library the component loads, opened again: the same instance, for its control functions.
-    void* sim = dlopen(VARNEL_TEST_TRANSPORT_PATH, RTLD_NOW | RTLD_LOCAL);
+    varnel::test::LoadedLibrary sim{VARNEL_TEST_TRANSPORT_PATH};
     varnel_component* c = nullptr;
     METER_REC rec{};
     Events events;
     DocPtr device = doc(1), status = doc(7);
 
     void SetUp() override {
-        ASSERT_NE(sim, nullptr);
+        ASSERT_NE(sim.handle, nullptr) << sim.error;
         varnel::setThreadClock(std::make_shared<varnel::ManualClock>(1000));
         ASSERT_NE(c = varnel_new(nullptr), nullptr);
         varnel_on_progress(
             c, [](int16_t* p, void* e) { static_cast<Events*>(e)->progress.push_back(*p); }, &events);
         varnel_on_complete(
             c, [](void* e) { ++static_cast<Events*>(e)->completions; }, &events);
-        ASSERT_EQ(reinterpret_cast<int (*)(int)>(dlsym(sim, "vxsim_select_type"))(4), 0);
+        ASSERT_EQ(sim.function<int (*)(int)>("vxsim_select_type")(4), 0);
         DocPtr conn = loaded(kConnection);
         ASSERT_EQ(varnel_discover_device(c, &rec, device.get(), conn.get(), status.get()), ME_SUCCESS);
     }
     void TearDown() override {
         varnel_delete(c);
-        reinterpret_cast<int (*)()>(dlsym(sim, "vxsim_reset"))();
-        dlclose(sim);
+        sim.function<int (*)()>("vxsim_reset")();
         varnel::setThreadClock(nullptr);
     }
     void fresh() {

@@ -12,7 +12,7 @@ add_test(NAME CInterface.UsedFromC COMMAND capi_c_client /nonexistent/varnel-tes
 # (a python3 earlier on PATH may lack pytest, so the first that has it is used).
 # Not in sanitized builds: an uninstrumented interpreter cannot load an
 # instrumented library; the C interface's own tests cover that boundary there.
-if(NOT VARNEL_SANITIZE)
+if(NOT VARNEL_SANITIZE AND NOT WIN32)
 set(VARNEL_PYTHON "" CACHE FILEPATH "Python 3 with pytest, for the Python package's tests")
 if(NOT VARNEL_PYTHON)
   find_program(path_python3 python3)

@@ -7,7 +7,7 @@
 
 #include "varnel/vantrix32.h"
 
-#define EXPORT __attribute__((visibility("default")))
+#define EXPORT VX_API
 
 /* A library lacking a required function exports it under another name. */
 #ifdef RECORDING_TRANSPORT_NO_CHK4METER_VARIANT
@@ -63,7 +63,7 @@ static void long_operation(METER_REC* rec) {
 #define RECORD_OUT_LIST(type, name) keep((intptr_t)name), memset(name, 0x5A, VX_LIST_LENGTH * sizeof *name)
 
 #define DEFINE(ret, name, ...)                                                                  \
-    EXPORT ret name(VX_C_PARAMS(__VA_ARGS__)) {                                                 \
+    EXPORT ret VX_CALL name(VX_C_PARAMS(__VA_ARGS__)) {                                         \
         METER_REC* rec_seen = 0;                                                                \
         start();                                                                                \
         VX_EACH(RECORD, __VA_ARGS__)                                                            \
@@ -73,12 +73,12 @@ static void long_operation(METER_REC* rec) {
 VX_METER_FUNCTIONS(DEFINE)
 
 #ifndef RECORDING_TRANSPORT_NO_HOOKS_VARIANT
-EXPORT void vx_set_yield_hook(vx_yield_fn hook, void* context) {
+EXPORT void VX_CALL vx_set_yield_hook(vx_yield_fn hook, void* context) {
     yield_hook = hook;
     yield_context = context;
 }
 
-EXPORT void vx_set_clock_hook(vx_tick_fn tick_count, vx_sleep_fn sleep, void* context) {
+EXPORT void VX_CALL vx_set_clock_hook(vx_tick_fn tick_count, vx_sleep_fn sleep, void* context) {
     tick_hook = tick_count;
     sleep_hook = sleep;
     clock_context = context;

@@ -2,8 +2,6 @@
 // arguments, what is missing, and the caller's messages while the library yields.
 #include <gtest/gtest.h>
 
-#include <dlfcn.h>
-
 #include <algorithm>
 #include <array>
 #include <filesystem>
@@ -18,6 +16,7 @@
 #include "contracts/transport.h"
 #include "platform/message_pump.h"
 #include "simulator.h"
+#include "support/loaded_library.h"
 #include "varnel/clock.h"
 #include "varnel/component_error.h"
 #include "varnel/dll_wrapper.h"
@@ -29,15 +28,10 @@ namespace {
 
 // What the recording library saw last; it is the same loaded copy the transport uses.
 struct Recorder {
-    void* handle = dlopen(RECORDING_TRANSPORT_FULL, RTLD_NOW);
-    ~Recorder() { dlclose(handle); }
-    template <class T>
-    T& get(const char* name) {
-        return *static_cast<T*>(dlsym(handle, name));
-    }
-    const char* const& name = get<const char*>("last_name");
-    const std::intptr_t* args = &get<std::intptr_t>("last_args");
-    const int& count = get<int>("last_count");
+    test::LoadedLibrary library{RECORDING_TRANSPORT_FULL};
+    const char* const& name = library.variable<const char*>("last_name");
+    const std::intptr_t* args = &library.variable<std::intptr_t>("last_args");
+    const int& count = library.variable<int>("last_count");
 };
 
 // The arguments of one call, made fresh per parameter: what the library must
@@ -191,8 +185,8 @@ TEST_F(TransportYield, DueTicksRunWhileTheLibraryYieldsAndTheirErrorsFollowTheCa
 TEST_F(TransportYield, ALoadedLibraryTakesTheCallersClock) {
     auto t = loadTransport(RECORDING_TRANSPORT_FULL);
     Recorder recorder;
-    auto now = reinterpret_cast<std::uint32_t (*)()>(dlsym(recorder.handle, "library_now"));
-    auto sleep = reinterpret_cast<void (*)(std::uint32_t)>(dlsym(recorder.handle, "library_sleep"));
+    auto now = recorder.library.function<std::uint32_t (*)()>("library_now");
+    auto sleep = recorder.library.function<void (*)(std::uint32_t)>("library_sleep");
     clock->advance(4321);
     t->vb_Tickle_Meter(rec);
     EXPECT_EQ(now(), 4321u);

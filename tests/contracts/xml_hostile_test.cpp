@@ -224,7 +224,8 @@ TEST(XMLIndexedAccess, RememberedPlacesFollowChangesAndNavigation) {
     EXPECT_EQ(x.GetChildCount(), 3);
 }
 
-#if !defined(__SANITIZE_ADDRESS__) && !defined(__SANITIZE_THREAD__)
+// Memory limits through fork and setrlimit: POSIX, unsanitized.
+#if !defined(__SANITIZE_ADDRESS__) && !defined(__SANITIZE_THREAD__) && !defined(_WIN32)
 #include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>

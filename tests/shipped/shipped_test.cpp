@@ -25,7 +25,7 @@ XMLWrapper newDoc(std::int32_t kind) {
 // Found from libvarnel's own place whatever the program's run path (sanitizer runtimes ignore it).
 TEST(ShippedLibrary, TheDefaultTransportIsFoundBesideTheComponent) {
     const std::string path = DllWrapper::defaultTransportPath();
-    ASSERT_EQ(path.front(), '/') << path;
+    ASSERT_TRUE(std::filesystem::path(path).is_absolute()) << path;
     EXPECT_TRUE(std::filesystem::equivalent(path, VARNEL_TEST_TRANSPORT_PATH)) << path;
 }
 

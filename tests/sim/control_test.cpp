@@ -1,12 +1,12 @@
 // Injected faults, profile files and the C controls, in-process and in the
 // shared library.
-#include <dlfcn.h>
 
 #include <cctype>
 #include <fstream>
 #include <sstream>
 
 #include "fixture.h"
+#include "support/loaded_library.h"
 #include "support/temp_dir.h"
 #include "varnel/vxsim.h"
 
@@ -149,17 +149,16 @@ TEST_F(Controls, CControlsSelectAttachRenameFailAndReload) {
 }
 
 TEST_F(Controls, SharedLibraryExportsTheTransportAndHasItsOwnSimulator) {
-    void* lib = dlopen(VARNEL_TEST_TRANSPORT_PATH, RTLD_NOW | RTLD_LOCAL);
-    ASSERT_NE(lib, nullptr) << dlerror();
+    const varnel::test::LoadedLibrary lib{VARNEL_TEST_TRANSPORT_PATH};
+    ASSERT_NE(lib.handle, nullptr) << lib.error;
     for (const char* f : {"initialize_meter_structure", "GetMeterDatalogRecordData", "SetTargetRange",
                           "vb_Upload_Meter_Datalog", "convert_to_seconds", "vxsim_last_error", "vx_set_yield_hook"})
-        EXPECT_NE(dlsym(lib, f), nullptr) << f;
-    auto select = reinterpret_cast<decltype(&vxsim_select_type)>(dlsym(lib, "vxsim_select_type"));
-    auto find = reinterpret_cast<decltype(&find_meter)>(dlsym(lib, "find_meter"));
+        EXPECT_NE(lib.function<void*>(f), nullptr) << f;
+    auto select = lib.function<decltype(&vxsim_select_type)>("vxsim_select_type");
+    auto find = lib.function<decltype(&find_meter)>("find_meter");
     ASSERT_TRUE(select && find);
     ASSERT_EQ(select(3), 0);
     ASSERT_EQ(find(&rec, found, ports), ME_SUCCESS);
     EXPECT_EQ(rec.M_Type, eDunmark);
     EXPECT_EQ(meter().type, eMorvex);  // the library's meter is not this program's
-    dlclose(lib);
 }

@@ -1,0 +1,13 @@
+# Shared part of the two mingw-w64 toolchain files: Debian's cross compilers
+# with the posix thread model (std::thread and thread_local need it).
+set(CMAKE_SYSTEM_NAME Windows)
+set(CMAKE_SYSTEM_PROCESSOR ${VARNEL_MINGW_PROCESSOR})
+set(VARNEL_MINGW ${VARNEL_MINGW_PROCESSOR}-w64-mingw32)
+set(CMAKE_C_COMPILER ${VARNEL_MINGW}-gcc-posix)
+set(CMAKE_CXX_COMPILER ${VARNEL_MINGW}-g++-posix)
+set(CMAKE_RC_COMPILER ${VARNEL_MINGW}-windres)
+set(CMAKE_FIND_ROOT_PATH /usr/${VARNEL_MINGW})
+set(CMAKE_FIND_ROOT_PATH_MODE_PROGRAM NEVER)
+set(CMAKE_FIND_ROOT_PATH_MODE_LIBRARY ONLY)
+set(CMAKE_FIND_ROOT_PATH_MODE_INCLUDE ONLY)
+set(CMAKE_FIND_ROOT_PATH_MODE_PACKAGE ONLY)
