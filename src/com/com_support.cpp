@@ -112,7 +112,7 @@ std::wstring modulePath() {
 
 }  // namespace
 
-HRESULT registerServer(std::span<const ClassEntry> classes, REFGUID libid) {
+HRESULT registerServer(const Server& server) {
     std::wstring path = modulePath();
     if (path.empty()) return HRESULT_FROM_WIN32(GetLastError());
     ITypeLib* library = nullptr;
@@ -121,8 +121,8 @@ HRESULT registerServer(std::span<const ClassEntry> classes, REFGUID libid) {
     hr = RegisterTypeLib(library, path.data(), nullptr);
     library->Release();
     if (FAILED(hr)) return hr;
-    const std::wstring lib = guidText(libid);
-    for (const ClassEntry& c : classes) {
+    const std::wstring lib = guidText(*server.libid);
+    for (const ClassEntry& c : server.classes) {
         const std::wstring key = L"CLSID\\" + guidText(*c.clsid);
         LONG r = setValue(HKEY_CLASSES_ROOT, key, nullptr, c.name);
         if (r == ERROR_SUCCESS) r = setValue(HKEY_CLASSES_ROOT, key + L"\\InprocServer32", nullptr, path);
@@ -136,21 +136,21 @@ HRESULT registerServer(std::span<const ClassEntry> classes, REFGUID libid) {
                 r = setValue(HKEY_CLASSES_ROOT, std::wstring(c.progId) + L"\\CLSID", nullptr, guidText(*c.clsid));
         }
         if (r != ERROR_SUCCESS) {
-            unregisterServer(classes, libid);
+            unregisterServer(server);
             return HRESULT_FROM_WIN32(r);
         }
     }
     return S_OK;
 }
 
-HRESULT unregisterServer(std::span<const ClassEntry> classes, REFGUID libid) {
+HRESULT unregisterServer(const Server& server) {
     HRESULT result = S_OK;
     auto remove = [&](const std::wstring& key) {
         const LONG r = RegDeleteTreeW(HKEY_CLASSES_ROOT, key.c_str());
         if (r == ERROR_SUCCESS) RegDeleteKeyW(HKEY_CLASSES_ROOT, key.c_str());
         if (r != ERROR_SUCCESS && r != ERROR_FILE_NOT_FOUND) result = HRESULT_FROM_WIN32(r);
     };
-    for (const ClassEntry& c : classes) {
+    for (const ClassEntry& c : server.classes) {
         remove(L"CLSID\\" + guidText(*c.clsid));
         if (c.progId) remove(c.progId);
     }
@@ -160,7 +160,7 @@ HRESULT unregisterServer(std::span<const ClassEntry> classes, REFGUID libid) {
         TLIBATTR* attr = nullptr;
         if (SUCCEEDED(library->GetLibAttr(&attr))) {
             const HRESULT hr =
-                UnRegisterTypeLib(libid, attr->wMajorVerNum, attr->wMinorVerNum, attr->lcid, attr->syskind);
+                UnRegisterTypeLib(*server.libid, attr->wMajorVerNum, attr->wMinorVerNum, attr->lcid, attr->syskind);
             if (FAILED(hr) && hr != TYPE_E_REGISTRYACCESS) result = hr;
             library->ReleaseTLibAttr(attr);
         }
@@ -172,9 +172,11 @@ HRESULT unregisterServer(std::span<const ClassEntry> classes, REFGUID libid) {
 }  // namespace varnel::detail::com
 
 using varnel::detail::com::moduleUsers;
+using varnel::detail::com::registerServer;
 using varnel::detail::com::thisModule;
+using varnel::detail::com::unregisterServer;
 
-// What every server module exports besides its own classes and registration.
+// What every server module exports.
 extern "C" {
 
 BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID) {
@@ -185,6 +187,18 @@ BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID) {
     return TRUE;
 }
 
+STDAPI DllGetClassObject(REFCLSID clsid, REFIID riid, void** out) {
+    if (!out) return E_POINTER;
+    *out = nullptr;
+    for (const varnel::detail::com::ClassEntry& c : varnel::detail::com::thisServer().classes)
+        if (clsid == *c.clsid) return c.factory(riid, out);
+    return CLASS_E_CLASSNOTAVAILABLE;
+}
+
 STDAPI DllCanUnloadNow() { return moduleUsers() == 0 ? S_OK : S_FALSE; }
+
+STDAPI DllRegisterServer() { return registerServer(varnel::detail::com::thisServer()); }
+
+STDAPI DllUnregisterServer() { return unregisterServer(varnel::detail::com::thisServer()); }
 
 }  // extern "C"

@@ -186,17 +186,27 @@ HRESULT factoryFor(REFIID riid, void** out) {
     return hr;
 }
 
-// One class a server registers.
+// One class a server registers and makes.
 struct ClassEntry {
     const CLSID* clsid;
     const wchar_t* name;    // the coclass name
     const wchar_t* progId;  // null: no ProgID
+    HRESULT (*factory)(REFIID riid, void** out);
 };
+
+// What a server module is: its classes and its embedded type library. Each
+// server defines thisServer(); com_support.cpp exports DllGetClassObject,
+// DllCanUnloadNow, DllRegisterServer and DllUnregisterServer from it.
+struct Server {
+    std::span<const ClassEntry> classes;
+    const GUID* libid;
+};
+const Server& thisServer();
 
 // Registers the classes (InprocServer32 = this module, ThreadingModel
 // Apartment, ProgID, TypeLib) and the embedded type library.
-HRESULT registerServer(std::span<const ClassEntry> classes, REFGUID libid);
+HRESULT registerServer(const Server& server);
 // Removes every key registerServer wrote, and the type library's registration.
-HRESULT unregisterServer(std::span<const ClassEntry> classes, REFGUID libid);
+HRESULT unregisterServer(const Server& server);
 
 }  // namespace varnel::detail::com

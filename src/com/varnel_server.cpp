@@ -260,31 +260,17 @@ class EnumsObject final : public DualObject<_Enums, &IID__Enums> {};
 class MeterRecordObject final : public DualObject<_clsMeterRecord, &IID__clsMeterRecord> {};
 
 constexpr ClassEntry kClasses[] = {
-    {&CLSID_DllWrapper, L"DllWrapper", kWrapperProgId},
-    {&CLSID_UniqueChecker, L"UniqueChecker", kCheckerProgId},
-    {&CLSID_Enums, L"Enums", nullptr},
-    {&CLSID_clsMeterRecord, L"clsMeterRecord", nullptr},
+    {&CLSID_DllWrapper, L"DllWrapper", kWrapperProgId, factoryFor<WrapperObject>},
+    {&CLSID_UniqueChecker, L"UniqueChecker", kCheckerProgId, factoryFor<CheckerObject>},
+    {&CLSID_Enums, L"Enums", nullptr, factoryFor<EnumsObject>},
+    {&CLSID_clsMeterRecord, L"clsMeterRecord", nullptr, factoryFor<MeterRecordObject>},
 };
 
 }  // namespace
-}  // namespace varnel::detail::com
 
-using namespace varnel::detail::com;
-
-extern "C" {
-
-STDAPI DllGetClassObject(REFCLSID clsid, REFIID riid, void** out) {
-    if (!out) return E_POINTER;
-    *out = nullptr;
-    if (clsid == CLSID_DllWrapper) return factoryFor<WrapperObject>(riid, out);
-    if (clsid == CLSID_UniqueChecker) return factoryFor<CheckerObject>(riid, out);
-    if (clsid == CLSID_Enums) return factoryFor<EnumsObject>(riid, out);
-    if (clsid == CLSID_clsMeterRecord) return factoryFor<MeterRecordObject>(riid, out);
-    return CLASS_E_CLASSNOTAVAILABLE;
+const Server& thisServer() {
+    static const Server server{kClasses, &LIBID_Varnel};
+    return server;
 }
 
-STDAPI DllRegisterServer() { return registerServer(kClasses, LIBID_Varnel); }
-
-STDAPI DllUnregisterServer() { return unregisterServer(kClasses, LIBID_Varnel); }
-
-}  // extern "C"
+}  // namespace varnel::detail::com

@@ -102,23 +102,13 @@ private:
     XMLWrapper doc_;
 };
 
-constexpr ClassEntry kClasses[] = {{&CLSID_XMLWrapper, L"XMLWrapper", kProgId}};
+constexpr ClassEntry kClasses[] = {{&CLSID_XMLWrapper, L"XMLWrapper", kProgId, factoryFor<XmlObject>}};
 
 }  // namespace
-}  // namespace varnel::detail::com
 
-using namespace varnel::detail::com;
-
-extern "C" {
-
-STDAPI DllGetClassObject(REFCLSID clsid, REFIID riid, void** out) {
-    if (!out) return E_POINTER;
-    *out = nullptr;
-    return clsid == CLSID_XMLWrapper ? factoryFor<XmlObject>(riid, out) : CLASS_E_CLASSNOTAVAILABLE;
+const Server& thisServer() {
+    static const Server server{kClasses, &LIBID_VarnelXML};
+    return server;
 }
 
-STDAPI DllRegisterServer() { return registerServer(kClasses, LIBID_VarnelXML); }
-
-STDAPI DllUnregisterServer() { return unregisterServer(kClasses, LIBID_VarnelXML); }
-
-}  // extern "C"
+}  // namespace varnel::detail::com
