@@ -295,7 +295,8 @@ TEST(XMLWrapperTest, SaveFileAndLoadFile) {
 
     const std::string before = x.XML();
     expectError([&] { x.LoadFile((dir.path / "missing.xml").string()); }, errc::document_failure, "missing.xml");
-    expectError([&] { x.LoadFile(dir.path.string()); }, errc::document_failure, "cannot read");
+    // A directory: opened but unreadable on POSIX, not even opened on Windows.
+    expectError([&] { x.LoadFile(dir.path.string()); }, errc::document_failure, "LoadFile: cannot ");
     EXPECT_FALSE(x.LoadFile(dir.file("bad.xml", "<R><A></R>")));
     EXPECT_NE(x.LastLoadError(), "");
     EXPECT_FALSE(x.LoadFile(dir.file("utf16.xml", std::string("\xFF\xFE<\0R\0/\0>\0", 10))));
