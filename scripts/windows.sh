@@ -4,7 +4,8 @@
 # dpkg-dev for unpacking pugixml's source package), cross-builds the 32-bit
 # shipping target into build-win-i686/ and the 64-bit one into
 # build-win-x86_64/ (warnings are errors; DLLs and programs in bin/ of each),
-# and runs the x86_64 test programs under Wine. The i686 build (what ships,
+# and runs the x86_64 test programs under Wine, the COM servers' among them
+# (registration, clients, and the differential against the Linux build/). The i686 build (what ships,
 # with the compile-time checks of the record layouts) is not run: this machine
 # cannot run 32-bit Windows code.
 set -euo pipefail
@@ -22,7 +23,12 @@ build() {
   echo "== Windows $arch build: $((SECONDS - start)) s"
 }
 
-build x86_64
+# The differential's Linux client, built in the Linux build folder, whose
+# output the Windows client's under Wine must equal.
+[ -f build/CMakeCache.txt ] || cmake -S . -B build -DVARNEL_WERROR=ON >/dev/null
+cmake --build build -j"$jobs" --target com_differential >&2
+
+build x86_64 -DVARNEL_LINUX_BUILD="$PWD/build"
 # What ships, without the test programs (they cannot run here); one fetch of
 # pugixml's source serves both builds.
 build i686 -DVARNEL_BUILD_TESTS=OFF -DVARNEL_PUGIXML_SOURCE_DIR="$PWD/build-win-x86_64/debian-sources/pugixml"

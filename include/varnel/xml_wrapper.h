@@ -17,6 +17,7 @@ namespace varnel {
 
 namespace detail {
 class XmlAppender;
+struct XmlDocumentAccess;
 }
 
 /**
@@ -224,6 +225,7 @@ public:
 
 private:
     friend class detail::XmlAppender;
+    friend struct detail::XmlDocumentAccess;
     struct Impl;
     std::unique_ptr<Impl> impl_;  // null only after a move: an empty document
     Impl& edit();                 // makes an Impl for a moved-from object

@@ -30,17 +30,6 @@ struct varnel_component {
 namespace varnel::detail {
 namespace {
 
-// What the client reads after an unexpected error: the routine trace, ending
-// with the reason the error first arose with. Only an error raised through the
-// handler protocol has its reason in the shared error; any other is its own text.
-std::string errorText(const CaughtError& caught) {
-    const IError& shared = errPropagator().error();
-    std::string text = caught.description;
-    if (caught.description != shared.ErrorTrace || shared.Reason.empty()) return text;
-    if (!text.ends_with(shared.Reason)) text += shared.Reason;
-    return text;
-}
-
 // Runs one request on c: a missing argument is ME_BAD_PARAMETER; an error
 // leaving the request is kept on c and answered with the code the request's
 // handler reports (ME_UNKNOWN).
@@ -57,7 +46,7 @@ std::int32_t request(varnel_component* c, bool argumentsPresent, F&& body) {
         try {
             const CaughtError caught = currentError();
             c->errorNumber = caught.number;
-            c->errorText = errorText(caught);
+            c->errorText = clientErrorText(caught);
         } catch (...) {
             // Memory ran out while describing the error: the number alone still tells.
             c->errorNumber = errc::internal;
@@ -107,9 +96,9 @@ char* copyOf(const std::string& text) {
 using varnel::DllWrapper;
 using varnel::XMLWrapper;
 using varnel::detail::copyOf;
+using varnel::detail::reportingCheck;
 using varnel::detail::request;
 using varnel::detail::shielded;
-using varnel::detail::reportingCheck;
 
 extern "C" {
 

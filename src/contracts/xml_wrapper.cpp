@@ -35,6 +35,7 @@
 #include <utility>
 #include <vector>
 
+#include "contracts/xml_document.h"
 #include "contracts/xml_index_steps.h"
 #include "contracts/xml_wrapper_append.h"
 #include "varnel/component_error.h"
@@ -280,6 +281,7 @@ struct StringWriter : pugi::xml_writer {
 }  // namespace
 
 struct XMLWrapper::Impl {
+    std::shared_ptr<detail::XmlDocument> foreign;  // set: every operation is its
     pugi::xml_document doc;
     pugi::xml_node current;
     pugi::xml_node lastAdded;
@@ -312,8 +314,8 @@ struct XMLWrapper::Impl {
     mutable std::size_t measuredDepth = 0;
 
     static std::uint64_t nameBit(std::string_view name) {
-        const std::size_t h = name.size() * 31 + static_cast<unsigned char>(name.front()) * 7 +
-                              static_cast<unsigned char>(name.back());
+        const std::size_t h =
+            name.size() * 31 + static_cast<unsigned char>(name.front()) * 7 + static_cast<unsigned char>(name.back());
         return std::uint64_t(1) << (h % 64);
     }
     std::size_t depthOfParent(pugi::xml_node parent) const {
@@ -328,7 +330,7 @@ struct XMLWrapper::Impl {
     }
 
     Impl() = default;
-    Impl(const Impl& other) : lastLoadError(other.lastLoadError), size(other.size) {
+    Impl(const Impl& other) : foreign(other.foreign), lastLoadError(other.lastLoadError), size(other.size) {
         doc.reset(other.doc);
         // pugixml copies what it can allocate; a short copy means memory ran out.
         if (writtenSize(root()) != writtenSize(other.root())) throw std::bad_alloc();
@@ -417,8 +419,9 @@ struct XMLWrapper::Impl {
             raise(errc::document_failure, std::string(op) + ": " + quote(name.text) + " would be nested deeper than " +
                                               std::to_string(kXmlMaxDepth) + " levels");
         const bool blank = !value.empty() && value.find_first_not_of(" \t\r\n") == std::string_view::npos;
-        const std::size_t more =
-            elementSize(name.text, depth) + (blank ? cdataSize(value) : plain ? value.size() : textSize(value));
+        const std::size_t more = elementSize(name.text, depth) + (blank   ? cdataSize(value)
+                                                                  : plain ? value.size()
+                                                                          : textSize(value));
         reserve(op, more);
         pugi::xml_node n = allocated(op, (parent ? parent : pugi::xml_node(doc)).append_child(name.c_str()));
         if (cursor.index >= 0 || cursor.count >= 0) cursor = Cursor{};  // forgets the children it knew
@@ -569,6 +572,19 @@ struct XMLWrapper::Impl {
     }
 };
 
+namespace {
+// The other component's document an XMLWrapper hands its operations to; null for a document of ours.
+template <class I>
+detail::XmlDocument* foreignOf(const std::unique_ptr<I>& impl) {
+    return impl ? impl->foreign.get() : nullptr;
+}
+
+// Another component's document has only its sixteen operations.
+void textOperation(const char* op, const detail::XmlDocument* foreign) {
+    if (foreign) raise(errc::document_failure, std::string(op) + ": another component's document has no text here");
+}
+}  // namespace
+
 XMLWrapper::XMLWrapper() : impl_(shielded("XMLWrapper", [] { return std::make_unique<Impl>(); })) {}
 XMLWrapper::~XMLWrapper() = default;
 XMLWrapper::XMLWrapper(const XMLWrapper& other)
@@ -592,21 +608,34 @@ const XMLWrapper::Impl& XMLWrapper::view() const {
 }
 
 void XMLWrapper::AddElement(const std::string& name, const std::string& text) {
-    shielded("AddElement", [&] { edit().addElement(name, text); });
+    shielded("AddElement", [&] {
+        if (auto* f = foreignOf(impl_)) return f->AddElement(name, text);
+        edit().addElement(name, text);
+    });
 }
 
 namespace detail {
 
 void XmlAppender::addElement(const char* name, std::string_view text) {
-    shielded("AddElement", [&] { doc_.edit().addElement(Name(name, true), text); });
+    shielded("AddElement", [&] {
+        if (auto* f = foreignOf(doc_.impl_)) return f->AddElement(name, std::string(text));
+        doc_.edit().addElement(Name(name, true), text);
+    });
 }
 
 void XmlAppender::setAttribute(const char* name, std::string_view value) {
-    shielded("SetAttribute", [&] { doc_.edit().setLastAttribute(Name(name, true), value); });
+    shielded("SetAttribute", [&] {
+        if (auto* f = foreignOf(doc_.impl_)) return f->SetAttribute(name, std::string(value));
+        doc_.edit().setLastAttribute(Name(name, true), value);
+    });
 }
 
 void XmlAppender::setAttributes(std::span<const Attribute> attributes) {
     shielded("SetAttribute", [&] {
+        if (auto* f = foreignOf(doc_.impl_)) {
+            for (const Attribute& a : attributes) f->SetAttribute(a.name, std::string(a.value));
+            return;
+        }
         XMLWrapper::Impl& d = doc_.edit();
         if (attributes.empty()) return;
         const pugi::xml_node element = d.attributeTarget();
@@ -616,32 +645,46 @@ void XmlAppender::setAttributes(std::span<const Attribute> attributes) {
 }
 
 void XmlAppender::addChildElement(const char* name, const char* parentName, std::string_view text) {
-    shielded("AddChildElement", [&] { doc_.edit().addChildElement(Name(name, true), parentName, text); });
+    shielded("AddChildElement", [&] {
+        if (auto* f = foreignOf(doc_.impl_)) return f->AddChildElement(name, parentName, std::string(text));
+        doc_.edit().addChildElement(Name(name, true), parentName, text);
+    });
 }
 
 void XmlAppender::setChildAttribute(const char* name, std::string_view value) {
-    shielded("SetChildAttribute", [&] { doc_.edit().setChildAttribute(Name(name, true), value); });
+    shielded("SetChildAttribute", [&] {
+        if (auto* f = foreignOf(doc_.impl_)) return f->SetChildAttribute(name, std::string(value));
+        doc_.edit().setChildAttribute(Name(name, true), value);
+    });
 }
 
 }  // namespace detail
 
 std::int32_t XMLWrapper::GetChildCount() const {
     return shielded("GetChildCount", [&] {
+        if (auto* f = foreignOf(impl_)) return f->GetChildCount();
         const Impl& d = view();
         return d.childCount(d.cur("GetChildCount"));
     });
 }
 
 void XMLWrapper::SetAttribute(const std::string& name, const std::string& value) {
-    shielded("SetAttribute", [&] { edit().setLastAttribute(name, value); });
+    shielded("SetAttribute", [&] {
+        if (auto* f = foreignOf(impl_)) return f->SetAttribute(name, value);
+        edit().setLastAttribute(name, value);
+    });
 }
 
 void XMLWrapper::AddChildElement(const std::string& name, const std::string& parentName, const std::string& text) {
-    shielded("AddChildElement", [&] { edit().addChildElement(name, parentName, text); });
+    shielded("AddChildElement", [&] {
+        if (auto* f = foreignOf(impl_)) return f->AddChildElement(name, parentName, text);
+        edit().addChildElement(name, parentName, text);
+    });
 }
 
 void XMLWrapper::MoveToRoot() {
     shielded("MoveToRoot", [&] {
+        if (auto* f = foreignOf(impl_)) return f->MoveToRoot();
         Impl& d = edit();
         d.cur("MoveToRoot");
         d.current = d.root();
@@ -650,6 +693,7 @@ void XMLWrapper::MoveToRoot() {
 
 void XMLWrapper::MoveToChild(const std::string& name) {
     shielded("MoveToChild", [&] {
+        if (auto* f = foreignOf(impl_)) return f->MoveToChild(name);
         Impl& d = edit();
         pugi::xml_node c = d.cur("MoveToChild");
         pugi::xml_node n = d.namedChild(c, name);
@@ -660,6 +704,7 @@ void XMLWrapper::MoveToChild(const std::string& name) {
 
 std::string XMLWrapper::GetChildAttribute(const std::string& child, const std::string& attribute) const {
     return shielded("GetChildAttribute", [&] {
+        if (auto* f = foreignOf(impl_)) return f->GetChildAttribute(child, attribute);
         const Impl& d = view();
         return std::string(d.namedChild(d.cur("GetChildAttribute"), child).attribute(attribute.c_str()).value());
     });
@@ -667,24 +712,31 @@ std::string XMLWrapper::GetChildAttribute(const std::string& child, const std::s
 
 std::string XMLWrapper::GetChildAttributeAt(std::int32_t index, const std::string& attribute) const {
     return shielded("GetChildAttributeAt", [&] {
+        if (auto* f = foreignOf(impl_)) return f->GetChildAttributeAt(index, attribute);
         return std::string(view().childAt("GetChildAttributeAt", index).attribute(attribute.c_str()).value());
     });
 }
 
 std::string XMLWrapper::GetChildValue(const std::string& name) const {
     return shielded("GetChildValue", [&] {
+        if (auto* f = foreignOf(impl_)) return f->GetChildValue(name);
         const Impl& d = view();
         return std::string(d.namedChild(d.cur("GetChildValue"), name).text().get());
     });
 }
 
 std::string XMLWrapper::GetChildValueAt(std::int32_t index) const {
-    return shielded("GetChildValueAt",
-                    [&] { return std::string(view().childAt("GetChildValueAt", index).text().get()); });
+    return shielded("GetChildValueAt", [&] {
+        if (auto* f = foreignOf(impl_)) return f->GetChildValueAt(index);
+        return std::string(view().childAt("GetChildValueAt", index).text().get());
+    });
 }
 
 std::string XMLWrapper::GetChildName(std::int32_t index) const {
-    return shielded("GetChildName", [&] { return std::string(view().childAt("GetChildName", index).name()); });
+    return shielded("GetChildName", [&] {
+        if (auto* f = foreignOf(impl_)) return f->GetChildName(index);
+        return std::string(view().childAt("GetChildName", index).name());
+    });
 }
 
 void XMLWrapper::InitDocument(std::int32_t kind) {
@@ -704,6 +756,7 @@ void XMLWrapper::InitDocument(std::int32_t kind) {
         {doc_kind::status, "Status", {}},
     };
     shielded("InitDocument", [&] {
+        if (auto* f = foreignOf(impl_)) return f->InitDocument(kind);
         const Skeleton* s = nullptr;
         for (const Skeleton& k : skeletons)
             if (k.kind == kind) s = &k;
@@ -722,6 +775,7 @@ void XMLWrapper::InitDocument(std::int32_t kind) {
 
 std::int32_t XMLWrapper::CountElements(const std::string& name) const {
     return shielded("CountElements", [&] {
+        if (auto* f = foreignOf(impl_)) return f->CountElements(name);
         pugi::xml_node c = view().cur("CountElements");
         struct Counter : pugi::xml_tree_walker {
             const std::string* name;
@@ -738,11 +792,15 @@ std::int32_t XMLWrapper::CountElements(const std::string& name) const {
 }
 
 void XMLWrapper::SetChildAttribute(const std::string& name, const std::string& value) {
-    shielded("SetChildAttribute", [&] { edit().setChildAttribute(name, value); });
+    shielded("SetChildAttribute", [&] {
+        if (auto* f = foreignOf(impl_)) return f->SetChildAttribute(name, value);
+        edit().setChildAttribute(name, value);
+    });
 }
 
 void XMLWrapper::SelectElement(const std::string& name) {
     shielded("SelectElement", [&] {
+        if (auto* f = foreignOf(impl_)) return f->SelectElement(name);
         Impl& d = edit();
         d.cur("SelectElement");
         std::deque<pugi::xml_node> level{d.root()};
@@ -761,6 +819,7 @@ void XMLWrapper::SelectElement(const std::string& name) {
 
 std::string XMLWrapper::GetRootName() const {
     return shielded("GetRootName", [&] {
+        if (auto* f = foreignOf(impl_)) return f->GetRootName();
         const Impl& d = view();
         d.cur("GetRootName");
         return std::string(d.root().name());
@@ -768,7 +827,10 @@ std::string XMLWrapper::GetRootName() const {
 }
 
 bool XMLWrapper::LoadXML(const std::string& text) {
-    return shielded("LoadXML", [&] { return edit().load(text); });
+    return shielded("LoadXML", [&] {
+        textOperation("LoadXML", foreignOf(impl_));
+        return edit().load(text);
+    });
 }
 
 namespace {
@@ -786,6 +848,7 @@ std::string written(const char* op, const pugi::xml_document& doc, unsigned flag
 
 std::string XMLWrapper::XML() const {
     return shielded("XML", [&]() -> std::string {
+        textOperation("XML", foreignOf(impl_));
         if (!impl_ || !impl_->root()) return {};
         return written("XML", impl_->doc, pugi::format_default | pugi::format_no_declaration, impl_->size);
     });
@@ -793,6 +856,7 @@ std::string XMLWrapper::XML() const {
 
 bool XMLWrapper::LoadFile(const std::string& path) {
     return shielded("LoadFile", [&] {
+        textOperation("LoadFile", foreignOf(impl_));
         std::FILE* f = std::fopen(path.c_str(), "rb");
         if (!f) raise(errc::document_failure, "LoadFile: cannot open " + quote(path));
         std::string text;
@@ -825,6 +889,7 @@ bool XMLWrapper::LoadFile(const std::string& path) {
 
 void XMLWrapper::SaveFile(const std::string& path) const {
     shielded("SaveFile", [&] {
+        textOperation("SaveFile", foreignOf(impl_));
         const Impl& d = view();
         d.cur("SaveFile");
         const std::string text = written("SaveFile", d.doc, pugi::format_default, d.size);
@@ -837,6 +902,20 @@ void XMLWrapper::SaveFile(const std::string& path) const {
 
 std::string XMLWrapper::LastLoadError() const { return impl_ ? impl_->lastLoadError : std::string(); }
 
-bool XMLWrapper::IsEmpty() const { return !impl_ || !impl_->root(); }
+bool XMLWrapper::IsEmpty() const { return !impl_ || (!impl_->foreign && !impl_->root()); }
+
+namespace detail {
+
+struct XmlDocumentAccess {
+    static XMLWrapper over(std::shared_ptr<XmlDocument> document) {
+        XMLWrapper wrapper;
+        wrapper.impl_->foreign = std::move(document);
+        return wrapper;
+    }
+};
+
+XMLWrapper documentOver(std::shared_ptr<XmlDocument> document) { return XmlDocumentAccess::over(std::move(document)); }
+
+}  // namespace detail
 
 }  // namespace varnel

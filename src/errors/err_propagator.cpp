@@ -52,6 +52,14 @@ CaughtError currentError() {
     }
 }
 
+std::string clientErrorText(const CaughtError& caught) {
+    const IError& shared = errPropagator().error();
+    std::string text = caught.description;
+    if (caught.description != shared.ErrorTrace || shared.Reason.empty()) return text;
+    if (!text.ends_with(shared.Reason)) text += shared.Reason;
+    return text;
+}
+
 void propagateCurrent(const char* className, const char* routine, void (*cleanup)(void*, const IError&),
                       void* cleanupContext) {
     CaughtError caught = currentError();

@@ -49,6 +49,12 @@ struct CaughtError {
 };
 CaughtError currentError();
 
+// What a client reads of an error that left a public request: the routine
+// trace, ending with the reason the error first arose with. Only an error
+// raised through the handler protocol has its reason in the shared error; any
+// other is its own text.
+std::string clientErrorText(const CaughtError& caught);
+
 // The handler protocol in one place: records className/routine, runs the
 // routine's clean-up with the error, and raises ComponentError(number, trace).
 [[noreturn]] void propagateCurrent(const char* className, const char* routine,

@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <utility>
 
+#include "contracts/xml_document.h"
 #include "requests/request_context.h"
 #include "support/fake_transport.h"
 #include "support/wrapper_fixture.h"
@@ -129,6 +130,83 @@ TEST_F(Requests, AMissingMeterAndUnexpectedErrors) {
         EXPECT_EQ(completions, 1);
         EXPECT_EQ(closed(), keep != -50);
     }
+}
+
+// Documents of another XML component, reached through the sixteen operations alone
+// (here a document of ours behind that interface, counting its calls).
+struct OtherComponentDoc : detail::XmlDocument {
+    XMLWrapper doc;
+    int calls = 0;
+    std::string failing;  // an operation that fails, as that component reports it
+    void call(const char* op) {
+        ++calls;
+        if (failing == op) throw ComponentError(1004, std::string(op) + ": refused by the other component");
+    }
+    void AddElement(const std::string& n, const std::string& t) override { call("AddElement"), doc.AddElement(n, t); }
+    std::int32_t GetChildCount() override { return call("GetChildCount"), doc.GetChildCount(); }
+    void SetAttribute(const std::string& n, const std::string& v) override {
+        call("SetAttribute"), doc.SetAttribute(n, v);
+    }
+    void AddChildElement(const std::string& n, const std::string& p, const std::string& t) override {
+        call("AddChildElement"), doc.AddChildElement(n, p, t);
+    }
+    void MoveToRoot() override { call("MoveToRoot"), doc.MoveToRoot(); }
+    void MoveToChild(const std::string& n) override { call("MoveToChild"), doc.MoveToChild(n); }
+    std::string GetChildAttribute(const std::string& c, const std::string& a) override {
+        return call("GetChildAttribute"), doc.GetChildAttribute(c, a);
+    }
+    std::string GetChildAttributeAt(std::int32_t i, const std::string& a) override {
+        return call("GetChildAttributeAt"), doc.GetChildAttributeAt(i, a);
+    }
+    std::string GetChildValue(const std::string& n) override { return call("GetChildValue"), doc.GetChildValue(n); }
+    std::string GetChildValueAt(std::int32_t i) override { return call("GetChildValueAt"), doc.GetChildValueAt(i); }
+    std::string GetChildName(std::int32_t i) override { return call("GetChildName"), doc.GetChildName(i); }
+    void InitDocument(std::int32_t k) override { call("InitDocument"), doc.InitDocument(k); }
+    std::int32_t CountElements(const std::string& n) override { return call("CountElements"), doc.CountElements(n); }
+    void SetChildAttribute(const std::string& n, const std::string& v) override {
+        call("SetChildAttribute"), doc.SetChildAttribute(n, v);
+    }
+    void SelectElement(const std::string& n) override { call("SelectElement"), doc.SelectElement(n); }
+    std::string GetRootName() override { return call("GetRootName"), doc.GetRootName(); }
+};
+
+// Every request writes the same documents into another component's objects as
+// into ours, using nothing but the sixteen operations (the text operations of
+// such a document raise); a failing operation is an unexpected error.
+TEST_F(Requests, DocumentsOfAnotherComponentGetTheSameContent) {
+    discover(eParvix);
+    auto other = [](std::int32_t kind) {
+        auto d = std::make_shared<OtherComponentDoc>();
+        d->doc.InitDocument(kind);
+        return d;
+    };
+    auto dev = other(doc_kind::device_info), log = other(doc_kind::datalog), st = other(doc_kind::status);
+    auto conn = other(doc_kind::connection_info);
+    conn->doc = connectionDoc(std::to_string(sim::meter().port));
+    XMLWrapper devDoc = detail::documentOver(dev), logDoc = detail::documentOver(log);
+    XMLWrapper stDoc = detail::documentOver(st), connDoc = detail::documentOver(conn);
+    EXPECT_THROW(logDoc.XML(), ComponentError);
+    ASSERT_EQ(wrapper->discoverDevice(rec, devDoc, connDoc, stDoc), ME_SUCCESS);
+    EXPECT_EQ(dev->doc.XML(), device.XML());
+
+    bool checked = false;
+    XMLWrapper ours = newDoc(doc_kind::datalog), filter = newDoc(doc_kind::filter);
+    ASSERT_EQ(wrapper->getReadings(rec, device, ours, filter, status, checked), ME_SUCCESS);
+    ASSERT_EQ(wrapper->getReadings(rec, devDoc, logDoc, filter, stDoc, checked), ME_SUCCESS);
+    EXPECT_EQ(log->doc.XML(), ours.XML());
+    EXPECT_GT(log->calls, 100);
+
+    fresh();
+    log->doc.InitDocument(doc_kind::datalog);
+    log->failing = "SetAttribute";
+    EXPECT_EQ(unexpectedTrace([&] {
+                  wrapper->getReadings(rec, devDoc, logDoc, filter, stDoc, checked);
+              }).rfind("1004 getReadings --> ", 0),
+              0u);
+    ASSERT_EQ(statusGroups(st->doc).size(), 1u);
+    EXPECT_TRUE(statusGroups(st->doc)[0].starts_with("-17/-16/Unknown status;Error number = 1004 "))
+        << statusGroups(st->doc)[0];
+    EXPECT_EQ(completions, 1);
 }
 
 }  // namespace

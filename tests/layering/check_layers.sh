@@ -4,7 +4,7 @@
 # and system headers are below every folder.
 set -eu
 src=${1:?usage: check_layers.sh SRC_DIR}
-order="errors xmlcheck util platform contracts settings readings session requests exports component capi"
+order="errors xmlcheck util platform contracts settings readings session requests exports component capi com"
 
 find "$src" -type f \( -name '*.h' -o -name '*.cpp' -o -name '*.c' \) | LC_ALL=C sort |
 xargs awk -v order="$order" -v root="${src%/}/" '
