@@ -29,7 +29,8 @@ rebuild is one uncached compile plus the links, and on the shared 2-core
 machine make's own dependency walk took 6 s per mutant and -O2 -g made a
 mutant's compile and links some twice as slow. The first run configures and builds it (some 8 minutes there).
 
-Each folder runs its own test program plus the programs that drive it through
+Each folder runs the test program holding its tests (read from
+tests/CMakeLists.txt, so merged programs are followed) plus the programs that drive it through
 whole requests: test_requests and the fault sweep (test_faults) for the layers
 below the requests, test_component and test_capi above. The command's,
 schemas', capture and packaging tests start processes or replay recordings
@@ -51,19 +52,19 @@ import time
 from pathlib import Path
 
 ROOT = Path(__file__).resolve().parent.parent
-# src folder -> test programs run for a mutant in it.
+# src folder -> the tests/ folders whose programs are run for a mutant in it.
 FOLDER_TESTS = {
-    "errors": ["test_errors", "test_component", "test_capi", "test_requests"],
-    "xmlcheck": ["test_contracts", "test_requests"],
-    "util": ["test_util", "test_readings", "test_requests", "test_faults"],
-    "platform": ["test_platform", "test_component", "test_requests"],
-    "contracts": ["test_contracts", "test_requests", "test_faults"],
-    "settings": ["test_settings", "test_requests", "test_faults"],
-    "readings": ["test_readings", "test_requests", "test_faults"],
-    "session": ["test_session", "test_requests", "test_faults"],
-    "requests": ["test_requests", "test_faults", "test_component"],
-    "component": ["test_component", "test_capi", "test_faults"],
-    "capi": ["test_capi"],
+    "errors": ["errors", "component", "capi", "requests"],
+    "xmlcheck": ["contracts", "requests"],
+    "util": ["util", "readings", "requests", "faults"],
+    "platform": ["platform", "component", "requests"],
+    "contracts": ["contracts", "requests", "faults"],
+    "settings": ["settings", "requests", "faults"],
+    "readings": ["readings", "requests", "faults"],
+    "session": ["session", "requests", "faults"],
+    "requests": ["requests", "faults", "component"],
+    "component": ["component", "capi", "faults"],
+    "capi": ["capi"],
 }
 TEST_TIMEOUT = 60
 BUILD_TIMEOUT = 900
@@ -81,6 +82,20 @@ STMT_SKIP_RE = re.compile(r"^\s*(return|break|continue|goto|case|default|using|t
 RET_RE = re.compile(r"\breturn\s+(true|false|-?\d+)\s*;")
 DECL_RE = re.compile(r"^\s*(const\s+)?[\w:<>]+[\s&*]+\w+\s*=")  # if (auto x = ...) is not negated
 CODE_RE = re.compile(r"\bME_[A-Z_]+\b")
+
+
+def test_programs():
+    """tests/ folder -> the test program holding its sources, from tests/CMakeLists.txt
+    (a program may hold several folders: varnel_test(name folder/x.cpp ...))."""
+    programs = {}
+    for name, sources in re.findall(r"varnel_test\((\w+)([^)]*)\)", (ROOT / "tests/CMakeLists.txt").read_text()):
+        for source in sources.split():
+            programs[source.split("/")[0] if "/" in source else name] = "test_" + name
+    return programs
+
+
+def programs_for(path, programs):
+    return list(dict.fromkeys(programs[f] for f in FOLDER_TESTS[Path(path).parts[1]] if f in programs))
 
 
 def masked_lines(text):
@@ -207,9 +222,9 @@ def build(build_dir, targets):
     return rc == 0, out
 
 
-def verdict(mutant, build_dir):
+def verdict(mutant, build_dir, programs):
     path, no, kind, col, before, after = mutant
-    tests = FOLDER_TESTS[Path(path).parts[1]]
+    tests = programs_for(path, programs)
     f = ROOT / path
     original = f.read_bytes()
     lines = original.decode().split("\n")
@@ -271,7 +286,8 @@ def main():
                         "-DCMAKE_BUILD_TYPE=RelWithDebInfo"] +
                        [f"-DCMAKE_{lang}_FLAGS_RELWITHDEBINFO=-O1 -DNDEBUG" for lang in ("C", "CXX")] +
                        ["-DVARNEL_WERROR=ON", "-DVARNEL_BUILD_BENCHMARKS=OFF"], check=True, stdout=subprocess.DEVNULL)
-    needed = sorted({t for m in mutants for t in FOLDER_TESTS[Path(m[0]).parts[1]]})
+    programs = test_programs()
+    needed = sorted({t for m in mutants for t in programs_for(m[0], programs)})
     ok, log = build(build_dir, needed)
     if not ok:
         sys.stderr.write(log + "\nThe unmutated tree does not build.\n")
@@ -279,7 +295,7 @@ def main():
     counts, survivors, start = {"killed": 0, "survived": 0, "no-compile": 0}, [], time.time()
     for i, m in enumerate(mutants, 1):
         t0 = time.time()
-        v, why = verdict(m, build_dir)
+        v, why = verdict(m, build_dir, programs)
         counts[v] += 1
         if v == "survived":
             survivors.append(m)
