@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <set>
 #include <stdexcept>
 
 #include "errors/err_propagator.h"
@@ -49,4 +50,11 @@ TEST(ErrorDescription, CodesWithoutATextAreUnknownStatus) {
     for (long long code :
          {-40LL, -37LL, -24LL, -16LL, -12LL, -10LL, -5LL, 1LL, 2LL, 32767LL, -32768LL, 65536LL - 17, 0x100000000LL})
         EXPECT_EQ(ErrorDescription(code), "Unknown status") << code;
+}
+
+// Every other code from 0 to -36 has a text of its own.
+TEST(ErrorDescription, EveryOtherCodeOfTheEnumHasItsText) {
+    const std::set<long long> none{-5, -10, -12, -16, -24};
+    for (long long code = -36; code <= 0; ++code)
+        EXPECT_TRUE(none.contains(code) || ErrorDescription(code) != "Unknown status") << code;
 }

@@ -144,3 +144,18 @@ TEST_F(Conversion, TwoDigitYearWindow) {
     for (int i = 0; i < 3; ++i)
         EXPECT_EQ(results.Item(i + 1)->DateTime(), *DateTime::fromParts(i == 1 ? 1930 : years[i], 12, 31, 23, 58, 59));
 }
+
+// Codes a record carries: the exercise label as a comment on its glucose result
+// (none past the three labels), microalbumin and the visit as result types.
+TEST_F(Conversion, RecordCodesBecomeCommentsAndResultTypes) {
+    for (std::int16_t label : {1, 3, 4}) add(VX_REC_GLUCOSE, 1, [&](auto& r) { r.reading = 120, r.exerciseLabel = label; });
+    add(VX_REC_MICROALBUMIN, 2, [](auto& r) { r.microalbumin = 0; });
+    add(VX_REC_LAST_VISIT, 3, [](auto& r) { r.visit = 2; });
+    ASSERT_TRUE(convertBinary());
+    EXPECT_EQ(column(), (Types{10, 10, 10, 121, 162}));
+    auto comment = [&](int i) {
+        const auto comments = at<Glucose>(i).Comments();
+        return comments->Count() == 1 ? comments->Item(1)->Id() : comments->Count() == 0 ? 0 : -1;
+    };
+    EXPECT_EQ(std::tuple(comment(1), comment(2), comment(3)), std::tuple(11, 12, 0));
+}
