@@ -86,7 +86,6 @@ TEST_F(TransportYield, DueTicksRunWhileTheLibraryYieldsItsErrorsFollowTheCallAnd
     auto later = std::make_shared<ManualClock>(90000);
     setThreadClock(later);  // a clock set later is followed too
     EXPECT_EQ(now(), 90000u);
-    dlclose(handle);
 }
 
 }  // namespace
