@@ -42,12 +42,6 @@ const Library sim(VARNEL_TEST_TRANSPORT_PATH), recorder(VARNEL_RECORD_PATH), rep
 using varnel::test::Call;
 using Steps = std::vector<Call>;
 
-XMLWrapper doc(std::int32_t kind) {
-    XMLWrapper d;
-    d.InitDocument(kind);
-    return d;
-}
-
 // A virtual clock that also adds up every wait, past the 32-bit wrap.
 std::uint64_t slept = 0;
 struct CountingClock : varnel::ManualClock {
@@ -135,7 +129,7 @@ void writeLines(const fs::path& file, const Lines& lines) {
     for (const std::string& l : lines) out << l << '\n';
 }
 
-// What the client saw of a step: "step <n> code <code> check <flag>".
+// What the client saw of a step: "step <n> code <code>".
 std::string stepLine(const Lines& seen, Call step) {
     const std::string prefix = "step " + std::to_string(int(step)) + " ";
     for (const std::string& l : seen)
@@ -257,7 +251,7 @@ TEST(Capture, ReplayReadsAndWaitsWithinItsLimits) {
     fs::remove(big);
 
     const fs::path file = scratch("timing");
-    const Steps steps{Step::Discover, Step::Readings, Step::Close};
+    const Steps steps{Call::discover, Call::readings, Call::close};
     const Lines live = record(2, steps, file);
     const std::uint64_t recorded = slept;
     ASSERT_GT(recorded, 1000u);
@@ -290,7 +284,7 @@ TEST(Capture, RecorderGuardsItsFileAndTheMeter) {
     }
     std::ofstream(file) << "an older capture";
     fs::permissions(file, fs::perms(0644));
-    record(1, {Step::Discover, Step::Close}, file);
+    record(1, {Call::discover, Call::close}, file);
     EXPECT_EQ(fs::status(file).permissions() & fs::perms::all, fs::perms::owner_read | fs::perms::owner_write);
 
     // The disk fills after the header: nothing more is recorded, but close_meter still reaches the meter.
@@ -301,12 +295,12 @@ TEST(Capture, RecorderGuardsItsFileAndTheMeter) {
     small.rlim_cur = 600;
     ::setrlimit(RLIMIT_FSIZE, &small);
     ASSERT_EQ(start(VARNEL_TEST_TRANSPORT_PATH, file.c_str()), 0) << recordError();
-    const Lines seen = runSession(VARNEL_RECORD_PATH, {Step::Discover, Step::Close});
+    const Lines seen = runSession(VARNEL_RECORD_PATH, {Call::discover, Call::close});
     ::setrlimit(RLIMIT_FSIZE, &saved);
     std::signal(SIGXFSZ, oldHandler);
     EXPECT_NE(recordError().find("cannot write the capture file"), std::string::npos) << recordError();
     EXPECT_NE(recordError().find("close_meter was passed on to release the meter, unrecorded"), std::string::npos);
-    EXPECT_EQ(stepLine(seen, Step::Close), "step 6 code 0 check 1");
+    EXPECT_EQ(stepLine(seen, Call::close), "step 8 code 0");
     fs::remove(file);
 }
 
