@@ -1,7 +1,4 @@
-// Injected faults, profile files and the C controls, in-process and in the
-// shared library.
-#include <dlfcn.h>
-
+// Injected faults and the C controls.
 #include "fixture.h"
 #include "support/temp_dir.h"
 #include "varnel/vxsim.h"
@@ -67,32 +64,6 @@ TEST_F(Faults, NthCallFailsOnceOrFromThenOnAndBadRequestsAreRefused) {
         EXPECT_THROW(injectFault(function, nth, std::int16_t(code), false), std::invalid_argument) << function << nth;
 }
 
-using Profiles = SimTest;
-
-TEST_F(Profiles, ShippedFilesAreTheDefaultMetersAndWrittenOnesReadBackEqual) {
-    for (int type = 1; type <= 8; ++type) {
-        const std::string path = std::string(VARNEL_SOURCE_DIR) + "/sim/profiles/type" + std::to_string(type) + ".xml";
-        EXPECT_EQ(readProfileFile(path), defaultProfile(type)) << type;
-    }
-    MeterProfile p = defaultProfile(7);
-    p.port = 3;
-    p.identitySerial = "00";
-    p.attached = false;
-    p.corruptedRecords = {0, 9};
-    p.insulinNames[11].bytes = std::string("\x01\xE9\x7F", 3);  // unprintable bytes survive too
-    p.oralMedNames[7].bytes = "K\xF6ln";
-    p.binaryDatalog[3] = RECORD_DATA{};
-    p.binaryDatalog[3].recType = 77;  // a type the conversion does not know
-    p.binaryDatalog[3].timeStamp = p.binaryDatalog[2].timeStamp;
-    MeterProfile records = defaultProfile(2);
-    records.datalog[0].Test.Medication = 0.1;
-    TempDir dir;
-    for (const MeterProfile& written : {p, records}) {
-        writeProfileFile(written, dir.file("meter.xml"));
-        EXPECT_EQ(readProfileFile(dir.file("meter.xml")), written) << written.type;
-    }
-}
-
 using Controls = SimTest;
 
 TEST_F(Controls, CControlsSelectAttachRenameFailAndReload) {
@@ -122,17 +93,4 @@ TEST_F(Controls, CControlsSelectAttachRenameFailAndReload) {
     EXPECT_EQ(meter().type, eMorvex);
     ASSERT_EQ(vxsim_load_profile(saved.c_str()), ME_SUCCESS);
     EXPECT_EQ(meter().serial, "QLB40088300");
-}
-
-TEST_F(Controls, SharedLibraryExportsTheTransportAndHasItsOwnSimulator) {
-    void* lib = dlopen(VARNEL_TEST_TRANSPORT_PATH, RTLD_NOW | RTLD_LOCAL);
-    ASSERT_NE(lib, nullptr) << dlerror();
-    auto select = reinterpret_cast<decltype(&vxsim_select_type)>(dlsym(lib, "vxsim_select_type"));
-    auto find = reinterpret_cast<decltype(&find_meter)>(dlsym(lib, "find_meter"));
-    ASSERT_TRUE(select && find);
-    ASSERT_EQ(select(3), 0);
-    ASSERT_EQ(find(&rec, found, ports), ME_SUCCESS);
-    EXPECT_EQ(rec.M_Type, eDunmark);
-    EXPECT_EQ(meter().type, eMorvex);  // the library's meter is not this program's
-    dlclose(lib);
 }
