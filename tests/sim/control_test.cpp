@@ -1,4 +1,6 @@
-// Injected faults and the C controls.
+// Injected faults and the C controls, in-process and in the shared library.
+#include <dlfcn.h>
+
 #include "fixture.h"
 #include "support/temp_dir.h"
 #include "varnel/vxsim.h"
@@ -51,13 +53,6 @@ TEST_F(Faults, NthCallFailsOnceOrFromThenOnAndBadRequestsAreRefused) {
     clearFaults();
     EXPECT_EQ(vb_Read_Meter_Options(&rec), ME_SUCCESS);
 
-    // Calls without a meter record fail too.
-    injectFault("convert_from_seconds", 1, ME_FAIL, false);
-    injectFault("GetMeterDatalogRecordData", 1, ME_COMP_FAIL, false);
-    TIME_REC t{};
-    RECORD_DATA r{};
-    EXPECT_EQ(convert_from_seconds(0, &t), ME_FAIL);
-    EXPECT_EQ(GetMeterDatalogRecordData(nullptr, 0, &r), ME_COMP_FAIL);
     // Only functions that report a status fail, from the first call on, with a negative code.
     for (auto [function, nth, code] :
          {std::tuple{"convert_to_seconds", 1, -17}, {"vb_Chk4Meter", 0, -17}, {"vb_Chk4Meter", 1, 0}})
@@ -93,4 +88,17 @@ TEST_F(Controls, CControlsSelectAttachRenameFailAndReload) {
     EXPECT_EQ(meter().type, eMorvex);
     ASSERT_EQ(vxsim_load_profile(saved.c_str()), ME_SUCCESS);
     EXPECT_EQ(meter().serial, "QLB40088300");
+}
+
+TEST_F(Controls, SharedLibraryExportsTheTransportAndHasItsOwnSimulator) {
+    void* lib = dlopen(VARNEL_TEST_TRANSPORT_PATH, RTLD_NOW | RTLD_LOCAL);
+    ASSERT_NE(lib, nullptr) << dlerror();
+    auto select = reinterpret_cast<decltype(&vxsim_select_type)>(dlsym(lib, "vxsim_select_type"));
+    auto find = reinterpret_cast<decltype(&find_meter)>(dlsym(lib, "find_meter"));
+    ASSERT_TRUE(select && find);
+    ASSERT_EQ(select(3), 0);
+    ASSERT_EQ(find(&rec, found, ports), ME_SUCCESS);
+    EXPECT_EQ(rec.M_Type, eDunmark);
+    EXPECT_EQ(meter().type, eMorvex);  // the library's meter is not this program's
+    dlclose(lib);
 }
