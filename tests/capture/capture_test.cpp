@@ -41,6 +41,7 @@ struct Library {
 const Library sim(VARNEL_TEST_TRANSPORT_PATH), recorder(VARNEL_RECORD_PATH), replayer(VARNEL_REPLAY_PATH);
 
 using varnel::test::Call;
+using varnel::test::newDoc;
 using varnel::test::TempDir;
 using Steps = std::vector<Call>;
 
@@ -65,11 +66,9 @@ Lines runSession(const std::string& transport, const Steps& steps) {
         w.setOnProgress([&](std::int16_t& p) { seen.push_back("progress " + std::to_string(p)); });
         w.setOnComplete([&] { seen.push_back("complete"); });
         METER_REC rec{};
-        XMLWrapper device, settings;
-        device.InitDocument(varnel::doc_kind::device_info);
+        XMLWrapper device = newDoc(varnel::doc_kind::device_info), settings;
         for (Call step : steps) {
-            XMLWrapper status, out = settings;
-            status.InitDocument(varnel::doc_kind::status);
+            XMLWrapper status = newDoc(varnel::doc_kind::status), out = settings;
             std::int32_t code = 0;
             try {
                 code = varnel::test::makeCall(w, step, rec, device, status, out);
@@ -104,10 +103,7 @@ Lines record(int type, const Steps& steps, const fs::path& file, const char* fau
 // Replays a capture under the steps, keeping the recorded times unless `timed` is false;
 // `finished` tells whether every recorded call was asked for.
 Lines replay(const fs::path& file, const Steps& steps, bool* finished = nullptr, bool timed = true) {
-    if (timed)
-        ::setenv("VARNEL_REPLAY_TIMING", "recorded", 1);
-    else
-        ::unsetenv("VARNEL_REPLAY_TIMING");
+    timed ? ::setenv("VARNEL_REPLAY_TIMING", "recorded", 1) : ::unsetenv("VARNEL_REPLAY_TIMING");
     replayer.fn<decltype(vxcap_replay_start)>("vxcap_replay_start")(file.c_str());
     Lines seen = runSession(VARNEL_REPLAY_PATH, steps);
     const int end = replayer.fn<decltype(vxcap_replay_finish)>("vxcap_replay_finish")();
