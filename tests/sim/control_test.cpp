@@ -1,5 +1,4 @@
-// Injected faults, profile files and the C controls, in-process and in the
-// shared library.
+// Injected faults and the C controls, in-process and in the shared library.
 
 #include "fixture.h"
 #include "support/loaded_library.h"
@@ -54,43 +53,10 @@ TEST_F(Faults, NthCallFailsOnceOrFromThenOnAndBadRequestsAreRefused) {
     clearFaults();
     EXPECT_EQ(vb_Read_Meter_Options(&rec), ME_SUCCESS);
 
-    // Calls without a meter record fail too.
-    injectFault("convert_from_seconds", 1, ME_FAIL, false);
-    injectFault("GetMeterDatalogRecordData", 1, ME_COMP_FAIL, false);
-    TIME_REC t{};
-    RECORD_DATA r{};
-    EXPECT_EQ(convert_from_seconds(0, &t), ME_FAIL);
-    EXPECT_EQ(GetMeterDatalogRecordData(nullptr, 0, &r), ME_COMP_FAIL);
     // Only functions that report a status fail, from the first call on, with a negative code.
     for (auto [function, nth, code] :
          {std::tuple{"convert_to_seconds", 1, -17}, {"vb_Chk4Meter", 0, -17}, {"vb_Chk4Meter", 1, 0}})
         EXPECT_THROW(injectFault(function, nth, std::int16_t(code), false), std::invalid_argument) << function << nth;
-}
-
-using Profiles = SimTest;
-
-TEST_F(Profiles, ShippedFilesAreTheDefaultMetersAndWrittenOnesReadBackEqual) {
-    for (int type = 1; type <= 8; ++type) {
-        const std::string path = std::string(VARNEL_SOURCE_DIR) + "/sim/profiles/type" + std::to_string(type) + ".xml";
-        EXPECT_EQ(readProfileFile(path), defaultProfile(type)) << type;
-    }
-    MeterProfile p = defaultProfile(7);
-    p.port = 3;
-    p.identitySerial = "00";
-    p.attached = false;
-    p.corruptedRecords = {0, 9};
-    p.insulinNames[11].bytes = std::string("\x01\xE9\x7F", 3);  // unprintable bytes survive too
-    p.oralMedNames[7].bytes = "K\xF6ln";
-    p.binaryDatalog[3] = RECORD_DATA{};
-    p.binaryDatalog[3].recType = 77;  // a type the conversion does not know
-    p.binaryDatalog[3].timeStamp = p.binaryDatalog[2].timeStamp;
-    MeterProfile records = defaultProfile(2);
-    records.datalog[0].Test.Medication = 0.1;
-    TempDir dir;
-    for (const MeterProfile& written : {p, records}) {
-        writeProfileFile(written, dir.file("meter.xml"));
-        EXPECT_EQ(readProfileFile(dir.file("meter.xml")), written) << written.type;
-    }
 }
 
 using Controls = SimTest;

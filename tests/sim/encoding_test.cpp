@@ -78,7 +78,7 @@ TEST(BinaryDatalog, DefaultMeterLogDecodesRecordByRecord) {
     }
 }
 
-TEST(BinaryDatalog, FillsTheWholeBufferAndRefusesOneRecordMore) {
+TEST(BinaryDatalog, FillsTheWholeBufferAndRefusesWhatItCannotHold) {
     std::vector<RECORD_DATA> records;
     const std::size_t one = encodedSize({glucose(0, 0)}) - encodedSize({});
     while (encodedSize(records) + one <= sizeof(METER_BIN_DATALOG::binBuf))
@@ -90,15 +90,13 @@ TEST(BinaryDatalog, FillsTheWholeBufferAndRefusesOneRecordMore) {
     EXPECT_TRUE(same(last, records.back()));
     records.push_back(glucose(99, 0));
     EXPECT_THROW(encodeBinaryDatalog(records, *log), std::length_error);
-}
 
-TEST(BinaryDatalog, RefusesValuesItCannotHoldExactlyAndNamesTheRecord) {
+    // Values it cannot hold exactly are refused, naming the record.
     RECORD_DATA flagged = glucose(100, 1), fraction{}, foreign{}, missing{};
     flagged.stressFlag = 300;                                           // beyond one byte
     fraction.recType = VX_REC_INSULIN, fraction.insulinDosage = 2.125;  // more than two decimals
     foreign.recType = VX_REC_INSULIN, foreign.carbs = 5;                // not carried by this type
     missing.recType = VX_REC_INSULIN, missing.insulinDosage = -1.0;     // held: a missing value
-    auto log = std::make_unique<METER_BIN_DATALOG>();
     for (const RECORD_DATA& r : {fraction, foreign})
         EXPECT_THROW(encodeBinaryDatalog({r}, *log), std::invalid_argument);
     EXPECT_THAT(

@@ -1,7 +1,7 @@
 // The simulated meter as the component meets it: identification, options,
-// clock, the type-7 tables and the datalogs.
+// clock, refusals and the datalogs (the type-7 tables are met through the
+// settings groups and the settings requests).
 #include <algorithm>
-#include <array>
 
 #include "fixture.h"
 
@@ -36,7 +36,6 @@ TEST_F(MeterIdentification, AnswersOnItsPortWhileAttachedAndCloseReleasesThePort
     ASSERT_EQ(vb_Chk4Meter(&rec), ME_SUCCESS);
     EXPECT_EQ(rec.M_Type, eMorvex);  // the meter says what it is
     EXPECT_TRUE(rec.port.Id > 0 && portOpen());
-
 }
 
 using MeterSettings = SimTest;
@@ -111,27 +110,6 @@ TEST_F(MeterSettings, TheMeterClockFollowsWhicheverClockTheCallerHandsOver) {
     EXPECT_EQ(read(), held);
 }
 
-TEST_F(MeterSettings, Type7TablesReadBackAndNamesAreHeldAsBytes) {
-    connect(7);
-    const std::string full("Basal\xE9" "1234", 10);  // fills the field: no zero byte
-    INSULIN_OR_ORAL_MED_NAME_TYPE name{21, 0, {}}, back{21, 1, {}};
-    std::memcpy(name.nameStr, full.data(), 10);
-    PREDEFINED_ORAL_MEDS_TYPE meds{{15, 0, 0, 0, 2}}, medsBack{};
-    MEAL_SEGMENTS_TYPE seg{{0, 0, 50, 0, 0, 0, 0}}, segBack{};
-    // Called in order: each read follows its write.
-    const std::vector<int> codes = {SetInsulinName(&rec, &name),         GetInsulinName(&rec, &back),
-                                    SetPredefinedOralMeds(&rec, &meds),  GetPredefinedOralMeds(&rec, &medsBack),
-                                    SetMealSegments(&rec, &seg),         GetMealSegments(&rec, &segBack),
-                                    SetTargetRange(&rec, 65, 140, 90, 200, 55)};
-    ASSERT_EQ(codes, std::vector<int>(codes.size(), ME_SUCCESS));
-    EXPECT_EQ(std::tuple(text(back.nameStr), back.notChangeable), std::tuple(full, 0));
-    EXPECT_EQ(std::memcmp(&medsBack, &meds, sizeof meds), 0);
-    // Only the segments sent (non-zero) change.
-    EXPECT_EQ(std::vector<int>(segBack.mealSegments, segBack.mealSegments + 7),
-              (std::vector<int>{24, 36, 50, 54, 70, 80, 88}));
-    EXPECT_EQ(meter().targets, (TargetLimits{65, 140, 90, 200, 55}));
-}
-
 TEST_F(MeterSettings, RefusalsChangeNothing) {
     connect(7);
     INSULIN_OR_ORAL_MED_NAME_TYPE fixed{10, 0, {'X'}}, pastInsulins{22, 0, {}}, fixedPill{5, 0, {'X'}}, none{0, 0, {}};
@@ -178,9 +156,7 @@ TEST_F(MeterDatalog, FullRecordMemoryArrivesProgressivelyAndClearEmptiesIt) {
     auto log = std::make_unique<METER_DATALOG>();
     std::vector<std::int16_t> valid;
     onYield([&] { valid.push_back(log->ValidRecordCount); });
-    std::uint32_t start = clock->tickCount();
     ASSERT_EQ(vb_Upload_Meter_Datalog(&rec, log.get()), ME_SUCCESS);
-    EXPECT_EQ(clock->tickCount() - start, std::uint32_t((32 + 16 * 255) * 10 * 1000 / 9600));
     ASSERT_GT(valid.size(), 20u);
     EXPECT_TRUE(std::is_sorted(valid.begin(), valid.end()));
     EXPECT_LT(valid[valid.size() / 2], log->ValidRecordCount);
@@ -194,7 +170,7 @@ TEST_F(MeterDatalog, FullRecordMemoryArrivesProgressivelyAndClearEmptiesIt) {
     EXPECT_EQ(rec.Meter_upload_time, meter().clock);  // the meter clock when the upload ended
 
     // Clearing takes its own wire time and leaves nothing to upload.
-    start = clock->tickCount();
+    const std::uint32_t start = clock->tickCount();
     ASSERT_EQ(vb_Clear_Meter_Datalog(&rec), ME_SUCCESS);
     EXPECT_GE(clock->tickCount() - start, 1000u);
     EXPECT_EQ(rec.Percent_done, 100);

@@ -14,6 +14,7 @@
 #include "errors/err_propagator.h"
 #include "platform/message_pump.h"
 #include "simulator.h"
+#include "support/client_session.h"
 #include "support/kept_documents.h"
 #include "support/sim_transport.h"
 #include "util/helpers.h"
@@ -74,20 +75,6 @@ inline std::shared_ptr<pugi::xml_document> parsed(const XMLWrapper& doc) {
     auto tree = std::make_shared<pugi::xml_document>();
     tree->load_string(doc.XML().c_str());
     return tree;
-}
-
-inline XMLWrapper newDoc(std::int32_t kind) {
-    XMLWrapper doc;
-    doc.InitDocument(kind);
-    return doc;
-}
-
-inline XMLWrapper connectionDoc(const std::string& ports, const std::string& kind = "COM") {
-    XMLWrapper doc = newDoc(doc_kind::connection_info);
-    doc.SelectElement("Ports");
-    doc.AddElement(kind);
-    doc.AddChildElement("PortsToSearch", "", ports);
-    return doc;
 }
 
 inline XMLWrapper deviceDoc(const std::string& port, const std::string& sn, const std::string& type) {
