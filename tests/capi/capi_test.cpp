@@ -3,8 +3,6 @@
 #include <dlfcn.h>
 #include <gtest/gtest.h>
 
-#include <pugixml.hpp>
-
 #include <memory>
 #include <new>
 #include <stdexcept>
@@ -35,13 +33,6 @@ std::string text(const varnel_doc* d) {
     std::string out = xml ? xml : "(null)";
     varnel_free(xml);
     return out;
-}
-// The number of children of the element at a path ("Datalog/Records").
-std::size_t children(const varnel_doc* d, const char* path) {
-    pugi::xml_document tree;
-    tree.load_string(text(d).c_str());
-    pugi::xml_node n = tree.first_element_by_path(path);
-    return std::distance(n.begin(), n.end());
 }
 
 struct Events {
@@ -95,9 +86,7 @@ TEST(CDocuments, KindsAndMalformedText) {
         EXPECT_EQ(text(d.get()), before) << (bad ? bad : "NULL");
     }
     EXPECT_NE(varnel_doc_load(nullptr, "<A/>"), 0);
-    EXPECT_EQ(text(nullptr), "(null)");
     varnel_doc_free(nullptr);
-    varnel_free(nullptr);
     varnel_delete(nullptr);
 }
 
@@ -108,7 +97,7 @@ TEST_F(CInterface, FlagsAreCTruthValuesAndRemovedHandlersAreNotCalled) {
     fresh();
     EXPECT_EQ(varnel_get_device_settings(c, &rec, device.get(), settings.get(), 1, status.get(), &check), ME_SUCCESS);
     EXPECT_TRUE(check == 0 || check == 1) << check;
-    EXPECT_GT(children(settings.get(), "DeviceSettings/Settings"), 1u);
+    EXPECT_NE(text(settings.get()).find("<GlucUnit"), std::string::npos);
     EXPECT_EQ(events.completions, 1);
     EXPECT_FALSE(events.progress.empty());
 
@@ -219,13 +208,10 @@ TEST(MissingTransport, NamesThePathAndTheLoadersReason) {
     EXPECT_NE(text.find(kMissing + ": cannot open shared object file"), std::string::npos) << text;  // dlerror's
     varnel_delete(c);
 
-    varnel::DllWrapper wrapper(kMissing);
     varnel::XMLWrapper info, connection, report;
-    info.InitDocument(1);
-    report.InitDocument(7);
     connection.LoadXML(kConnection);
     try {
-        wrapper.discoverDevice(rec, info, connection, report);
+        varnel::DllWrapper(kMissing).discoverDevice(rec, info, connection, report);
         ADD_FAILURE() << "no error";
     } catch (const varnel::ComponentError& e) {
         EXPECT_STREQ(e.what(), text.c_str());
