@@ -86,4 +86,25 @@ TEST_F(SetCommand, RefusesBeforeTouchingTheMeterWhatValidateRefuses) {
     }
 }
 
+// varnel validate: the schema it used, then "valid" or each problem with its line.
+TEST_F(VarnelCommand, ValidateNamesTheSchemaAndEachProblemWithItsLine) {
+    const struct {
+        const char* document;
+        const char* output;  // the start of what it prints
+        int status;
+    } cases[] = {
+        {"<Status>\n  <ErrCode><Major>0</Major><Minor>0</Minor></ErrCode>\n  <ErrDesc>ok</ErrDesc>\n</Status>\n",
+         "schema Status.xsd\nvalid\n", 0},
+        {"<Status>\n  <ErrCod/>\n</Status>\n", "schema Status.xsd\nline 2: Element 'ErrCod'", 65},
+        {"<Unknown/>", "", 65},
+        {"<Status>", "line 1: ", 65},
+    };
+    for (const auto& c : cases) {
+        std::ofstream(dir / "doc.xml", std::ios::trunc) << c.document;
+        const Outcome r = varnel({"validate", (dir / "doc.xml").string()});
+        EXPECT_EQ(r.out.rfind(c.output, 0), 0u) << r.out;
+        EXPECT_EQ(r.status, c.status) << r.out;
+    }
+}
+
 }  // namespace
