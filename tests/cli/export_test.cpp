@@ -182,16 +182,14 @@ TEST_F(VarnelCommand, CsvInMmolConvertsGlucoseOnlyAndSaysSoInTheHeader) {
     EXPECT_EQ(varnel({"readings", "-q", "--unit", "mmol", "--sim-profile", kRecordLog}).status, 64);
 }
 
-TEST(CsvField, QuotesWhatASpreadsheetWouldSplitAndDisarmsFormulas) {
+// A CSV field a spreadsheet would split is quoted and a formula disarmed; JSON numbers are plain decimals only.
+TEST(ExportFields, QuotedAndDisarmedForSpreadsheetsAndOnlyPlainDecimalsAreNumbers) {
     using varnel::detail::csvField;
     EXPECT_EQ(csvField("two\r\nlines"), "\"two\r\nlines\"");
     EXPECT_EQ(csvField("=HYPERLINK(\"x\")"), "\"'=HYPERLINK(\"\"x\"\")\"");
     EXPECT_EQ(csvField("@cmd"), "'@cmd");
     EXPECT_EQ(csvField("-2.5"), "-2.5");
     EXPECT_EQ(csvField("-0x10"), "'-0x10");
-}
-
-TEST(Numbers, OnlyPlainDecimalNumbersAreNumbers) {
     for (const char* text : {"12", "-2.5", "0", "9223372036854775807", "-9223372036854775808"})
         EXPECT_TRUE(varnel::numberIn(text)) << text;
     // JSON would write these as numbers a reader takes differently, or cannot hold.
