@@ -33,7 +33,6 @@ std::map<std::string, std::string> summaryRows(const std::string& text) {
 TEST_F(VarnelCommand, ReportAndSummaryShowTheFiguresOfTheGlucoseReadings) {
     // The profile's glucose readings; its control, check strip and error are not among them.
     const std::vector<double> values{159, 108, 600, 20, 70};
-    const std::string first = "2005-01-11T18:26:28", last = "2005-01-20T07:10:00";
 
     double mean = 0, squares = 0;
     for (double v : values) mean += v / values.size();
