@@ -1,6 +1,8 @@
 """The Python package over the built libvarnel and the shipped simulated meters (real time: ~5 s)."""
 import ctypes
 import xml.etree.ElementTree as ET
+from datetime import datetime
+from pathlib import Path
 
 import pytest
 
@@ -53,13 +55,15 @@ def test_a_whole_session_through_the_package():
             broken.discover()
 
 
-def test_readings_as_python_values_with_or_without_pandas():
-    from datetime import datetime
-    from pathlib import Path
+def simulator():
+    """The simulated transport beside libvarnel, the instance the component loads, reset to its shipped meter."""
+    sim = ctypes.CDLL(str(Path(varnel.library()._name).resolve().parent / "libvantrix32.so.0"))
+    assert sim.vxsim_reset() == 0
+    return sim
 
-    # The shipped meter as it comes (a test before may have erased it): the simulator beside libvarnel.
-    simulator = ctypes.CDLL(str(Path(varnel.library()._name).resolve().parent / "libvantrix32.so.0"))
-    assert simulator.vxsim_reset() == 0
+
+def test_readings_as_python_values_with_or_without_pandas():
+    simulator()  # a test before may have erased it
     with varnel.Component() as c:
         c.discover(port=1)
         log = c.get_readings()
@@ -81,15 +85,11 @@ def test_readings_as_python_values_with_or_without_pandas():
         with pytest.raises(ImportError, match="needs pandas"):
             varnel.readings_frame(log)
         return
-    frame = varnel.readings_frame(log)
-    assert len(frame[frame["kind"] == "glucose"]) == sum(r["kind"] == "glucose" for r in got)
-    assert frame["time"][0] == pandas.Timestamp(got[0]["time"])
+    assert varnel.readings_frame(log)["time"][0] == pandas.Timestamp(got[0]["time"])
 
 
 def test_a_partial_outcome_raises_and_carries_what_was_read():
-    from pathlib import Path
-    sim = ctypes.CDLL(str(Path(varnel.library()._name).parent / "libvantrix32.so.0"))
-    sim.vxsim_reset()  # the default meter, type 7, with its readings
+    sim = simulator()  # the default meter, type 7, with its readings
     try:
         with varnel.Component() as c:
             c.discover(port=1)

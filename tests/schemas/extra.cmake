@@ -5,9 +5,7 @@ target_sources(${target} PRIVATE ${PROJECT_SOURCE_DIR}/cli/document_check.cpp)
 target_include_directories(${target} PRIVATE ${PROJECT_SOURCE_DIR}/cli ${PROJECT_BINARY_DIR}/include)
 target_link_libraries(${target} PRIVATE LibXml2::LibXml2)
 target_compile_definitions(${target} PRIVATE
-  VARNEL_SCHEMA_DIR="${PROJECT_BINARY_DIR}/share/varnel/schemas"
-  VARNEL_CLI_PATH="$<TARGET_FILE:varnel_cli>")
-add_dependencies(${target} varnel_cli)
+  VARNEL_SCHEMA_DIR="${PROJECT_BINARY_DIR}/share/varnel/schemas")
 set(properties PROPERTIES ENVIRONMENT VARNEL_KEPT_DOCUMENTS=${VARNEL_KEPT_DOCUMENTS} FIXTURES_REQUIRED kept_documents)
 add_test(NAME schemas_clear_kept_documents COMMAND ${CMAKE_COMMAND} -E rm -rf ${VARNEL_KEPT_DOCUMENTS})
 set_tests_properties(schemas_clear_kept_documents PROPERTIES FIXTURES_SETUP kept_documents_cleared)
