@@ -15,6 +15,7 @@
 #include "varnel/clock.h"
 #include "varnel/records.h"
 
+#include "com_test.h"
 #include "varnel_com.h"
 #include "varnel_xml_com.h"
 
@@ -26,40 +27,7 @@ void expect(bool ok, int line, const char* what) {
 }
 #define CHECK(cond) expect((cond), __LINE__, #cond)
 
-std::string narrow(const wchar_t* s) {
-    std::string out;
-    for (; s && *s; ++s) out += static_cast<char>(*s);
-    return out;
-}
-// The text of a BSTR the callee allocated, freed.
-std::string take(BSTR s) {
-    std::string out = narrow(s);
-    SysFreeString(s);
-    return out;
-}
-// A BSTR for the call's duration.
-struct Bstr {
-    BSTR b;
-    explicit Bstr(const wchar_t* s) : b(SysAllocString(s)) {}
-    ~Bstr() { SysFreeString(b); }
-    operator BSTR() const { return b; }
-};
-
-template <class T>
-T* create(REFCLSID clsid, REFIID iid) {
-    T* p = nullptr;
-    if (FAILED(CoCreateInstance(clsid, nullptr, CLSCTX_INPROC_SERVER, iid, reinterpret_cast<void**>(&p)))) {
-        std::fprintf(stderr, "cannot create a class (registered?)\n");
-        std::exit(2);
-    }
-    return p;
-}
-template <class T>
-T* query(IUnknown* p, REFIID iid) {
-    T* q = nullptr;
-    p->QueryInterface(iid, reinterpret_cast<void**>(&q));
-    return q;
-}
+using namespace comtest;
 
 VARIANT var(const std::string& s) {
     VARIANT v{};
@@ -132,11 +100,10 @@ struct Call {
     }
 };
 
-struct TreeDocument final : IDispatch {
+struct TreeDocument final : Dispatch {
     std::unique_ptr<Node> root;
     Node *current = nullptr, *added = nullptr, *addedChild = nullptr;
     int calls = 0;
-    ULONG refs = 1;  // lives on the test's stack
 
     Node* child(const Call& c) const { return current ? current->child(c.str(0)) : nullptr; }
     Node* at(const Call& c) const { return current ? current->at(c.num(0)) : nullptr; }
@@ -201,14 +168,6 @@ struct TreeDocument final : IDispatch {
          [this](const Call& c) { return at(c) ? c.ret(attribute(at(c), c.str(1))) : c.fail(L"index"); }},
     };
 
-    STDMETHODIMP QueryInterface(REFIID riid, void** o) override {
-        *o = riid == IID_IUnknown || riid == IID_IDispatch ? this : nullptr;
-        return *o ? (AddRef(), S_OK) : E_NOINTERFACE;
-    }
-    STDMETHODIMP_(ULONG) AddRef() override { return ++refs; }
-    STDMETHODIMP_(ULONG) Release() override { return --refs; }
-    STDMETHODIMP GetTypeInfoCount(UINT* n) override { return *n = 0, S_OK; }
-    STDMETHODIMP GetTypeInfo(UINT, LCID, ITypeInfo**) override { return E_NOTIMPL; }
     STDMETHODIMP GetIDsOfNames(REFIID, LPOLESTR* names, UINT, LCID, DISPID* id) override {
         for (std::size_t i = 0; i < ops.size(); ++i)
             if (narrow(names[0]) == ops[i].first) return *id = DISPID(100 + i), S_OK;
@@ -358,9 +317,9 @@ void errors(_DllWrapper* wrapper) {
     if (supports) supports->Release();
     LONG groups = -1;
     BSTR minor = nullptr;
-    status->CountElements(Bstr(L"ErrCode"), &groups);
-    status->SelectElement(Bstr(L"ErrCode"));
-    status->GetChildValue(Bstr(L"Minor"), &minor);
+    status->CountElements(Bstr("ErrCode"), &groups);
+    status->SelectElement(Bstr("ErrCode"));
+    status->GetChildValue(Bstr("Minor"), &minor);
     CHECK(groups == 1 && take(minor) == "-16");
 
     // A null document: reported the same way; a null record is E_POINTER.

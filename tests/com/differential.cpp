@@ -24,6 +24,7 @@
 #include <io.h>
 #include <windows.h>
 
+#include "com_test.h"
 #include "varnel_com.h"
 #include "varnel_xml_com.h"
 #else
@@ -45,36 +46,12 @@ std::string errorLine(std::int32_t number, const std::string& description) {
 
 #ifdef _WIN32
 
-std::string utf8(BSTR text) {
-    const int n = static_cast<int>(SysStringLen(text));
-    std::string s(static_cast<std::size_t>(WideCharToMultiByte(CP_UTF8, 0, text, n, nullptr, 0, nullptr, nullptr)), 0);
-    WideCharToMultiByte(CP_UTF8, 0, text, n, s.data(), static_cast<int>(s.size()), nullptr, nullptr);
-    SysFreeString(text);
-    return s;
-}
-
-// An ASCII BSTR for the call's duration.
-struct Bstr {
-    BSTR b;
-    explicit Bstr(const std::string& s) : b(SysAllocString(std::wstring(s.begin(), s.end()).c_str())) {}
-    ~Bstr() { SysFreeString(b); }
-    operator BSTR() const { return b; }
-};
-
-void must(HRESULT hr, const char* what) {
-    if (FAILED(hr)) {
-        std::fprintf(stderr, "%s failed: 0x%08lx\n", what, static_cast<unsigned long>(hr));
-        std::exit(2);
-    }
-}
+using namespace comtest;
 
 // Varnel.XMLWrapper through its vtable.
 struct Doc {
     _XMLWrapper* p = nullptr;
-    explicit Doc(std::int32_t kind) {
-        must(CoCreateInstance(CLSID_XMLWrapper, nullptr, CLSCTX_INPROC_SERVER, IID__XMLWrapper,
-                              reinterpret_cast<void**>(&p)),
-             "CoCreateInstance(Varnel.XMLWrapper)");
+    explicit Doc(std::int32_t kind) : p(create<_XMLWrapper>(CLSID_XMLWrapper, IID__XMLWrapper)) {
         must(p->InitDocument(kind), "InitDocument");
     }
     ~Doc() { p->Release(); }
@@ -86,21 +63,13 @@ struct Doc {
     std::string XML() {
         BSTR text = nullptr;
         must(p->get_XML(&text), "XML");
-        return utf8(text);
+        return take(text);
     }
 };
 
 // The events of __DllWrapper, received through IDispatch.
-struct Sink final : IDispatch {
-    STDMETHODIMP QueryInterface(REFIID riid, void** o) override {
-        *o = riid == IID_IUnknown || riid == IID_IDispatch || riid == DIID___DllWrapper ? this : nullptr;
-        return *o ? S_OK : E_NOINTERFACE;
-    }
-    STDMETHODIMP_(ULONG) AddRef() override { return 2; }
-    STDMETHODIMP_(ULONG) Release() override { return 1; }
-    STDMETHODIMP GetTypeInfoCount(UINT* n) override { return *n = 0, S_OK; }
-    STDMETHODIMP GetTypeInfo(UINT, LCID, ITypeInfo**) override { return E_NOTIMPL; }
-    STDMETHODIMP GetIDsOfNames(REFIID, LPOLESTR*, UINT, LCID, DISPID*) override { return E_NOTIMPL; }
+struct Sink final : Dispatch {
+    Sink() : Dispatch(DIID___DllWrapper) {}
     STDMETHODIMP Invoke(DISPID id, REFIID, LCID, WORD, DISPPARAMS* params, VARIANT*, EXCEPINFO*, UINT*) override {
         if (id == 1 && params->cArgs == 1 && V_VT(&params->rgvarg[0]) == (VT_I2 | VT_BYREF))
             out.push_back("progress " + std::to_string(*V_I2REF(&params->rgvarg[0])));
@@ -116,13 +85,10 @@ struct Meter {
     IConnectionPoint* point = nullptr;
     DWORD cookie = 0;
     Sink sink;
-    Meter() {
-        must(CoCreateInstance(CLSID_DllWrapper, nullptr, CLSCTX_INPROC_SERVER, IID__DllWrapper,
-                              reinterpret_cast<void**>(&p)),
-             "CoCreateInstance(Varnel.DllWrapper)");
-        IConnectionPointContainer* container = nullptr;
-        must(p->QueryInterface(IID_IConnectionPointContainer, reinterpret_cast<void**>(&container)), "container");
-        must(container->FindConnectionPoint(DIID___DllWrapper, &point), "FindConnectionPoint");
+    Meter() : p(create<_DllWrapper>(CLSID_DllWrapper, IID__DllWrapper)) {
+        auto* container = query<IConnectionPointContainer>(p, IID_IConnectionPointContainer);
+        must(container ? container->FindConnectionPoint(DIID___DllWrapper, &point) : E_NOINTERFACE,
+             "FindConnectionPoint");
         container->Release();
         must(point->Advise(&sink, &cookie), "Advise");
     }
@@ -141,7 +107,7 @@ struct Meter {
         BSTR description = nullptr;
         if (GetErrorInfo(0, &info) == S_OK) info->GetDescription(&description), info->Release();
         return errorLine(HRESULT_FACILITY(hr) == FACILITY_CONTROL ? HRESULT_CODE(hr) : static_cast<std::int32_t>(hr),
-                         utf8(description));
+                         take(description));
     }
 };
 #define CALL(meter, method, ...) (meter).run([&](LONG* result) { return (meter).p->method(__VA_ARGS__, result); })
