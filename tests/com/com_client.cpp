@@ -286,6 +286,9 @@ void otherComponentDocuments(_DllWrapper* wrapper) {
     CHECK(check == VARIANT_TRUE);
     Node* records = datalog.root ? datalog.root->child("Records") : nullptr;
     CHECK(records && !records->children.empty());
+    Node* detail = datalog.root ? datalog.root->child("TransferDetail") : nullptr;
+    Node* total = detail && detail->child("Records") ? detail->child("Records")->child("Total") : nullptr;
+    CHECK(total && std::atoi(total->text.c_str()) > 0);  // a text written through AddChildElement
     CHECK(status.root && status.root->children.empty());
     std::printf("another component's documents: %d calls by name\n", device.calls + datalog.calls + status.calls);
     wrapper->closeMeter(&rec, &result);
