@@ -203,52 +203,41 @@ void session(int type, int failing) {
     if (failing == 0) return;
     Doc all(2), caps(4), datalog(5), filter(6);
     Flag check{};
-    // Each request: its name, its call on the status document, the document it fills, whether it sets
-    // blnCheckMeter. The listed modes take the items the calls in all mode read.
-    struct Step {
-        const char* name;
-        std::function<std::string(Doc&)> call;
-        Doc* filled;
-        bool checks;
-    };
-    const Step steps[kRequests] = {
-        {"getDeviceSettings all",
-         [&](Doc& st) { return CALL(meter, getDeviceSettings, R(rec), A(device), A(all), B(true), A(st), F(check)); },
-         &all, true},
-        {"getDeviceSettings listed",
-         [&](Doc& st) { return CALL(meter, getDeviceSettings, R(rec), A(device), A(all), B(false), A(st), F(check)); },
-         &all, true},
-        {"getDeviceCaps all",
-         [&](Doc& st) { return CALL(meter, getDeviceCaps, R(rec), A(device), A(caps), B(true), A(st), F(check)); },
-         &caps, true},
-        {"getDeviceCaps listed",
-         [&](Doc& st) { return CALL(meter, getDeviceCaps, R(rec), A(device), A(caps), B(false), A(st), F(check)); },
-         &caps, true},
-        {"setDeviceSettings", [&](Doc& st) { return CALL(meter, setDeviceSettings, R(rec), A(device), A(all), A(st)); },
-         &all, false},
-        {"getReadings",
-         [&](Doc& st) { return CALL(meter, getReadings, R(rec), A(device), A(datalog), A(filter), A(st), F(check)); },
-         &datalog, true},
-        {"clearMeter", [&](Doc& st) { return CALL(meter, clearMeter, R(rec), A(device), A(st)); }, nullptr, false},
-        {"closeMeter", [&](Doc&) { return CALL(meter, closeMeter, R(rec)); }, nullptr, false},
-    };
-    const auto close = [&] { report("closeMeter", CALL(meter, closeMeter, R(rec)), {}); };
+    // The requests in the order they run, each on a status document of its own, and the document each fills
+    // (the listed modes take the items the calls in all mode read); all but setDeviceSettings set blnCheckMeter.
+    const char* const names[kRequests] = {"getDeviceSettings all",
+                                          "getDeviceSettings listed",
+                                          "getDeviceCaps all",
+                                          "getDeviceCaps listed",
+                                          "setDeviceSettings",
+                                          "getReadings",
+                                          "clearMeter",
+                                          "closeMeter"};
+    const std::function<std::string(Doc&)> calls[kRequests] = {
+        [&](Doc& st) { return CALL(meter, getDeviceSettings, R(rec), A(device), A(all), B(true), A(st), F(check)); },
+        [&](Doc& st) { return CALL(meter, getDeviceSettings, R(rec), A(device), A(all), B(false), A(st), F(check)); },
+        [&](Doc& st) { return CALL(meter, getDeviceCaps, R(rec), A(device), A(caps), B(true), A(st), F(check)); },
+        [&](Doc& st) { return CALL(meter, getDeviceCaps, R(rec), A(device), A(caps), B(false), A(st), F(check)); },
+        [&](Doc& st) { return CALL(meter, setDeviceSettings, R(rec), A(device), A(all), A(st)); },
+        [&](Doc& st) { return CALL(meter, getReadings, R(rec), A(device), A(datalog), A(filter), A(st), F(check)); },
+        [&](Doc& st) { return CALL(meter, clearMeter, R(rec), A(device), A(st)); },
+        [&](Doc&) { return CALL(meter, closeMeter, R(rec)); }};
+    Doc* const filled[kRequests] = {&all, &all, &caps, &caps, &all, &datalog, nullptr, nullptr};
     for (int r = 1; r <= kRequests; ++r) {
-        const Step& step = steps[r - 1];
         std::istringstream faults(r == failing ? kFaults : "");
         for (std::string f; faults >> f;) vxsim_fail_call(f.c_str(), 1, ME_COM_ERROR, 1);
         Doc st(7);
         check = Flag{};
-        const std::string result = step.call(st);
+        const std::string result = calls[r - 1](st), name = names[r - 1];
         if (r == kRequests)
-            report(step.name, result, {});
-        else if (step.filled)
-            report(step.name, result, {step.filled, &st}, step.checks ? &check : nullptr);
+            report(name, result, {});
+        else if (filled[r - 1])
+            report(name, result, {filled[r - 1], &st}, name == "setDeviceSettings" ? nullptr : &check);
         else
-            report(step.name, result, {&st});
+            report(name, result, {&st});
         line(recordLine(rec));
         if (r == failing) {
-            if (r != kRequests) close();
+            if (r != kRequests) report("closeMeter", calls[kRequests - 1](st), {});
             return;
         }
     }
