@@ -307,14 +307,11 @@ void errors(_DllWrapper* wrapper) {
     SetErrorInfo(0, nullptr);
     CHECK(wrapper->clearMeter(&rec, &dev, &st, &result) == MAKE_HRESULT(SEVERITY_ERROR, FACILITY_CONTROL, 91));
     IErrorInfo* info = nullptr;
-    CHECK(GetErrorInfo(0, &info) == S_OK && info);
-    if (info) {
-        BSTR d = nullptr, s = nullptr;
-        info->GetDescription(&d), info->GetSource(&s);
-        CHECK(take(d).rfind("doAction --> ", 0) == 0);
-        CHECK(take(s) == "Varnel.DllWrapper");
-        info->Release();
-    }
+    BSTR description = nullptr, source = nullptr;
+    CHECK(GetErrorInfo(0, &info) == S_OK && SUCCEEDED(info->GetDescription(&description)) &&
+          SUCCEEDED(info->GetSource(&source)));
+    CHECK(take(description).rfind("doAction --> ", 0) == 0 && take(source) == "Varnel.DllWrapper");
+    if (info) info->Release();
     ISupportErrorInfo* supports = query<ISupportErrorInfo>(wrapper, IID_ISupportErrorInfo);
     CHECK(supports && supports->InterfaceSupportsErrorInfo(IID__DllWrapper) == S_OK);
     if (supports) supports->Release();
