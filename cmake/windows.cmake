@@ -40,6 +40,13 @@ add_library(pugixml STATIC ${VARNEL_PUGIXML_SOURCE_DIR}/src/pugixml.cpp)
 target_include_directories(pugixml SYSTEM PUBLIC ${VARNEL_PUGIXML_SOURCE_DIR}/src)
 add_library(pugixml::pugixml ALIAS pugixml)
 
+# Debian's nlohmann/json (header only, private to the library), copied into the
+# build folder so the cross compiler sees it without the rest of /usr/include.
+file(COPY /usr/include/nlohmann DESTINATION ${PROJECT_BINARY_DIR}/cross-include)
+add_library(nlohmann_json::nlohmann_json INTERFACE IMPORTED)
+set_target_properties(nlohmann_json::nlohmann_json PROPERTIES
+  INTERFACE_INCLUDE_DIRECTORIES ${PROJECT_BINARY_DIR}/cross-include)
+
 # mingw's headers declare the reentrant POSIX time functions (localtime_r) on request.
 add_compile_definitions(_POSIX_THREAD_SAFE_FUNCTIONS=200112L)
 
