@@ -320,6 +320,7 @@ TEST(XMLHostileText, LoadRefusesWithWhatAndWhereAndChangesNothing) {
         {"<R>ab"s + '\0' + "cd</R>", "U+0000, which XML does not allow at line 1, offset 5"},
         {"<R>AB&#0;C</R>", "character reference to U+0000, which XML does not allow at line 1, offset 5"},
         {"<R>&#xD800;</R>", "reference to U+D800"},
+        {"<R>&#x110000;</R>", "beyond U+10FFFF"},
         {"<R>&#X41;</R>", "malformed character reference"},
         {"<R>&nbsp;</R>", "undeclared entity nbsp at line 1, offset 3"},
         {"<R>caf\xE9</R>", "invalid UTF-8 (byte 0xE9) at line 1, offset 6"},
@@ -355,6 +356,7 @@ TEST(XMLHostileText, LoadRefusesWithWhatAndWhereAndChangesNothing) {
         "<R a='&#9;&#xA;&#13;'>&#x10FFFF;&#xFFFD;&#xE000;&#x20;</R>",
         "<R>\x7F \xC2\x85 \xEF\xBF\xBD \xF0\x9F\x98\x80 \t\r\n</R>",
         "<?xml version='1.1' encoding='UTF-8' standalone='no'?><R/>",
+        "<?xml-stylesheet href='r.css'?><R/>",  // a processing instruction, not the declaration
         "<!DOCTYPE R SYSTEM 'r.dtd'><R>&x;</R>",
         nested(256),
     };

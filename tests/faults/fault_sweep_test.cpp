@@ -245,6 +245,7 @@ std::string linesOutside(const Meter& got, const Meter& a, const Meter& b) {
 std::string statusProblem(const XMLWrapper& status, const std::string& begins) {
     for (const std::string& report : statusGroups(status)) {
         if (report.starts_with("0/0/")) continue;
+        if (report.starts_with("0/")) return "a failure reported under major code 0: `" + report + "`";
         const std::string said = report.substr(report.find('/', report.find('/') + 1) + 1);
         for (std::size_t from = 0, to; from <= begins.size(); from = to + 1) {
             to = std::min(begins.find('|', from), begins.size());
