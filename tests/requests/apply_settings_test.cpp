@@ -12,7 +12,7 @@ namespace {
 struct ApplySettings : WrapperTest {
     // A configuration document for the discovered meter, with the serial as the client has it.
     XMLWrapper config(const std::string& settings) const {
-        const char* serial = parsed(device)->document_element().child("DeviceInfo").child_value("SN");
+        const std::string serial = parsed(device)->document_element().child("DeviceInfo").child_value("SN");
         return settingsDoc(serial, std::to_string(sim::meter().type), settings);
     }
     std::int32_t apply(XMLWrapper cfg) {
