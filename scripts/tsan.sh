@@ -9,8 +9,7 @@ set -euo pipefail
 cd "$(dirname "$0")/.."
 sessions="${VARNEL_THREAD_SESSIONS:-150}"
 cmake -S . -B build-tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DVARNEL_WERROR=ON -DVARNEL_SANITIZE=thread >/dev/null
-cmake --build build-tsan -j"$(nproc)" --target vantrix32 test_component test_util test_platform >&2
+cmake --build build-tsan -j"$(nproc)" --target vantrix32 test_component test_units >&2
 export TSAN_OPTIONS="halt_on_error=1 second_deadlock_stack=1"
 VARNEL_THREAD_SESSIONS=$sessions build-tsan/bin/test_component --gtest_filter='Threads.*'
-build-tsan/bin/test_util --gtest_filter='ContinueFlag.*'
-build-tsan/bin/test_platform
+build-tsan/bin/test_units --gtest_filter='ContinueFlag.*:WaitTimerTest.*'
