@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <regex>
 #include <utility>
 
 #include "contracts/xml_document.h"
@@ -11,7 +12,6 @@
 
 using namespace varnel;
 using namespace varnel::test;
-using ::testing::MatchesRegex;
 
 namespace {
 
@@ -126,7 +126,9 @@ TEST_F(Requests, AMissingMeterAndUnexpectedErrors) {
         rec.Error_code = keep;
         EXPECT_EQ(unexpectedTrace([&] { wrapper->clearMeter(rec, noPortInfo, status); }), "91 doAction --> ");
         // One report, without a line number.
-        EXPECT_THAT(report(), MatchesRegex("-17/-16/Unknown status;Error number = 91 Error description = [^|]*/0"));
+        // std::regex: GoogleTest's own regex on Windows has no bracket expressions.
+        const std::regex unexpected("-17/-16/Unknown status;Error number = 91 Error description = [^|]*/0");
+        EXPECT_TRUE(std::regex_match(report(), unexpected)) << report();
         EXPECT_EQ(completions, 1);
         EXPECT_EQ(closed(), keep != -50);
     }
